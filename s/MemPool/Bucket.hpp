@@ -1,0 +1,146 @@
+// One bucket: a heap block of a header and equal records, with a free list of offsets. Record.hpp
+// draws it. A Group (Group.hpp) decides when buckets come and go and links them into its lists.
+
+#ifndef OBR_MEMPOOL_BUCKET_HPP
+#define OBR_MEMPOOL_BUCKET_HPP
+
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <iosfwd>
+#include <map>
+
+#include <MemPool>
+
+#include "MemPool/Record.hpp"
+
+namespace OBR::MemPool {
+
+class Group;
+
+// How many there are of each data size.
+using SizeCounts = std::map<std::uint32_t, std::uint32_t>;
+
+// Laws: used + numFree == TotalRecs(), size == 2 + TotalRecs() * recSize, and the free list that
+// starts at freeHead has numFree records.
+class Bucket {
+public:
+    // In the order of memory. The reports read them as they are.
+    Group* parent;           // The group that owns the bucket; null once it is destroyed.
+    Bucket* next1;           // Next in the group's list of all buckets, null at the end.
+    Bucket* prev1;           // Previous one, null at the front.
+    Bucket* next2;           // The same in its list of buckets with a free record. Both mean
+    Bucket* prev2;           // nothing while the bucket is full and thus not on that list.
+    std::uint16_t size;      // Bytes of the records and of numFree; 0 once it is destroyed.
+    std::uint16_t recSize;   // Bytes of a record, its header included.
+    std::uint16_t freeHead;  // Offset of the first free record, 0 when none is.
+    std::uint16_t numFree;   // Free records. recsBase is the address of this field.
+
+    Bucket() = delete;
+
+    // Makes a bucket of at most `bucketSize` (and 65535) bytes of offsets, all records FREE in the
+    // order of their addresses, on no list. `bucketSize` must leave room for one record.
+    static Bucket* Create(Group* parent, std::uint32_t bucketSize, std::uint32_t recDataSize);
+
+    // Ends a bucket and releases its memory. Its header then says that it is none, as long as the
+    // heap leaves those bytes alone.
+    static void Destroy(Bucket* bucket);
+
+    // The number of records. It is stored nowhere.
+    std::int32_t TotalRecs() const {
+        return (std::int32_t{size} - std::int32_t{firstOffset}) / std::int32_t{recSize};
+    }
+    // The same question as numFree == TotalRecs(), without its division.
+    bool IsEmpty() const { return std::uint32_t{numFree} * recSize + firstOffset == size; }
+    bool IsFull() const { return numFree == 0; }
+
+    // Takes the first free record; there must be one. Returns its data.
+    void* TakeRecord() {
+        const std::uint16_t offset = freeHead;
+        RecHdr* const record = RecordAt(offset);
+        freeHead = record->Link();
+        record->SetLink(offset);
+        record->type = typeUsed;
+        --numFree;
+        return record->Data();
+    }
+
+    // Puts the used record of these data in front of the free list.
+    void ReturnRecord(void* data) {
+        RecHdr* const record = RecHdr::Of(data);
+        const std::uint16_t offset = record->Link();
+        record->SetLink(freeHead);
+        record->type = typeFree;
+        freeHead = offset;
+        ++numFree;
+    }
+
+    // The bucket that a record's own link leads to.
+    static Bucket* Holding(void* data, std::uint16_t offset) {
+        return reinterpret_cast<Bucket*>(static_cast<char*>(data) - sizeof(RecHdr) - offset -
+                                         baseDistance);
+    }
+    static const Bucket* Holding(const void* data, std::uint16_t offset) {
+        return Holding(const_cast<void*>(data), offset);
+    }
+
+    // The owner that the bytes of this header name, or null if they are no bucket's. They may be
+    // anybody's.
+    OBR_READS_FOREIGN const Group* Owner() const {
+        const Group* group;
+        std::memcpy(&group, &parent, sizeof group);
+        std::uint16_t extent;
+        std::memcpy(&extent, &size, sizeof extent);
+        return extent == 0 ? nullptr : group;
+    }
+
+    char* RecsBase() { return reinterpret_cast<char*>(this) + baseDistance; }
+    const char* RecsBase() const { return reinterpret_cast<const char*>(this) + baseDistance; }
+    const char* RecsEnd() const { return RecsBase() + size; }
+    RecHdr* RecordAt(std::uint32_t offset) {
+        return reinterpret_cast<RecHdr*>(RecsBase() + offset);
+    }
+    const RecHdr* RecordAt(std::uint32_t offset) const {
+        return reinterpret_cast<const RecHdr*>(RecsBase() + offset);
+    }
+
+    // Reports, all read-only and exact to the character; s/diagnostics holds them. `level` indents
+    // by three blanks each. Number counts buckets from 1.
+    void DbgBucket(std::ostream& stream, std::uint32_t number, std::uint32_t level,
+                   bool showRecords, bool showFreeList) const;
+    void DbgAllRecords(std::ostream& stream, std::uint32_t level) const;
+    void DbgUsedHistogram(std::ostream& stream, std::uint32_t level) const;
+    void DbgFreeList(std::ostream& stream, std::uint32_t level) const;
+    void DbgRecordMap(std::ostream& stream) const;
+
+    // Adds each used record to the count of its data size.
+    void AddUsedRecords(SizeCounts& counts) const;
+
+    // The lines of the record map, `n` boxes each from the record at index `first` on.
+    using Records = OBR::vector<const RecHdr*>;
+    void DbgMapRule(std::ostream& stream, std::uint16_t n) const;
+    void DbgMapKinds(std::ostream& stream, std::uint16_t n, std::uint16_t first,
+                     const Records& records) const;
+    void DbgMapOffsets(std::ostream& stream, std::uint16_t n, std::uint16_t first,
+                       const Records& records) const;
+    void DbgMapSizes(std::ostream& stream, std::uint16_t n, std::uint16_t first) const;
+    void DbgMapValues(std::ostream& stream, std::uint16_t n, std::uint16_t first,
+                      const Records& records) const;
+
+    // Stops the process at the first fault of the free list.
+    void CheckFreeList() const;
+
+    static constexpr std::uint16_t firstOffset = 2;    // Offset of the first record.
+    static constexpr std::uint32_t baseDistance = 46;  // From the bucket's address to recsBase.
+};
+static_assert(sizeof(Bucket) == 48, "The first record starts 48 bytes behind the bucket's start.");
+static_assert(offsetof(Bucket, size) == 40 && offsetof(Bucket, recSize) == 42 &&
+                  offsetof(Bucket, freeHead) == 44,
+              "The four counts follow the five links.");
+static_assert(offsetof(Bucket, numFree) == Bucket::baseDistance &&
+                  Bucket::baseDistance + Bucket::firstOffset == sizeof(Bucket),
+              "Offsets count from numFree, so that 0 is never a record.");
+
+}  // namespace OBR::MemPool
+
+#endif

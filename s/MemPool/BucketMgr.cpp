@@ -1,0 +1,180 @@
+// The slow roads of a pool: it is built, grows a group, serves what is too large or traced, answers
+// questions and ends.
+
+#include "MemPool/BucketMgr.hpp"
+
+#include <algorithm>
+#include <new>
+
+#include "diagnostics/Messages.hpp"
+#include "diagnostics/Trace.hpp"
+
+namespace OBR::MemPool {
+
+namespace {
+
+constexpr std::uint32_t recHdrSize = sizeof(RecHdr);
+
+// The fields of a bucket are 16 bits wide.
+constexpr std::uint32_t maxBucketSize = 65535;
+
+}  // namespace
+
+BucketMgr::BucketMgr(Mgr* handle, const std::string& poolName)
+    : name(poolName),
+      mgr(handle),
+      bucketSize(std::min(Settings::bucketSize, maxBucketSize)),
+      dataAlignment(std::max<std::uint32_t>(Settings::dataAlignment, 1)),
+      maxRecordSize(Settings::maxRecordSize),
+      minRecordSize(Settings::minRecordSize),
+      keepEmptyBuckets(Settings::keepEmptyBuckets) {
+    Trace::PoolCreated(this);
+    enabled = !Settings::off;
+    RoundRecordSizes();
+    numGroups = (maxRecordSize - minRecordSize) / dataAlignment + 1;
+    groups = new Group*[numGroups]();
+    PrepareShortRoad();
+}
+
+BucketMgr::~BucketMgr() {
+    Trace::PoolDestroyed(this);
+    Clear();
+    delete[] groups;
+}
+
+// Rounds the bounds of the record sizes to the alignment, inwards, and stops the process if no
+// record fits between them or the largest does not fit into a bucket.
+void BucketMgr::RoundRecordSizes() {
+    maxRecordSize = RoundUp(maxRecordSize, dataAlignment);
+    minRecordSize = RoundUp(minRecordSize, dataAlignment);
+    if (maxRecordSize > Settings::maxRecordSize) { maxRecordSize -= dataAlignment; }
+
+    const std::uint32_t room = bucketSize < recHdrSize ? 0 : bucketSize - recHdrSize;
+    if (maxRecordSize > room) { Messages::MaxRecordAboveBucket(maxRecordSize, room, bucketSize); }
+    if (minRecordSize > maxRecordSize) {
+        Messages::MinRecordAboveMax(minRecordSize, maxRecordSize);
+    }
+}
+
+void BucketMgr::PrepareShortRoad() {
+    const bool isPowerOfTwo = (dataAlignment & (dataAlignment - 1)) == 0;
+    if (!enabled || !isPowerOfTwo || maxRecordSize < dataAlignment + recHdrSize) { return; }
+
+    while (std::uint32_t{1} << alignmentShift < dataAlignment) { ++alignmentShift; }
+    firstStep = static_cast<std::uint16_t>(minRecordSize >> alignmentShift);
+    headerSteps = static_cast<std::uint8_t>(1 + (recHdrSize >> alignmentShift));
+    const std::uint32_t largest = (maxRecordSize - recHdrSize) >> alignmentShift << alignmentShift;
+    shortEnd = static_cast<std::uint16_t>(largest + 1);
+}
+
+// The place in `groups` of records of `recSize` bytes.
+std::uint32_t BucketMgr::IndexOf(std::uint32_t recSize) const {
+    return (std::max(recSize, minRecordSize) - minRecordSize) / dataAlignment;
+}
+
+// The group that serves records of `recSize` bytes, made if need be. Several sizes can share the
+// first place; its records have room for the largest of them, whichever is asked for first.
+Group* BucketMgr::GroupFor(std::uint32_t recSize) {
+    const std::uint32_t index = IndexOf(recSize);
+    if (groups[index] == nullptr) {
+        std::uint32_t dataSize = recSize - recHdrSize;
+        while (IndexOf(dataSize + dataAlignment + recHdrSize) == index &&
+               dataSize + dataAlignment + recHdrSize <= maxRecordSize) {
+            dataSize += dataAlignment;
+        }
+        groups[index] = new Group(this, static_cast<std::uint16_t>(dataSize));
+    }
+    return groups[index];
+}
+
+OBR_NOINLINE void* BucketMgr::AllocOnSlowRoad(std::uint32_t size) {
+    void* data = nullptr;
+    if (!enabled) {
+        data = ::operator new[](size);
+    } else {
+        const std::uint32_t recSize = RoundUp(size, dataAlignment) + recHdrSize;
+        data = recSize > maxRecordSize ? AllocExtRec(size) : GroupFor(recSize)->Alloc();
+    }
+    Trace::BlockAllocated(this, data, size);
+    return data;
+}
+
+void* BucketMgr::AllocExtRec(std::uint32_t size) {
+    auto* const extRec = static_cast<ExtRec*>(::operator new[](sizeof(ExtRec) + size));
+    *extRec = {extRecs, nullptr, size, {0xAA, 0xBB, typeExt, 0xCC}};
+    ++numExtRecs;
+    if (extRecs != nullptr) { extRecs->prev = extRec; }
+    extRecs = extRec;
+    return extRec->Data();
+}
+
+OBR_NOINLINE bool BucketMgr::FreeOnSlowRoad(void* data) {
+    Trace::BlockFreed(this, data);
+    if (!enabled) {
+        ::operator delete[](data);
+        return true;
+    }
+    Bucket* const bucket = FindBucket(data);
+    return bucket != nullptr ? bucket->parent->Free(data, bucket) : FreeExtRec(data);
+}
+
+// Gives a heap record back; false if `data` is none's.
+OBR_NOINLINE bool BucketMgr::FreeExtRec(void* data) {
+    if (ExtRec::LengthAt(data) == 0) { return false; }
+    ExtRec* const extRec = ExtRec::Of(data);
+    --numExtRecs;
+    (extRec->prev != nullptr ? extRec->prev->next : extRecs) = extRec->next;
+    if (extRec->next != nullptr) { extRec->next->prev = extRec->prev; }
+    *extRec = {};
+    KeepStores(extRec);
+    ::operator delete[](extRec);
+    return true;
+}
+
+void BucketMgr::Clear() {
+    while (extRecs != nullptr) {
+        ExtRec* const next = extRecs->next;
+        ::operator delete[](extRecs);
+        extRecs = next;
+    }
+    numExtRecs = 0;
+
+    for (std::uint32_t index = 0; index < numGroups; ++index) {
+        if (groups[index] == nullptr) { continue; }
+        groups[index]->DestroyBuckets();
+        delete groups[index];
+        groups[index] = nullptr;
+    }
+}
+
+bool BucketMgr::Contains(const void* data) const {
+    return FindBucket(data) != nullptr || (data != nullptr && ExtRec::LengthAt(data) != 0);
+}
+
+std::uint32_t BucketMgr::GetSize(const void* data) const {
+    if (data == nullptr) { return 0; }
+    const Bucket* const bucket = FindBucket(data);
+    return bucket != nullptr ? bucket->recSize - recHdrSize : ExtRec::LengthAt(data);
+}
+
+std::uint32_t BucketMgr::GetNumBuckets() const {
+    std::uint32_t count = 0;
+    for (std::uint32_t index = 0; index < numGroups; ++index) {
+        if (groups[index] != nullptr) { count += groups[index]->numBuckets; }
+    }
+    return count;
+}
+
+const Bucket* BucketMgr::GetBucket(std::uint32_t index) const {
+    for (std::uint32_t place = 0; place < numGroups; ++place) {
+        if (groups[place] == nullptr) { continue; }
+        for (const Bucket* bucket = groups[place]->head; bucket != nullptr;
+             bucket = bucket->next1) {
+            if (index == 0) { return bucket; }
+            --index;
+        }
+    }
+    return nullptr;
+}
+
+}  // namespace OBR::MemPool

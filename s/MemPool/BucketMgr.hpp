@@ -1,0 +1,141 @@
+// The pool behind a Mgr: it copies the settings once, turns the size of a request into a size class
+// and serves it from that class's Group, or from the heap if it is too large for a bucket or the
+// pool is disabled.
+
+#ifndef OBR_MEMPOOL_BUCKETMGR_HPP
+#define OBR_MEMPOOL_BUCKETMGR_HPP
+
+#include <cassert>
+#include <cstdint>
+#include <iosfwd>
+#include <string>
+
+#include "MemPool/Group.hpp"
+#include "MemPool/Record.hpp"
+#include "MemPool/Settings.hpp"
+
+namespace OBR::MemPool {
+
+class Mgr;
+
+// The largest size that Mgr::Alloc lets through: sums of a size and a header never wrap.
+constexpr std::uint32_t maxAllocSize = 0x3FFFFFFF;
+
+// The smallest multiple of `multiple` that is at least `value`, but never 0. In 32 bits.
+constexpr std::uint32_t RoundUp(std::uint32_t value, std::uint32_t multiple) {
+    const std::uint32_t below = value == 0 ? 0 : value - 1;
+    return below - below % multiple + multiple;
+}
+
+// Size classes. A request of `size` bytes has d = RoundUp(size, dataAlignment) data bytes and a
+// record of r = d + 4. It goes into a bucket if r <= maxRecordSize, from the group at
+// (max(r, minRecordSize) - minRecordSize) / dataAlignment.
+//
+// Heap forms: array form for buckets, heap records, `groups` and the blocks of a disabled pool,
+// single-object form for Group and BucketMgr.
+class BucketMgr {
+public:
+    std::string name;
+    Mgr* mgr;                      // The handle that made the pool; null once it is destroyed.
+    Group** groups = nullptr;      // One place per size class, null until it is asked for.
+    ExtRec* extRecs = nullptr;     // Front of the list of heap records, the newest first.
+    std::uint32_t numGroups = 0;   // Places in `groups`.
+    std::uint32_t numExtRecs = 0;  // Heap records on the list.
+    std::uint32_t bucketSize;      // At most 65535, the width of a bucket's fields.
+    std::uint32_t dataAlignment;   // At least 1. Data sizes are rounded up to a multiple of it.
+    std::uint32_t maxRecordSize;   // Largest record in a bucket. A multiple of dataAlignment.
+    std::uint32_t minRecordSize;   // Smallest record of the first class. A multiple as well.
+    bool keepEmptyBuckets;
+    bool enabled = true;  // False: every request goes straight to the heap.
+
+private:
+    // The size-class rule for the short road, worked out once, without its division and its cases.
+    // All but shortEnd count in steps of dataAlignment, and are valid while shortEnd is not 0.
+    std::uint16_t shortEnd = 0;       // One past the largest size for it. 0: none goes that way.
+    std::uint16_t firstStep = 0;      // minRecordSize.
+    std::uint8_t alignmentShift = 0;  // dataAlignment is 2 to the power of this.
+    std::uint8_t headerSteps = 0;     // Whole steps from (size - 1) up to the size of its record.
+
+public:
+    // Builds a pool from the settings. Stops the process if they cannot make one.
+    BucketMgr(Mgr* handle, const std::string& poolName);
+    BucketMgr(const BucketMgr&) = delete;
+    BucketMgr& operator=(const BucketMgr&) = delete;
+    ~BucketMgr();
+
+    // Returns a block of at least `size` bytes, never null. `size` is at most maxAllocSize.
+    void* Alloc(std::uint32_t size) {
+        if (OBR_UNLIKELY(size >= shortEnd || Settings::trace)) { return AllocOnSlowRoad(size); }
+        Group* const group = groups[ShortIndex(size)];
+        if (OBR_UNLIKELY(group == nullptr)) { return AllocOnSlowRoad(size); }
+        return group->Alloc();
+    }
+
+    // Gives a block back. False for null and, in an enabled pool, for what it does not recognise.
+    OBR_READS_FOREIGN bool Free(void* data) {
+        if (OBR_UNLIKELY(data == nullptr)) { return false; }
+        if (OBR_UNLIKELY(!enabled || Settings::trace)) { return FreeOnSlowRoad(data); }
+        Bucket* const bucket = FindBucket(data);
+        if (OBR_UNLIKELY(bucket == nullptr)) { return FreeExtRec(data); }
+        assert(groups[IndexOf(bucket->recSize)] == bucket->parent);
+        return bucket->parent->Free(data, bucket);
+    }
+
+    // Gives everything back. The pool is as new.
+    void Clear();
+
+    // The bucket of this pool that holds the used record at `data`, or null. `data` may be
+    // anybody's; the same in an enabled and a disabled pool, as for the two questions below.
+    OBR_READS_FOREIGN Bucket* FindBucket(void* data) const {
+        if (data == nullptr) { return nullptr; }
+        const RecHdr* const record = RecHdr::Of(data);
+        if (record->type != typeUsed) { return nullptr; }
+        const std::uint16_t offset = record->Link();
+        if (offset < Bucket::firstOffset) { return nullptr; }
+        Bucket* const bucket = Bucket::Holding(data, offset);
+        const Group* const owner = bucket->Owner();
+        if (owner == nullptr || owner->parent != this) { return nullptr; }
+        return bucket;
+    }
+    const Bucket* FindBucket(const void* data) const { return FindBucket(const_cast<void*>(data)); }
+
+    bool Contains(const void* data) const;
+    std::uint32_t GetSize(const void* data) const;
+
+    // Buckets, counted from 0 in the order of the groups' indices and of each group's list.
+    std::uint32_t GetNumBuckets() const;
+    const Bucket* GetBucket(std::uint32_t index) const;
+
+    // Reports, all read-only and exact to the character; s/diagnostics holds them. `level` indents
+    // by three blanks each.
+    void DbgReport(std::ostream& stream, std::uint32_t level, bool showBuckets, bool showRecords,
+                   bool showFreeList) const;
+    void DbgUsedData(std::ostream& stream, std::uint32_t level,
+                     const SizeCounts& usedDataFreq) const;
+    void DbgBuckets(std::ostream& stream, std::uint32_t level) const;
+    void DbgFreeBuckets(std::ostream& stream, std::uint32_t level, std::uint32_t freeBucks,
+                        std::uint32_t freeBucksM) const;
+    void DbgExtRecs(std::ostream& stream, std::uint32_t level) const;
+
+private:
+    std::uint32_t ShortIndex(std::uint32_t size) const {
+        const std::uint32_t below = size - static_cast<std::uint32_t>(size != 0);
+        const std::uint32_t step = (below >> alignmentShift) + headerSteps;
+        return step < firstStep ? 0 : step - firstStep;
+    }
+
+    void RoundRecordSizes();
+    void PrepareShortRoad();
+    std::uint32_t IndexOf(std::uint32_t recSize) const;
+    Group* GroupFor(std::uint32_t recSize);
+
+    void* AllocOnSlowRoad(std::uint32_t size);
+    void* AllocExtRec(std::uint32_t size);
+    bool FreeOnSlowRoad(void* data);
+    bool FreeExtRec(void* data);
+};
+static_assert(sizeof(BucketMgr) == 88, "A pool has 88 bytes, which the reports show.");
+
+}  // namespace OBR::MemPool
+
+#endif

@@ -1,0 +1,76 @@
+// The slow roads of a group: buckets come, go, become full and regain a free record.
+
+#include "MemPool/Group.hpp"
+
+#include "MemPool/BucketMgr.hpp"
+
+namespace OBR::MemPool {
+
+OBR_NOINLINE void* Group::AllocFromNewBucket() {
+    Bucket* const bucket = Bucket::Create(this, parent->bucketSize, recDataSize);
+
+    ++numBuckets;
+    bucket->next1 = head;
+    if (head != nullptr) { head->prev1 = bucket; }
+    head = bucket;
+    if (tail == nullptr) { tail = bucket; }
+
+    LinkFree(bucket);
+    return Alloc();
+}
+
+// The front bucket has given away its last free record.
+OBR_NOINLINE void Group::UnlinkFull() {
+    --numFreeBuckets;
+    freeBuckets = freeBuckets->next2;
+    if (freeBuckets != nullptr) { freeBuckets->prev2 = nullptr; }
+}
+
+// A bucket with a free record enters in front. Its prev2 is null already: since it left the front,
+// or since it was made.
+OBR_NOINLINE void Group::LinkFree(Bucket* bucket) {
+    ++numFreeBuckets;
+    bucket->next2 = freeBuckets;
+    if (freeBuckets != nullptr) { freeBuckets->prev2 = bucket; }
+    freeBuckets = bucket;
+}
+
+// A bucket's last used record has come back.
+OBR_NOINLINE bool Group::FreeLastUsed(Bucket* bucket, bool wasFull) {
+    if (parent->keepEmptyBuckets) {
+        if (wasFull) { LinkFree(bucket); }
+        CheckTouched(*bucket);
+    } else {
+        Release(bucket, wasFull);
+    }
+    return true;
+}
+
+// Takes an empty bucket out of its lists and ends it. One that was full a moment ago has not
+// returned to the free-bucket list.
+void Group::Release(Bucket* bucket, bool wasFull) {
+    --numBuckets;
+    (bucket->prev1 != nullptr ? bucket->prev1->next1 : head) = bucket->next1;
+    (bucket->next1 != nullptr ? bucket->next1->prev1 : tail) = bucket->prev1;
+
+    if (!wasFull) {
+        --numFreeBuckets;
+        (bucket->prev2 != nullptr ? bucket->prev2->next2 : freeBuckets) = bucket->next2;
+        if (bucket->next2 != nullptr) { bucket->next2->prev2 = bucket->prev2; }
+    }
+    Bucket::Destroy(bucket);
+}
+
+void Group::DestroyBuckets() {
+    for (Bucket* bucket = head; bucket != nullptr;) {
+        Bucket* const next = bucket->next1;
+        Bucket::Destroy(bucket);
+        bucket = next;
+    }
+    head = nullptr;
+    freeBuckets = nullptr;
+    numBuckets = 0;
+    numFreeBuckets = 0;
+}
+
+}  // namespace OBR::MemPool

@@ -1,0 +1,73 @@
+// All buckets of one record size of one pool. Here records are really taken and given back, and
+// here it is decided when a bucket comes and when it goes.
+
+#ifndef OBR_MEMPOOL_GROUP_HPP
+#define OBR_MEMPOOL_GROUP_HPP
+
+#include <cstdint>
+
+#include "MemPool/Bucket.hpp"
+#include "MemPool/Checks.hpp"
+
+namespace OBR::MemPool {
+
+class BucketMgr;
+
+// Two lists run through the buckets themselves, and new buckets enter both in front: all buckets
+// (next1, prev1), and those with at least one free record (next2, prev2).
+//
+// Laws: a bucket is on the free-bucket list exactly while its numFree > 0. Records are only taken
+// from the front of that list, so a bucket that becomes full leaves it from the front. The front
+// bucket's prev2 is null. freeBuckets is null exactly while numFreeBuckets is 0.
+class Group {
+public:
+    BucketMgr* parent;                 // The pool that owns the group.
+    Bucket* head = nullptr;            // Front of the list of all buckets.
+    Bucket* tail = nullptr;            // Back of that list. Nothing walks from it.
+    Bucket* freeBuckets = nullptr;     // Front of the free-bucket list.
+    std::uint32_t numBuckets = 0;      // Buckets on the list of all buckets.
+    std::uint32_t numFreeBuckets = 0;  // Buckets on the free-bucket list.
+    std::uint16_t recDataSize;         // Data bytes of every record.
+
+    // Makes no bucket.
+    Group(BucketMgr* owner, std::uint16_t dataSize) : parent(owner), recDataSize(dataSize) {}
+    Group(const Group&) = delete;
+    Group& operator=(const Group&) = delete;
+    ~Group() = default;
+
+    // Returns the data of a used record. Fails only with the heap, and then changes nothing.
+    void* Alloc() {
+        Bucket* const bucket = freeBuckets;
+        if (OBR_UNLIKELY(bucket == nullptr)) { return AllocFromNewBucket(); }
+        void* const data = bucket->TakeRecord();
+        if (OBR_UNLIKELY(bucket->IsFull())) { UnlinkFull(); }
+        CheckTouched(*bucket);
+        return data;
+    }
+
+    // Gives back a used record of `bucket`. False, with nothing changed, for null data or another
+    // group's bucket.
+    bool Free(void* data, Bucket* bucket) {
+        if (OBR_UNLIKELY(bucket->parent != this || data == nullptr)) { return false; }
+        const bool wasFull = bucket->IsFull();
+        bucket->ReturnRecord(data);
+        if (OBR_UNLIKELY(bucket->IsEmpty())) { return FreeLastUsed(bucket, wasFull); }
+        if (OBR_UNLIKELY(wasFull)) { LinkFree(bucket); }
+        CheckTouched(*bucket);
+        return true;
+    }
+
+    // Releases all buckets, used or not.
+    void DestroyBuckets();
+
+private:
+    void* AllocFromNewBucket();
+    void UnlinkFull();
+    void LinkFree(Bucket* bucket);
+    bool FreeLastUsed(Bucket* bucket, bool wasFull);
+    void Release(Bucket* bucket, bool wasFull);
+};
+
+}  // namespace OBR::MemPool
+
+#endif

@@ -1,0 +1,108 @@
+// The exported class: names, the size limit, and handles that share a pool. All memory work lies in
+// the BucketMgr behind it, whose short roads are inline here.
+
+#include <MemPool>
+
+#include <iomanip>
+#include <locale>
+#include <memory>
+#include <sstream>
+#include <string>
+
+#include "MemPool/BucketMgr.hpp"
+#include "MemPool/MgrRegistry.hpp"
+#include "diagnostics/Messages.hpp"
+
+namespace OBR::MemPool {
+
+static_assert(sizeof(Mgr) == sizeof(void*), "A handle is one pointer wide.");
+static_assert(sizeof(OBR::vector<Mgr*>) == 16, "One pointer and two 32-bit counts.");
+
+namespace {
+
+std::string NextName() {
+    static std::uint32_t nameCounter = 1;
+    const std::uint32_t number = nameCounter++;
+    std::ostringstream name;
+    name.imbue(std::locale::classic());
+    name << "__OBR_MEMPOOL_" << std::setfill('0') << std::setw(5) << number;
+    return name.str();
+}
+
+}  // namespace
+
+// Closed to hosts, and nothing here calls it.
+Mgr::Mgr(const Mgr&) : bucketMgr(nullptr) {}
+
+Mgr::Mgr(const char* name) : bucketMgr(nullptr) {
+    const std::string poolName = name != nullptr ? name : NextName();
+    if (registry.Find(poolName) != nullptr) { Messages::DuplicateName(poolName); }
+    auto pool = std::make_unique<BucketMgr>(this, poolName);
+    registry.Add(poolName, pool.get());
+    bucketMgr = pool.release();
+}
+
+Mgr::~Mgr() {
+    if (OBR_UNLIKELY(!registry.Sharers().empty())) {
+        // The other handles of this pool lose it.
+        const auto takeFrom = [this](Mgr* other) {
+            if (other != this && other->bucketMgr == bucketMgr) { other->bucketMgr = nullptr; }
+        };
+        if (bucketMgr != nullptr) {
+            if (bucketMgr->mgr != nullptr) { takeFrom(bucketMgr->mgr); }
+            for (Mgr* const sharer : registry.Sharers()) { takeFrom(sharer); }
+        }
+        registry.ForgetHandle(this);
+    }
+    if (bucketMgr == nullptr) { return; }
+    registry.Erase(bucketMgr->name);
+    delete bucketMgr;
+    bucketMgr = nullptr;
+}
+
+Mgr& Mgr::operator=(const Mgr& other) {
+    if (bucketMgr != other.bucketMgr) {
+        registry.AddSharer(this);
+        bucketMgr = other.bucketMgr;
+    }
+    return *this;
+}
+
+void* Mgr::Alloc(unsigned int size) {
+    if (OBR_UNLIKELY(size > maxAllocSize)) { Messages::SizeAboveLimit(size, maxAllocSize); }
+    return bucketMgr->Alloc(size);
+}
+
+bool Mgr::Free(void* data) {
+    return bucketMgr->Free(data);
+}
+
+void Mgr::Clear() {
+    bucketMgr->Clear();
+}
+
+bool Mgr::CollectGarbage() {
+    return false;
+}
+
+bool Mgr::Contains(const void* data) const {
+    return bucketMgr->Contains(data);
+}
+
+unsigned int Mgr::GetSize(const void* data) const {
+    return bucketMgr->GetSize(data);
+}
+
+BucketMgr* Mgr::GetBucketMgr() const {
+    return bucketMgr;
+}
+
+const char* Mgr::GetName() const {
+    return bucketMgr->name.c_str();
+}
+
+bool Mgr::IsEnabled() const {
+    return bucketMgr->enabled;
+}
+
+}  // namespace OBR::MemPool

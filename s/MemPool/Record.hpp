@@ -1,0 +1,101 @@
+// The memory of a pool, byte by byte: what a record and a heap record are made of and how a data
+// pointer leads to its header. With Bucket.hpp the only place that casts or counts in bytes.
+//
+//   Bucket, one heap block                              ExtRec ("heap record"), one heap block
+//
+//   bucket      +----------------------------+          block       +----------------------------+
+//               | parent next1 prev1 next2   |                      | next prev                  |
+//               | prev2 size recSize freeHead|                      | length                     |
+//   recsBase +0 | numFree (2 bytes)          |          block   +20 | RecHdr: AA BB 02 CC        |
+//            +2 +----------------------------+          block   +24 +----------------------------+
+//               | RecHdr | data              |  record 0            | data (length bytes)        |
+//   +2+recSize  +----------------------------+                      +----------------------------+
+//               | RecHdr | data              |  record 1
+//               :                            :          RecHdr, 4 bytes
+//   recsEnd     +----------------------------+
+//    = recsBase + size                                  link (2, low byte first) | type | guard
+//
+// An offset is the 16-bit distance of a record from recsBase, the last two bytes of the bucket's
+// header. The first record thus has offset 2, and offset 0 means none.
+//
+// Words: a record is FREE or USED. The link of a FREE record is the offset of the next free one, 0
+// at the end of the list; that of a USED record is its own offset, which leads from its data back
+// to the bucket. EXT marks a heap record.
+
+#ifndef OBR_MEMPOOL_RECORD_HPP
+#define OBR_MEMPOOL_RECORD_HPP
+
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+
+#define OBR_UNLIKELY(condition) __builtin_expect(static_cast<bool>(condition), 0)
+#define OBR_NOINLINE __attribute__((noinline))
+
+// For code that looks at the bytes ahead of a pointer which may be anybody's. They are read as the
+// pool reads its own, whatever a sanitizer knows of them.
+#define OBR_READS_FOREIGN __attribute__((no_sanitize("address", "alignment", "object-size")))
+
+namespace OBR::MemPool {
+
+// Keeps the stores to a block that is about to be released: an optimiser takes them for dead, but
+// they are what tells a pointer that comes back too late from one that is alive.
+inline void KeepStores(const void* block) {
+    __asm__ volatile("" : : "r"(block) : "memory");
+}
+
+// Written as plain bytes: a header can hold any other value where memory was damaged.
+constexpr std::uint8_t typeFree = 0;
+constexpr std::uint8_t typeUsed = 1;
+constexpr std::uint8_t typeExt = 2;
+
+// A record's header. `link` is two bytes, never one 16-bit access: a record may start anywhere.
+struct RecHdr {
+    std::uint8_t linkLow;   // FREE: offset of the next free record; USED: own offset; EXT: 0xAA.
+    std::uint8_t linkHigh;  // The same offset's high byte; EXT: 0xBB.
+    std::uint8_t type;      // typeFree, typeUsed or typeExt.
+    std::uint8_t guard;     // EXT: 0xCC. In a bucket nobody reads or writes it.
+
+    std::uint16_t Link() const { return static_cast<std::uint16_t>(linkLow | linkHigh << 8); }
+    void SetLink(std::uint16_t offset) {
+        linkLow = static_cast<std::uint8_t>(offset);
+        linkHigh = static_cast<std::uint8_t>(offset >> 8);
+    }
+
+    // The caller's data lie directly behind the header.
+    void* Data() { return this + 1; }
+    static RecHdr* Of(void* data) { return static_cast<RecHdr*>(data) - 1; }
+    static const RecHdr* Of(const void* data) { return static_cast<const RecHdr*>(data) - 1; }
+};
+static_assert(sizeof(RecHdr) == 4, "The data of every record start 4 bytes behind its header.");
+static_assert(alignof(RecHdr) == 1, "A record may start at any address.");
+
+// The header of a heap record. Nothing in it tells which pool it belongs to.
+struct ExtRec {
+    ExtRec* next;          // Next in the pool's list, null at the end.
+    ExtRec* prev;          // Previous one, null at the front.
+    std::uint32_t length;  // Bytes asked for, not rounded. 0: no test takes it for a heap record.
+    RecHdr hdr;            // Stands where a record's header stands: 4 bytes ahead of the data.
+
+    void* Data() { return this + 1; }
+    static ExtRec* Of(void* data) { return static_cast<ExtRec*>(data) - 1; }
+
+    // The length of the heap record at `data`, or 0 if the bytes there are not one's.
+    OBR_READS_FOREIGN static std::uint32_t LengthAt(const void* data) {
+        const RecHdr* const hdr = RecHdr::Of(data);
+        if (hdr->linkLow != 0xAA || hdr->linkHigh != 0xBB || hdr->type != typeExt ||
+            hdr->guard != 0xCC) {
+            return 0;
+        }
+        std::uint32_t length;  // Copied: a foreign pointer may lie anywhere.
+        std::memcpy(&length, hdr - 1, sizeof length);
+        return length;
+    }
+};
+static_assert(sizeof(ExtRec) == 24, "A heap record costs 24 bytes.");
+static_assert(offsetof(ExtRec, length) == 16 && offsetof(ExtRec, hdr) == 20,
+              "The length stands 8 bytes ahead of the data and the header 4.");
+
+}  // namespace OBR::MemPool
+
+#endif

@@ -1,0 +1,124 @@
+// The exact texts. A message has a fixed number, which is its name for those who search for it; it
+// is no position in these files.
+
+#include "diagnostics/Messages.hpp"
+
+#include <cstdlib>
+#include <iomanip>
+#include <iostream>
+#include <locale>
+#include <sstream>
+
+#include <MemPool>
+
+#include "MemPool/Settings.hpp"
+
+namespace OBR::MemPool {
+
+namespace {
+
+constexpr const char* sourcePath = "../s/MemPool";
+
+// Writes one whole line. The stream's own fill and justification hold for the number's width.
+template <typename... Pieces>
+void WriteLine(const char* severity, int number, const Pieces&... pieces) {
+    std::cout << severity << ":" << sourcePath << ":" << std::setw(5) << number << ": ";
+    (std::cout << ... << pieces) << std::endl;
+}
+
+template <typename... Pieces>
+[[noreturn]] void Stop(int number, const Pieces&... pieces) {
+    WriteLine("ERROR", number, pieces...);
+    std::exit(1);
+}
+
+template <typename... Pieces>
+void Warn(int number, const Pieces&... pieces) {
+    WriteLine("WARNING", number, pieces...);
+}
+
+template <typename... Pieces>
+void Inform(int number, const Pieces&... pieces) {
+    WriteLine("INFO", number, pieces...);
+}
+
+}  // namespace
+
+namespace Messages {
+
+void DuplicateName(const std::string& name) {
+    Stop(1645, "Duplicate Obr_MemPool::Mgr name encountered '", name, "'");
+}
+
+void SizeAboveLimit(std::uint32_t size, std::uint32_t limit) {
+    Stop(1711, "Cannot allocate ", size, " bytes, ", "the maximum is ", limit);
+}
+
+void MaxRecordAboveBucket(std::uint32_t maxRecordSize, std::uint32_t room,
+                          std::uint32_t bucketSize) {
+    Stop(1988, "Unexpected condition: ", "the maximum record size is larger than ",
+         "the bucket size (", maxRecordSize, ">", room, ") [", bucketSize, "]");
+}
+
+void MinRecordAboveMax(std::uint32_t minRecordSize, std::uint32_t maxRecordSize) {
+    Stop(1996, "Unexpected condition: ", "the min rec size is larger than ", "the max rec size (",
+         minRecordSize, ">", maxRecordSize, ")");
+}
+
+void InvalidFreeRecord(const char* kind) {
+    Stop(2640, "Invalid free record ", "FREE", " != ", kind);
+}
+
+void FreeListTooLong(std::uint32_t walked, std::uint32_t totalRecs) {
+    Stop(2648, "Exceeded the total number of recs ", walked, " > ", totalRecs);
+}
+
+void TooManyRows(std::uint32_t rows, std::uint32_t totalRecs) {
+    Warn(2916, "Exceeded the total number of recs ", rows, " > ", totalRecs);
+}
+
+void TooFewRows(std::uint32_t rows, std::uint32_t totalRecs) {
+    Warn(2922, "Did not reach the expected number of recs ", rows, " < ", totalRecs);
+}
+
+void TooManyFreeRows(std::uint32_t rows, std::uint32_t totalRecs) {
+    Warn(2970, "Exceeded the number of total number of recs ", rows, " > ", totalRecs);
+}
+
+// Truth values are shown as 1 and 0, however the stream would write a bool.
+void Banner() {
+    const std::string rule = "# " + std::string(48, '=');
+    Inform(3259, rule);
+    Inform(3260, "# NUV_OBR_MEMPOOL_INFO");
+    Inform(3261, rule);
+    Inform(3262, "# Version            : ", GetVersion());
+    Inform(3263, "# Bucket Size        : ", Settings::bucketSize);
+    Inform(3264, "# Data Alignment     : ", Settings::dataAlignment);
+    Inform(3265, "# Keep Empty Buckets : ", int{Settings::keepEmptyBuckets});
+    Inform(3266, "# Max Record Size    : ", Settings::maxRecordSize);
+    Inform(3267, "# Min Record Size    : ", Settings::minRecordSize);
+    Inform(3268, "# Trace              : ", int{Settings::trace});
+    Inform(3269, "# Use Heap           : ", int{Settings::off});
+}
+
+const char* MinRecordNotBelowMax(std::uint32_t minRecordSize, std::uint32_t maxRecordSize) {
+    static std::string text;
+    std::ostringstream line;
+    line.imbue(std::locale::classic());
+    line << "EXCEPTION:" << sourcePath << ":" << 3337 << ": "
+         << "MIN_RECORD_SIZE >= MAX_RECORD_SIZE (" << minRecordSize << ">=" << maxRecordSize << ")";
+    text = line.str();
+    std::cerr << text << std::endl;
+    return text.c_str();
+}
+
+}  // namespace Messages
+
+void MYASSERT(const char* text, const char* file, std::int32_t line) {
+    std::cout << "MYASSERT:" << file << ":" << std::setw(5) << line << ": " << text << std::endl;
+    std::cout << "\tSet your debug breakpoint in " << sourcePath << " at line " << 100 << "."
+              << std::endl;
+    std::exit(1);
+}
+
+}  // namespace OBR::MemPool
