@@ -24,13 +24,10 @@ Bucket* Bucket::Create(Group* parent, std::uint32_t bucketSize, std::uint32_t re
 
     std::uint32_t offset = firstOffset;
     for (std::uint32_t next = offset + recSize; next < size; next += recSize) {
-        RecHdr* const record = bucket->RecordAt(offset);
-        record->SetLink(static_cast<std::uint16_t>(next));
-        record->type = typeFree;
+        bucket->RecordAt(offset)->Mark(typeFree, static_cast<std::uint16_t>(next));
         offset = next;
     }
-    bucket->RecordAt(offset)->SetLink(0);
-    bucket->RecordAt(offset)->type = typeFree;
+    bucket->RecordAt(offset)->Mark(typeFree, 0);
     return bucket;
 }
 

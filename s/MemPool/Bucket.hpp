@@ -56,23 +56,22 @@ public:
 
     // Takes the first free record; there must be one. Returns its data.
     void* TakeRecord() {
-        const std::uint16_t offset = freeHead;
+        const std::uint32_t state = FreeState();
+        const auto offset = static_cast<std::uint16_t>(state);
         RecHdr* const record = RecordAt(offset);
-        freeHead = record->Link();
-        record->SetLink(offset);
-        record->type = typeUsed;
-        --numFree;
+        const std::uint32_t hdr = record->Word();
+        record->SetWord(RecHdr::Marked(hdr, typeUsed, offset));
+        SetFreeState(((state - oneFree) & numFreeMask) | RecHdr::LinkOf(hdr));
         return record->Data();
     }
 
     // Puts the used record of these data in front of the free list.
     void ReturnRecord(void* data) {
+        const std::uint32_t state = FreeState();
         RecHdr* const record = RecHdr::Of(data);
-        const std::uint16_t offset = record->Link();
-        record->SetLink(freeHead);
-        record->type = typeFree;
-        freeHead = offset;
-        ++numFree;
+        const std::uint32_t hdr = record->Word();
+        record->SetWord(RecHdr::Marked(hdr, typeFree, static_cast<std::uint16_t>(state)));
+        SetFreeState(((state + oneFree) & numFreeMask) | RecHdr::LinkOf(hdr));
     }
 
     // The bucket that a record's own link leads to.
@@ -130,6 +129,20 @@ public:
     // Stops the process at the first fault of the free list.
     void CheckFreeList() const;
 
+private:
+    // freeHead and numFree in one load or store, for the same reason as a record's header.
+    std::uint32_t FreeState() const {
+        std::uint32_t state;
+        std::memcpy(&state, RecsBase() - sizeof freeHead, sizeof state);
+        return state;
+    }
+    void SetFreeState(std::uint32_t state) {
+        std::memcpy(RecsBase() - sizeof freeHead, &state, sizeof state);
+    }
+    static constexpr std::uint32_t oneFree = 0x10000;
+    static constexpr std::uint32_t numFreeMask = 0xFFFF0000;
+
+public:
     static constexpr std::uint16_t firstOffset = 2;    // Offset of the first record.
     static constexpr std::uint32_t baseDistance = 46;  // From the bucket's address to recsBase.
 };

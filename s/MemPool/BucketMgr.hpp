@@ -5,6 +5,7 @@
 #ifndef OBR_MEMPOOL_BUCKETMGR_HPP
 #define OBR_MEMPOOL_BUCKETMGR_HPP
 
+#include <algorithm>
 #include <cassert>
 #include <cstdint>
 #include <iosfwd>
@@ -88,9 +89,9 @@ public:
     // anybody's; the same in an enabled and a disabled pool, as for the two questions below.
     OBR_READS_FOREIGN Bucket* FindBucket(void* data) const {
         if (data == nullptr) { return nullptr; }
-        const RecHdr* const record = RecHdr::Of(data);
-        if (record->type != typeUsed) { return nullptr; }
-        const std::uint16_t offset = record->Link();
+        const std::uint32_t hdr = RecHdr::Of(data)->Word();
+        if (RecHdr::TypeOf(hdr) != typeUsed) { return nullptr; }
+        const std::uint16_t offset = RecHdr::LinkOf(hdr);
         if (offset < Bucket::firstOffset) { return nullptr; }
         Bucket* const bucket = Bucket::Holding(data, offset);
         const Group* const owner = bucket->Owner();
@@ -121,7 +122,7 @@ private:
     std::uint32_t ShortIndex(std::uint32_t size) const {
         const std::uint32_t below = size - static_cast<std::uint32_t>(size != 0);
         const std::uint32_t step = (below >> alignmentShift) + headerSteps;
-        return step < firstStep ? 0 : step - firstStep;
+        return std::max<std::uint32_t>(step, firstStep) - firstStep;
     }
 
     void RoundRecordSizes();

@@ -19,30 +19,28 @@ OBR_NOINLINE void* Group::AllocFromNewBucket() {
     return Alloc();
 }
 
-// The front bucket has given away its last free record.
-OBR_NOINLINE void Group::UnlinkFull() {
+// The front bucket has given away its last free record, the one with these data.
+OBR_NOINLINE void* Group::UnlinkFull(void* data) {
     --numFreeBuckets;
     freeBuckets = freeBuckets->next2;
     if (freeBuckets != nullptr) { freeBuckets->prev2 = nullptr; }
+    return data;
 }
 
 // A bucket with a free record enters in front. Its prev2 is null already: since it left the front,
 // or since it was made.
-OBR_NOINLINE void Group::LinkFree(Bucket* bucket) {
+OBR_NOINLINE bool Group::LinkFree(Bucket* bucket) {
     ++numFreeBuckets;
     bucket->next2 = freeBuckets;
     if (freeBuckets != nullptr) { freeBuckets->prev2 = bucket; }
     freeBuckets = bucket;
+    return true;
 }
 
 // A bucket's last used record has come back.
 OBR_NOINLINE bool Group::FreeLastUsed(Bucket* bucket, bool wasFull) {
-    if (parent->keepEmptyBuckets) {
-        if (wasFull) { LinkFree(bucket); }
-        CheckTouched(*bucket);
-    } else {
-        Release(bucket, wasFull);
-    }
+    if (parent->keepEmptyBuckets) { return wasFull ? LinkFree(bucket) : true; }
+    Release(bucket, wasFull);
     return true;
 }
 

@@ -40,9 +40,8 @@ public:
         Bucket* const bucket = freeBuckets;
         if (OBR_UNLIKELY(bucket == nullptr)) { return AllocFromNewBucket(); }
         void* const data = bucket->TakeRecord();
-        if (OBR_UNLIKELY(bucket->IsFull())) { UnlinkFull(); }
         CheckTouched(*bucket);
-        return data;
+        return OBR_UNLIKELY(bucket->IsFull()) ? UnlinkFull(data) : data;
     }
 
     // Gives back a used record of `bucket`. False, with nothing changed, for null data or another
@@ -51,20 +50,21 @@ public:
         if (OBR_UNLIKELY(bucket->parent != this || data == nullptr)) { return false; }
         const bool wasFull = bucket->IsFull();
         bucket->ReturnRecord(data);
-        if (OBR_UNLIKELY(bucket->IsEmpty())) { return FreeLastUsed(bucket, wasFull); }
-        if (OBR_UNLIKELY(wasFull)) { LinkFree(bucket); }
         CheckTouched(*bucket);
-        return true;
+        if (OBR_UNLIKELY(bucket->IsEmpty())) { return FreeLastUsed(bucket, wasFull); }
+        return OBR_UNLIKELY(wasFull) ? LinkFree(bucket) : true;
     }
 
     // Releases all buckets, used or not.
     void DestroyBuckets();
 
 private:
+    // These end the short roads above and return what their callers do.
     void* AllocFromNewBucket();
-    void UnlinkFull();
-    void LinkFree(Bucket* bucket);
+    void* UnlinkFull(void* data);
+    bool LinkFree(Bucket* bucket);
     bool FreeLastUsed(Bucket* bucket, bool wasFull);
+
     void Release(Bucket* bucket, bool wasFull);
 };
 
