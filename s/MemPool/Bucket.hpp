@@ -61,7 +61,9 @@ public:
         RecHdr* const record = RecordAt(offset);
         const std::uint32_t hdr = record->Word();
         record->SetWord(RecHdr::Marked(hdr, typeUsed, offset));
-        SetFreeState(((state - oneFree) & numFreeMask) | RecHdr::LinkOf(hdr));
+        const std::uint16_t next = RecHdr::LinkOf(hdr);
+        SetFreeState(((state - oneFree) & numFreeMask) | next);
+        __builtin_prefetch(RecordAt(next));
         return record->Data();
     }
 
