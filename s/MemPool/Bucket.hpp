@@ -61,11 +61,13 @@ public:
         RecHdr* const record = RecordAt(offset);
         const std::uint32_t hdr = record->Word();
         record->SetWord(RecHdr::Marked(hdr, typeUsed, offset));
-        const std::uint16_t next = RecHdr::LinkOf(hdr);
-        SetFreeState(((state - oneFree) & numFreeMask) | next);
-        __builtin_prefetch(RecordAt(next));
+        SetFreeState(((state - oneFree) & numFreeMask) | RecHdr::LinkOf(hdr));
+        PrefetchFirstFree();
         return record->Data();
     }
+
+    // The next record to be taken is one that nothing has touched since it was freed.
+    void PrefetchFirstFree() const { __builtin_prefetch(RecordAt(freeHead)); }
 
     // Puts the used record of these data in front of the free list.
     void ReturnRecord(void* data) {

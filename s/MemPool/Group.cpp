@@ -23,7 +23,10 @@ OBR_NOINLINE void* Group::AllocFromNewBucket() {
 OBR_NOINLINE void* Group::UnlinkFull(void* data) {
     --numFreeBuckets;
     freeBuckets = freeBuckets->next2;
-    if (freeBuckets != nullptr) { freeBuckets->prev2 = nullptr; }
+    if (freeBuckets != nullptr) {
+        freeBuckets->prev2 = nullptr;
+        freeBuckets->PrefetchFirstFree();
+    }
     return data;
 }
 
