@@ -19,15 +19,14 @@ Bucket* Bucket::Create(Group* parent, std::uint32_t bucketSize, std::uint32_t re
     bucket->prev2 = nullptr;
     bucket->size = static_cast<std::uint16_t>(size);
     bucket->recSize = static_cast<std::uint16_t>(recSize);
-    bucket->freeHead = firstOffset;
-    bucket->numFree = static_cast<std::uint16_t>(totalRecs);
+    bucket->SetFreeState(totalRecs * oneFree + firstOffset);
 
-    std::uint32_t offset = firstOffset;
-    for (std::uint32_t next = offset + recSize; next < size; next += recSize) {
-        bucket->RecordAt(offset)->Mark(typeFree, static_cast<std::uint16_t>(next));
-        offset = next;
+    RecHdr* record = bucket->RecordAt(firstOffset);
+    for (std::uint32_t next = firstOffset + recSize; next < size; next += recSize) {
+        record->Format(static_cast<std::uint16_t>(next));
+        record = bucket->RecordAt(next);
     }
-    bucket->RecordAt(offset)->Mark(typeFree, 0);
+    record->Format(0);
     return bucket;
 }
 
