@@ -72,9 +72,6 @@ struct RecHdr {
     }
 
     std::uint16_t Link() const { return LinkOf(Word()); }
-    void Mark(std::uint8_t newType, std::uint16_t newLink) {
-        SetWord(Marked(Word(), newType, newLink));
-    }
 
     // Makes a FREE record of raw memory. Two stores: a run of records is faster made so than with
     // their guards read in order to be kept.
