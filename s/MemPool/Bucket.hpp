@@ -47,9 +47,12 @@ public:
     static void Destroy(Bucket* bucket);
 
     // The number of records. It is stored nowhere.
+    // 0 for a header so damaged that it has no record size.
     std::int32_t TotalRecs() const {
+        if (recSize == 0) { return 0; }
         return (std::int32_t{size} - std::int32_t{firstOffset}) / std::int32_t{recSize};
     }
+    std::uint32_t DataSize() const { return recSize - std::uint32_t{sizeof(RecHdr)}; }
     // The same question as numFree == TotalRecs(), without its division.
     bool IsEmpty() const { return std::uint32_t{numFree} * recSize + firstOffset == size; }
     bool IsFull() const { return numFree == 0; }
@@ -147,6 +150,22 @@ private:
     static constexpr std::uint32_t numFreeMask = 0xFFFF0000;
 
 public:
+    // For reports of a bucket that may be damaged: whether a whole record lies at `offset`, and the
+    // type of a record, unless its header reaches beyond the bucket.
+    bool HasRecordAt(std::uint32_t offset) const {
+        return offset >= firstOffset && recSize != 0 && (offset - firstOffset) % recSize == 0 &&
+               offset + recSize <= size;
+    }
+    std::uint8_t TypeAt(std::uint32_t offset) const {
+        return offset + sizeof(RecHdr) <= size ? RecordAt(offset)->type : typeUnknown;
+    }
+    std::uint16_t LinkAt(std::uint32_t offset) const {
+        return offset + sizeof(RecHdr) <= size ? RecordAt(offset)->Link() : std::uint16_t{0};
+    }
+    std::uint16_t OffsetOf(const RecHdr* record) const {
+        return static_cast<std::uint16_t>(reinterpret_cast<const char*>(record) - RecsBase());
+    }
+
     static constexpr std::uint16_t firstOffset = 2;    // Offset of the first record.
     static constexpr std::uint32_t baseDistance = 46;  // From the bucket's address to recsBase.
 };

@@ -48,6 +48,7 @@ inline void KeepStores(const void* block) {
 constexpr std::uint8_t typeFree = 0;
 constexpr std::uint8_t typeUsed = 1;
 constexpr std::uint8_t typeExt = 2;
+constexpr std::uint8_t typeUnknown = 0xFF;  // What reports take for a header that lies nowhere.
 
 // A record's header. A record may start at any address: its header is copied byte by byte, low byte
 // of the link first. All four bytes go in one copy, of which a compiler makes one load or store.
@@ -58,7 +59,7 @@ struct RecHdr {
     std::uint8_t type;     // typeFree, typeUsed or typeExt.
     std::uint8_t guard;    // EXT: CC. In a bucket it stays what the heap's memory held.
 
-    std::uint32_t Word() const {
+    OBR_READS_FOREIGN std::uint32_t Word() const {
         std::uint32_t word;
         std::memcpy(&word, this, sizeof word);
         return word;
@@ -98,6 +99,7 @@ struct ExtRec {
     RecHdr hdr;            // Stands where a record's header stands: 4 bytes ahead of the data.
 
     void* Data() { return this + 1; }
+    const void* Data() const { return this + 1; }
     static ExtRec* Of(void* data) { return static_cast<ExtRec*>(data) - 1; }
 
     // The length of the heap record at `data`, or 0 if the bytes there are not one's.
