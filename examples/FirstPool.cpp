@@ -1,0 +1,16 @@
+// The first program of the README.
+
+#include <MemPool>
+#include <iostream>
+
+int main() {
+    OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);  // Pools built from now on carve records.
+    OBR::MemPool::Mgr symbols("symbols");
+
+    void* name = symbols.Alloc(10);
+    void* table = symbols.Alloc(5000);
+    std::cout << symbols.GetSize(name) << " and " << symbols.GetSize(table) << " bytes\n";
+
+    symbols.Free(name);
+    symbols.Clear();  // Drops at once whatever is left.
+}

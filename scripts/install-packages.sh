@@ -1,0 +1,38 @@
+#!/usr/bin/env bash
+# Installs the Debian packages that the named jobs need and that are missing: build, test, lint and
+# bench, in any number. Without the right to install it prints the command that would, and fails.
+set -euo pipefail
+
+packages=()
+for job in "$@"; do
+    case $job in
+        build) packages+=(g++ cmake ninja-build libcli11-dev libgtest-dev zlib1g-dev) ;;
+        test) packages+=(clang libclang-rt-14-dev binutils pkg-config) ;;
+        lint) packages+=(git clang-format clang-tidy shellcheck) ;;
+        bench) packages+=(libbenchmark-dev libmimalloc2.0 libjemalloc2 libtcmalloc-minimal4
+            libboost-dev gnuplot-nox python3) ;;
+        *)
+            echo "install-packages.sh: unknown job '$job'" >&2
+            exit 2
+            ;;
+    esac
+done
+
+missing=()
+for package in "${packages[@]}"; do
+    state=$(dpkg-query --show --showformat='${db:Status-Status}' "$package" 2>/dev/null || true)
+    [ "$state" = installed ] || missing+=("$package")
+done
+if [ ${#missing[@]} -eq 0 ]; then
+    exit 0
+fi
+
+if [ "$(id -u)" -ne 0 ]; then
+    echo "Some packages are missing. Install them with:" >&2
+    echo "    sudo apt-get update && sudo apt-get install --no-install-recommends ${missing[*]}" >&2
+    exit 1
+fi
+echo "Installing ${missing[*]}"
+export DEBIAN_FRONTEND=noninteractive
+apt-get update -q
+apt-get install -q -y --no-install-recommends "${missing[@]}"
