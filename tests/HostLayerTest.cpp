@@ -1,0 +1,124 @@
+// A host's own layer takes the place of the stand-in when it is linked: the start-up asks it for
+// each variable in turn, and nothing else.
+
+#include "HostLayer/HostEnv.hpp"
+
+#include <MemPool>
+#include <iostream>
+#include <map>
+#include <new>
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include "MemPool/Settings.hpp"
+
+using namespace OBR::MemPool;
+
+namespace {
+
+// Local statics, since the start-up runs ahead of this file's own.
+std::map<std::string, const char*>& Values() {
+    static std::map<std::string, const char*> values;
+    return values;
+}
+std::vector<std::string>& Asked() {
+    static std::vector<std::string> names;
+    return names;
+}
+
+alignas(Mgr) char early[sizeof(Mgr)];
+const Mgr* earlyPool = nullptr;
+
+}  // namespace
+
+// Nothing keeps a host's layer from building a pool when it is first asked.
+const char* Host_Env::GetEnv(const char* name) {
+    if (Asked().empty()) { earlyPool = new (early) Mgr("early"); }
+    Asked().push_back(name);
+    const auto value = Values().find(name);
+    return value == Values().end() ? nullptr : value->second;
+}
+
+namespace {
+
+const std::vector<std::string> order = {
+    "NUV_OBR_MEMPOOL_ON",
+    "NUV_MEMPOOL_ON",
+    "NUV_OBR_MEMPOOL_TRACE",
+    "NUV_OBR_MEMPOOL_BUCKET_SIZE",
+    "NUV_OBR_MEMPOOL_MAX_RECORD_SIZE",
+    "NUV_OBR_MEMPOOL_MIN_RECORD_SIZE",
+    "NUV_OBR_MEMPOOL_DATA_ALIGNMENT",
+    "NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS",
+    "NUV_OBR_MEMPOOL_INFO",
+};
+
+class HostLayer : public testing::Test {
+protected:
+    // The names that a start-up asks for under these values.
+    static std::vector<std::string> StartUp(const std::map<std::string, const char*>& values) {
+        Values() = values;
+        Asked().assign(1, "");
+        EnvInit();
+        Asked().erase(Asked().begin());
+        return Asked();
+    }
+};
+
+TEST_F(HostLayer, TheStartUpFindsTheRegistryReady) {
+    EXPECT_EQ(Asked(), order);
+    EXPECT_EQ(GetNumMgrs(), 1u);
+    EXPECT_EQ(GetMgr("early"), earlyPool);
+}
+
+TEST_F(HostLayer, VariablesAreReadOnceEachInOrder) {
+    EXPECT_EQ(StartUp({{"NUV_OBR_MEMPOOL_ON", "0"}}), order);
+
+    auto withoutSecond = order;
+    withoutSecond.erase(withoutSecond.begin() + 1);
+    EXPECT_EQ(StartUp({{"NUV_OBR_MEMPOOL_ON", "1"}, {"NUV_MEMPOOL_ON", "0"}}), withoutSecond);
+    EXPECT_TRUE(NUV_OBR_MEMPOOL_ON());
+}
+
+// Another start-up in the same process tells which values are stored and which are left.
+TEST_F(HostLayer, TheStartUpStoresEveryDefaultButTheTrace) {
+    NUV_OBR_MEMPOOL_TRACE(true);
+    NUV_OBR_MEMPOOL_ON(true);
+    NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS(true);
+    NUV_OBR_MEMPOOL_BUCKET_SIZE(1);
+    NUV_OBR_MEMPOOL_MAX_RECORD_SIZE(1);
+    NUV_OBR_MEMPOOL_MIN_RECORD_SIZE(1);
+    NUV_OBR_MEMPOOL_DATA_ALIGNMENT(1);
+    StartUp({{"NUV_OBR_MEMPOOL_TRACE", "0"}});
+    EXPECT_TRUE(NUV_OBR_MEMPOOL_TRACE());
+    EXPECT_TRUE(NUV_OBR_MEMPOOL_OFF());
+    EXPECT_FALSE(NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS());
+    EXPECT_EQ(NUV_OBR_MEMPOOL_BUCKET_SIZE(), 4010u);
+    EXPECT_EQ(NUV_OBR_MEMPOOL_MAX_RECORD_SIZE(), 1000u);
+    EXPECT_EQ(NUV_OBR_MEMPOOL_MIN_RECORD_SIZE(), 8u);
+    EXPECT_EQ(NUV_OBR_MEMPOOL_DATA_ALIGNMENT(), 4u);
+    NUV_OBR_MEMPOOL_TRACE(false);
+
+    StartUp({{"NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS", "1"}});
+    EXPECT_TRUE(NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS());
+}
+
+TEST_F(HostLayer, TheRefusalCarriesItsTextBeyondTheStartUp) {
+    const std::string line =
+        "EXCEPTION:../s/MemPool:3337: MIN_RECORD_SIZE >= MAX_RECORD_SIZE (2000>=1000)";
+    std::ostringstream errors;
+    std::streambuf* const former = std::cerr.rdbuf(errors.rdbuf());
+    const char* refusal = "";
+    try {
+        StartUp({{"NUV_OBR_MEMPOOL_MIN_RECORD_SIZE", "2000"}});
+    } catch (const char* text) { refusal = text; }
+    std::cerr.rdbuf(former);
+    EXPECT_EQ(refusal, line);
+    EXPECT_EQ(errors.str(), line + "\n");
+    StartUp({});
+}
+
+}  // namespace
