@@ -126,23 +126,16 @@ TEST(Load, PoolsOutliveTheExitStep) {
 
 // The second handle leaves its own pool, which nothing destroys, for the first one's.
 TEST(Load, ASharedPoolEndsOnceBehindTheExitStep) {
-    void (*const inEitherOrder[])() = {
-        [] {
-            std::puts("host");
-            plugin->destroy(&first);
-            plugin->destroy(&second);
-            std::puts("done");
-        },
-        [] {
-            std::puts("host");
-            plugin->destroy(&second);
-            plugin->destroy(&first);
-            std::puts("done");
-        },
-    };
-    for (const auto atExit : inEitherOrder) {
-        const auto run = [atExit] {
-            LoadBehind(atExit);
+    static bool isMakerFirst;
+    for (const bool value : {true, false}) {
+        isMakerFirst = value;
+        const auto run = [] {
+            LoadBehind([] {
+                std::puts("host");
+                plugin->destroy(isMakerFirst ? &first : &second);
+                plugin->destroy(isMakerFirst ? &second : &first);
+                std::puts("done");
+            });
             plugin->share(&second, &first);
             plugin->showPools("second");
             std::exit(0);
