@@ -147,4 +147,25 @@ TEST(Load, ASharedPoolEndsOnceBehindTheExitStep) {
     }
 }
 
+// A pool whose maker has left it for another one forgets that maker when it is destroyed: what
+// stands in its place afterwards is the host's own.
+TEST(Load, ADestroyedHandlesPlaceIsLeftAloneBehindTheExitStep) {
+    const auto run = [] {
+        LoadBehind([] {
+            void* const shared = third.handle;
+            plugin->destroy(&second);
+            second.handle = shared;
+            plugin->destroy(&third);
+            std::puts(second.handle == shared ? "left alone" : "changed");
+        });
+        plugin->build(&third, "third");
+        plugin->share(&third, &second);
+        plugin->share(&second, &first);
+        std::exit(0);
+    };
+    EXPECT_EXIT(run(), ExitedWithCode(0),
+                MatchesRegex(builtOwn + built + built + built + destroyed +  //
+                             destroyed + destroyed + "left alone\n"));
+}
+
 }  // namespace

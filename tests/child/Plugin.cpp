@@ -10,8 +10,9 @@ using namespace OBR::MemPool;
 
 static const Mgr own("own");
 
-// The pool that a handle has left, so that a leak checker still knows it.
-const void* abandoned = nullptr;
+// The pools that handles have left, so that a leak checker still knows them.
+const void* abandoned[2] = {};
+const void** nextAbandoned = abandoned;
 
 extern "C" {
 
@@ -23,7 +24,7 @@ void Build(void* place, const char* name) {
 }
 
 void Share(void* left, const void* right) {
-    abandoned = static_cast<Mgr*>(left)->GetBucketMgr();
+    *nextAbandoned++ = static_cast<Mgr*>(left)->GetBucketMgr();
     *static_cast<Mgr*>(left) = *static_cast<const Mgr*>(right);
 }
 
