@@ -8,6 +8,7 @@ execute_process(COMMAND ${NM} -D --defined-only ${LIBRARY}
                 OUTPUT_VARIABLE symbols COMMAND_ERROR_IS_FATAL ANY)
 string(REGEX MATCHALL " [A-Za-z] [^ \n]+" symbols "${symbols}")
 list(TRANSFORM symbols STRIP)
+list(TRANSFORM symbols REPLACE "^(A [^@]+)@@.*" "\\1")  # A version, which LLVM's nm repeats.
 file(STRINGS ${EXPECTED} expected)
 set(surplus ${symbols})
 list(REMOVE_ITEM surplus ${expected})

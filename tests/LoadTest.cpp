@@ -32,9 +32,9 @@ struct Plugin {
     }
 
     void* const file = dlopen(PLUGIN, RTLD_NOW);
-    void (*build)(Place* place, const char* name);
-    void (*share)(Place* left, const Place* right);
-    void (*destroy)(Place* place);
+    void (*build)(void* place, const char* name);
+    void (*share)(void* left, const void* right);
+    void (*destroy)(void* place);
     void (*showPools)(const char* name);
 
 private:
