@@ -1,0 +1,29 @@
+# What an install consists of: the shared library with its links, its header, and the packages by
+# which CMake (ObrMemPool) and pkg-config (ObrMemPool.pc) find them. An install may be moved: the
+# packages find the rest from where they lie themselves. The library depends on nothing that its
+# users would have to find, not even with a host layer, which it links privately.
+
+include(CMakePackageConfigHelpers)
+
+install(TARGETS MemPool EXPORT ObrMemPool)
+install(FILES ${PROJECT_SOURCE_DIR}/include/MemPool DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})
+
+set(packageDir ${CMAKE_INSTALL_LIBDIR}/cmake/ObrMemPool)
+install(EXPORT ObrMemPool
+    NAMESPACE MemPool::
+    FILE ObrMemPoolConfig.cmake
+    DESTINATION ${packageDir})
+write_basic_package_version_file(ObrMemPoolConfigVersion.cmake COMPATIBILITY SameMajorVersion)
+install(FILES ${CMAKE_CURRENT_BINARY_DIR}/ObrMemPoolConfigVersion.cmake
+    DESTINATION ${packageDir})
+
+# A folder below the prefix is told from the prefix, one elsewhere by its whole path.
+set(pkgConfigDir ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
+cmake_path(ABSOLUTE_PATH pkgConfigDir BASE_DIRECTORY ${CMAKE_INSTALL_PREFIX}
+    OUTPUT_VARIABLE fullPkgConfigDir)
+cmake_path(RELATIVE_PATH CMAKE_INSTALL_PREFIX BASE_DIRECTORY ${fullPkgConfigDir}
+    OUTPUT_VARIABLE pkgConfigDirToPrefix)
+cmake_path(APPEND pkgConfigLibDir "\${prefix}" ${CMAKE_INSTALL_LIBDIR})
+cmake_path(APPEND pkgConfigIncludeDir "\${prefix}" ${CMAKE_INSTALL_INCLUDEDIR})
+configure_file(${CMAKE_CURRENT_LIST_DIR}/ObrMemPool.pc.in ObrMemPool.pc @ONLY)
+install(FILES ${CMAKE_CURRENT_BINARY_DIR}/ObrMemPool.pc DESTINATION ${pkgConfigDir})
