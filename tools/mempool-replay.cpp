@@ -129,7 +129,6 @@ struct BadLine {
 struct TracedPool {
     std::string name;                       // Its address, as the trace shows it.
     std::vector<std::uint32_t> neverFreed;  // Its blocks when it was destroyed, or at the end.
-    bool destroyed = false;
 };
 
 struct Trace {
@@ -257,7 +256,7 @@ private:
         const auto index = static_cast<std::uint32_t>(trace.pools.size());
         std::ostringstream name;
         name << std::hex << std::setw(16) << std::setfill('0') << address;
-        trace.pools.push_back({name.str(), {}, false});
+        trace.pools.push_back({name.str(), {}});
         livePools.emplace(address, LivePool{index, {}});
         AddEvent(Kind::PoolCreated, index, {});
     }
@@ -290,7 +289,6 @@ private:
 
     void DestroyPool(const LivePool& pool) {
         AddEvent(Kind::PoolDestroyed, pool.index, {});
-        trace.pools[pool.index].destroyed = true;
         EndPool(pool);
     }
 
@@ -373,7 +371,15 @@ Trace ReadTrace(const std::string& path, const Progress& progress) {
     return builder.Finish();
 }
 
-// The two sides of a replay. What a side still holds, its destructor gives back.
+// Time that the processor spends on this program: others on the machine do not count.
+double ProcessorNanoseconds() {
+    timespec now;
+    clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &now);
+    return 1e9 * static_cast<double>(now.tv_sec) + static_cast<double>(now.tv_nsec);
+}
+
+// The two sides of a replay. What a side still holds, its destructor gives back. `untimed` is time
+// that no event is charged with.
 
 class PoolSide {
 public:
@@ -387,33 +393,38 @@ public:
     void Free(const Event& event) { mgrs[event.pool]->Free(blocks[event.block]); }
     void DestroyPool(const Event& event) { mgrs[event.pool].reset(); }
 
+    static constexpr double untimed = 0;
+
 private:
     const std::vector<TracedPool>& pools;
     std::vector<std::optional<OBR::MemPool::Mgr>> mgrs;
     std::vector<void*> blocks;
 };
 
-// Where a pool drops its blocks at its end, a program without pools frees them one by one.
+// Where a pool drops its blocks at its end, the heap frees them too, so that it holds no more than
+// the pool does. The traced program never asked for that: it is not charged.
 class HeapSide {
 public:
     explicit HeapSide(const Trace& trace) : pools(trace.pools), blocks(trace.numBlocks) {}
     HeapSide(const HeapSide&) = delete;
     HeapSide& operator=(const HeapSide&) = delete;
     ~HeapSide() {
-        for (const TracedPool& pool : pools) {
-            if (!pool.destroyed) { FreeAll(pool); }
-        }
+        for (void* block : blocks) { ::operator delete[](block); }
     }
 
     void CreatePool(const Event&) {}
     void Allocate(const Event& event) { blocks[event.block] = ::operator new[](event.size); }
-    void Free(const Event& event) { ::operator delete[](blocks[event.block]); }
-    void DestroyPool(const Event& event) { FreeAll(pools[event.pool]); }
+    void Free(const Event& event) { FreeAt(event.block); }
+    void DestroyPool(const Event& event) {
+        const double start = ProcessorNanoseconds();
+        for (const std::uint32_t block : pools[event.pool].neverFreed) { FreeAt(block); }
+        untimed += ProcessorNanoseconds() - start;
+    }
+
+    double untimed = 0;
 
 private:
-    void FreeAll(const TracedPool& pool) {
-        for (const std::uint32_t block : pool.neverFreed) { ::operator delete[](blocks[block]); }
-    }
+    void FreeAt(std::uint32_t block) { ::operator delete[](std::exchange(blocks[block], nullptr)); }
 
     const std::vector<TracedPool>& pools;
     std::vector<void*> blocks;
@@ -455,20 +466,14 @@ std::int64_t BytesHeld(const Trace& trace, Function atPeak) {
     return held;
 }
 
-// Time that the processor spends on this program: others on the machine do not count.
-double ProcessorNanoseconds() {
-    timespec now;
-    clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &now);
-    return 1e9 * static_cast<double>(now.tv_sec) + static_cast<double>(now.tv_nsec);
-}
-
 template <typename Side>
 double NanosecondsPerEvent(const Trace& trace) {
     const Event* const first = trace.events.data();
     Side side(trace);
     const double start = ProcessorNanoseconds();
     Replay(side, first, first + trace.events.size());
-    return (ProcessorNanoseconds() - start) / static_cast<double>(trace.events.size());
+    const double time = ProcessorNanoseconds() - start - side.untimed;
+    return time / static_cast<double>(trace.events.size());
 }
 
 double Median(std::vector<double> values) {
@@ -565,28 +570,25 @@ void Compare(const std::string& path, unsigned int rounds, bool dbg) {
 // The command line.
 
 constexpr const char* description =
-    "Replays traces of a program's pools through the pools and through the heap, and compares.\n"
-    "\n"
-    "A TRACE is the output of a program that ran with NUV_OBR_MEMPOOL_TRACE=1, plain or "
-    "compressed\n"
-    "by gzip. Its lines \"xmpt:...\" count, all others are passed over.";
+    R"(Replays traces of a program's pools through the pools and through the heap, and compares.
+
+A TRACE is the output of a program that ran with NUV_OBR_MEMPOOL_TRACE=1, plain or compressed by
+gzip. Its lines "xmpt:..." count, all others are passed over.)";
 
 constexpr const char* notes =
-    "Settings without an option here come from the NUV_OBR_MEMPOOL_* variables of the "
-    "environment.\n"
-    "\n"
-    "pool: one enabled pool a traced pool. heap: operator new[] and delete[]; where a pool drops\n"
-    "  its blocks at its end, the heap frees them one by one. No block is written to.\n"
-    "peak: the moment with the most bytes asked for.\n"
-    "bytes held: what is lent to either side by operator new at the peak, in the sizes that\n"
-    "  malloc_usable_size tells, without the allocator's own headers. It is counted in a replay "
-    "of\n"
-    "  its own that is not timed; a timed replay pays one test of a flag a heap request for it.\n"
-    "ns an event: processor time, page faults included, of a replay from its first event to its "
-    "last;\n"
-    "  the median over all rounds.\n"
-    "bad lines: left out of the replay. A trace does not show Mgr::Clear: after one, lines of\n"
-    "  pointers allocated twice are to be expected.";
+    R"(Settings without an option here come from the variables NUV_OBR_MEMPOOL_... as ever.
+
+pool          One enabled pool a traced pool.
+heap          operator new[] and delete[]. What a pool drops at its end is freed on the heap too,
+              block by block; that time is not counted. No block is written to.
+the peak      The moment with the most bytes asked for.
+bytes held    What operator new has lent at the peak, in sizes of malloc_usable_size, without the
+              allocator's own headers. A replay of its own counts them, untimed; a timed one pays
+              one test of a flag for it at each heap request.
+ns an event   Processor time, page faults included; the median of all rounds.
+bad lines     Left out of the replay. A trace does not show Mgr::Clear: after one, pointers
+              allocated twice are to be expected.
+)";
 
 struct Setting {
     const char* option;
@@ -594,10 +596,13 @@ struct Setting {
     const char* help;
 };
 constexpr Setting settings[] = {
-    {"--bucket-size", OBR::MemPool::NUV_OBR_MEMPOOL_BUCKET_SIZE, "Bytes of a bucket"},
-    {"--max-record", OBR::MemPool::NUV_OBR_MEMPOOL_MAX_RECORD_SIZE, "Bytes of the largest record"},
-    {"--min-record", OBR::MemPool::NUV_OBR_MEMPOOL_MIN_RECORD_SIZE, "Bytes of the smallest record"},
-    {"--alignment", OBR::MemPool::NUV_OBR_MEMPOOL_DATA_ALIGNMENT, "Data sizes are multiples of it"},
+    {"--bucket-size", OBR::MemPool::NUV_OBR_MEMPOOL_BUCKET_SIZE, "Size of a bucket"},
+    {"--max-record", OBR::MemPool::NUV_OBR_MEMPOOL_MAX_RECORD_SIZE,
+     "Largest record, its overhead included"},
+    {"--min-record", OBR::MemPool::NUV_OBR_MEMPOOL_MIN_RECORD_SIZE,
+     "Smallest record, its overhead included"},
+    {"--alignment", OBR::MemPool::NUV_OBR_MEMPOOL_DATA_ALIGNMENT,
+     "Data sizes are rounded up to a multiple of it"},
 };
 
 }  // namespace
@@ -609,16 +614,20 @@ int main(int argc, char** argv) {
     std::vector<std::string> paths;
     unsigned int rounds = 11;
     bool dbg = false;
-    app.add_option("TRACE", paths, "Files to replay, one after the other")->required();
+    app.add_option("TRACE", paths, "Files to replay, one after the other")
+        ->required()
+        ->type_name("");
     for (const Setting& setting : settings) {
         app.add_option_function<unsigned int>(setting.option, setting.store, setting.help)
-            ->check(CLI::Range(1, 65535));
+            ->check(CLI::Range(1, 65535))
+            ->type_name("BYTES");
     }
     app.add_flag_callback(
         "--keep-empty", [] { OBR::MemPool::NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS(true); },
         "Keep buckets that become empty");
     app.add_option("--rounds", rounds, "Timed replays a side")
-        ->check(CLI::PositiveNumber)
+        ->type_name("N")
+        ->check(CLI::Range(1, 1000000))
         ->capture_default_str();
     app.add_flag("--dbg", dbg, "Print the report of each pool at the peak");
     try {
@@ -633,6 +642,9 @@ int main(int argc, char** argv) {
     for (const std::string& path : paths) {
         try {
             Compare(path, rounds, dbg);
+        } catch (const std::bad_alloc&) {
+            std::cerr << "mempool-replay: " << path << ": out of memory\n";
+            status = EXIT_FAILURE;
         } catch (const std::exception& error) {
             std::cerr << "mempool-replay: " << error.what() << '\n';
             status = EXIT_FAILURE;
