@@ -1,0 +1,372 @@
+// The pool and its peers at the same work, one subject a process:
+//
+//     PoolBench --subject=NAME [Google Benchmark's options]
+//
+// pool, pool-keep (empty buckets stay) and pool-64k (buckets of 65535 bytes) call the shared
+// library as a host does. heap calls malloc and free, and with LD_PRELOAD the allocator that took
+// their place: so every malloc is measured through the same two calls into a shared library, and
+// none lives off another's leavings. boost (where all blocks have one size) and pmr are pools of
+// headers.
+//
+// Each row is one function over a subject. Sizes, orders and traces are made before the clock runs,
+// the first byte of every block is written as a host would, and the time is that of one operation:
+// an Alloc, a Free, an event, or a block built and dropped.
+
+#include <MemPool>
+
+#include <malloc.h>
+#include <zlib.h>
+
+#include <algorithm>
+#include <cstdint>
+#include <cstdlib>
+#include <functional>
+#include <iostream>
+#include <memory>
+#include <memory_resource>
+#include <numeric>
+#include <random>
+#include <string>
+#include <unordered_map>
+#include <vector>
+
+#include <benchmark/benchmark.h>
+#include <boost/pool/pool.hpp>
+
+namespace {
+
+using Blocks = std::vector<void*>;
+
+// The subjects. A subject is told the size of what it takes back, for those that must know.
+
+struct Pool {
+    OBR::MemPool::Mgr mgr;
+    void* Alloc(unsigned size) { return mgr.Alloc(size); }
+    void Free(void* block, unsigned) { mgr.Free(block); }
+    void DropAll(const Blocks&) { mgr.Clear(); }
+    unsigned GetSize(void* block) { return mgr.GetSize(block); }
+};
+
+struct Heap {
+    void* Alloc(unsigned size) { return std::malloc(size); }
+    void Free(void* block, unsigned) { std::free(block); }
+    void DropAll(const Blocks& blocks) { std::for_each(blocks.begin(), blocks.end(), std::free); }
+    unsigned GetSize(void* block) { return static_cast<unsigned>(malloc_usable_size(block)); }
+};
+
+struct Boost {
+    explicit Boost(unsigned size) : pool(size) {}
+    boost::pool<> pool;
+    void* Alloc(unsigned) { return pool.malloc(); }
+    void Free(void* block, unsigned) { pool.free(block); }
+};
+
+struct Pmr {
+    std::pmr::unsynchronized_pool_resource pool;
+    void* Alloc(unsigned size) { return pool.allocate(size); }
+    void Free(void* block, unsigned size) { pool.deallocate(block, size); }
+    void DropAll(const Blocks&) { pool.release(); }
+};
+
+template <typename Subject>
+std::unique_ptr<Subject> Make(unsigned) {
+    return std::make_unique<Subject>();
+}
+template <>
+std::unique_ptr<Boost> Make<Boost>(unsigned size) {
+    return std::make_unique<Boost>(size);
+}
+
+template <typename Subject>
+void* AllocAndTouch(Subject& subject, unsigned size) {
+    void* const block = subject.Alloc(size);
+    *static_cast<char*>(block) = 1;
+    benchmark::ClobberMemory();
+    return block;
+}
+
+// Random numbers that are the same in every process.
+
+constexpr std::size_t numBuilt = 200000;
+
+std::vector<unsigned> MixedSizes() {
+    std::mt19937 random(1);
+    std::vector<unsigned> sizes(1 << 18);
+    for (unsigned& size : sizes) { size = std::uniform_int_distribution<unsigned>(8, 508)(random); }
+    return sizes;
+}
+
+std::vector<std::uint32_t> RandomOrder() {
+    std::vector<std::uint32_t> order(numBuilt);
+    std::iota(order.begin(), order.end(), 0U);
+    std::shuffle(order.begin(), order.end(), std::mt19937(2));
+    return order;
+}
+
+void SetOperations(benchmark::State& state, std::size_t perIteration) {
+    state.SetItemsProcessed(state.iterations() * static_cast<std::int64_t>(perIteration));
+}
+
+// The rows.
+
+template <typename Subject>
+void Pair(benchmark::State& state, unsigned size, bool anotherLives) {
+    const auto subject = Make<Subject>(size);
+    void* const other = anotherLives ? subject->Alloc(size) : nullptr;
+    for (auto _ : state) { subject->Free(AllocAndTouch(*subject, size), size); }
+    if (anotherLives) { subject->Free(other, size); }
+    SetOperations(state, 2);
+}
+
+enum class Order { Same, Reverse, Random };
+
+template <typename Subject>
+void AllThenFree(benchmark::State& state, Order order) {
+    constexpr unsigned size = 32;
+    const auto subject = Make<Subject>(size);
+    std::vector<std::uint32_t> places = RandomOrder();
+    if (order != Order::Random) { std::sort(places.begin(), places.end()); }
+    if (order == Order::Reverse) { std::reverse(places.begin(), places.end()); }
+    Blocks blocks(numBuilt);
+    for (auto _ : state) {
+        for (void*& block : blocks) { block = AllocAndTouch(*subject, size); }
+        for (const std::uint32_t place : places) { subject->Free(blocks[place], size); }
+    }
+    SetOperations(state, 2 * numBuilt);
+}
+
+struct Sized {
+    void* block;
+    unsigned size;
+};
+
+template <typename Subject>
+void Churn(benchmark::State& state, std::size_t live, const std::vector<unsigned>& sizes) {
+    const auto subject = Make<Subject>(sizes.front());
+    std::mt19937 random(3);
+    std::vector<std::uint32_t> places(1 << 20);
+    for (std::uint32_t& place : places) { place = static_cast<std::uint32_t>(random() % live); }
+    std::vector<Sized> blocks(live);
+    std::size_t turn = 0;
+    const auto renew = [&](Sized& sized) {
+        sized.size = sizes[turn++ % sizes.size()];
+        sized.block = AllocAndTouch(*subject, sized.size);
+    };
+    for (Sized& sized : blocks) { renew(sized); }
+    for (auto _ : state) {
+        Sized& sized = blocks[places[turn % places.size()]];
+        subject->Free(sized.block, sized.size);
+        renew(sized);
+    }
+    for (const Sized& sized : blocks) { subject->Free(sized.block, sized.size); }
+    SetOperations(state, 2);
+}
+
+template <typename Subject>
+void BuildAndDrop(benchmark::State& state) {
+    const auto subject = Make<Subject>(0);
+    const std::vector<unsigned> sizes = MixedSizes();
+    Blocks blocks(numBuilt);
+    for (auto _ : state) {
+        for (std::size_t i = 0; i < numBuilt; ++i) {
+            blocks[i] = AllocAndTouch(*subject, sizes[i]);
+        }
+        subject->DropAll(blocks);
+    }
+    SetOperations(state, numBuilt);
+}
+
+struct Event {
+    std::uint32_t block;
+    std::uint32_t size;
+    bool isAlloc;
+};
+
+// The events of a trace with one pool: "xmpt:a:POOL:BLOCK:SIZE" and "xmpt:f:POOL:BLOCK:".
+std::vector<Event> ReadTrace(const std::string& name) {
+    const std::string path = std::string(TRACES) + "/" + name + ".xmpt.gz";
+    const std::unique_ptr<gzFile_s, int (*)(gzFile)> file(gzopen(path.c_str(), "rb"), gzclose);
+    if (file == nullptr) {
+        std::cerr << "PoolBench: cannot read " << path << std::endl;
+        std::exit(1);
+    }
+    std::vector<Event> events;
+    std::unordered_map<std::string, Event> live;
+    std::uint32_t numBlocks = 0;
+    char line[256];
+    while (gzgets(file.get(), line, sizeof line) != nullptr) {
+        const std::string text(line);
+        if (text.compare(0, 7, "xmpt:a:") == 0) {
+            const auto size = static_cast<std::uint32_t>(std::stoul(text.substr(41)));
+            const Event event{numBlocks++, size, true};
+            live[text.substr(24, 16)] = event;
+            events.push_back(event);
+        } else if (text.compare(0, 7, "xmpt:f:") == 0) {
+            Event event = live.at(text.substr(24, 16));
+            event.isAlloc = false;
+            events.push_back(event);
+        }
+    }
+    return events;
+}
+
+template <typename Subject>
+void Replay(benchmark::State& state, const std::string& name) {
+    const auto subject = Make<Subject>(0);
+    const std::vector<Event> events = ReadTrace(name);
+    Blocks blocks(events.size());
+    for (auto _ : state) {
+        for (const Event& event : events) {
+            void*& block = blocks[event.block];
+            if (event.isAlloc) {
+                block = AllocAndTouch(*subject, event.size);
+            } else {
+                subject->Free(block, event.size);
+                block = nullptr;
+            }
+        }
+        state.PauseTiming();
+        for (const Event& event : events) {
+            if (blocks[event.block] != nullptr) { subject->Free(blocks[event.block], event.size); }
+            blocks[event.block] = nullptr;
+        }
+        state.ResumeTiming();
+    }
+    SetOperations(state, events.size());
+}
+
+template <typename Subject>
+void AskSize(benchmark::State& state) {
+    const auto subject = Make<Subject>(32);
+    void* const block = subject->Alloc(32);
+    for (auto _ : state) { benchmark::DoNotOptimize(subject->GetSize(block)); }
+    subject->Free(block, 32);
+    SetOperations(state, 1);
+}
+
+void AskContains(benchmark::State& state) {
+    Pool pool;
+    void* const block = pool.Alloc(32);
+    for (auto _ : state) { benchmark::DoNotOptimize(pool.mgr.Contains(block)); }
+    SetOperations(state, 1);
+}
+
+// Makes the pools, finds each by its name, and destroys them.
+void ManyPools(benchmark::State& state) {
+    std::vector<std::string> names(100000);
+    for (std::size_t i = 0; i < names.size(); ++i) { names[i] = "pool " + std::to_string(i); }
+    std::vector<std::unique_ptr<OBR::MemPool::Mgr>> mgrs(names.size());
+    for (auto _ : state) {
+        for (std::size_t i = 0; i < names.size(); ++i) {
+            mgrs[i] = std::make_unique<OBR::MemPool::Mgr>(names[i].c_str());
+        }
+        for (const std::string& name : names) {
+            benchmark::DoNotOptimize(OBR::MemPool::GetMgr(name.c_str()));
+        }
+        for (auto& mgr : mgrs) { mgr.reset(); }
+    }
+    SetOperations(state, names.size());
+}
+
+// Makes the heap as long as that of a host with other data, some of them at its end. Otherwise the
+// C library hands the memory that a round has freed back to the system and asks for it again in the
+// next, and that is what a row would measure.
+void LengthenHeap() {
+    constexpr std::size_t size = 65536;
+    Blocks blocks(3000);
+    for (void*& block : blocks) { block = std::malloc(size); }
+    static void* const end = std::malloc(size);
+    benchmark::DoNotOptimize(end);
+    std::for_each(blocks.begin(), blocks.end(), std::free);
+}
+
+// The names of the rows, in the order of the tables.
+
+using Row = std::function<void(benchmark::State&)>;
+
+void Register(const char* name, const Row& row, std::int64_t iterations = 0) {
+    auto* const bench = benchmark::RegisterBenchmark(name, row);
+    if (iterations != 0) { bench->Iterations(iterations); }
+}
+
+template <typename Subject>
+void RegisterOneSizeRows() {
+    Register("pair, another block live", [](auto& s) { Pair<Subject>(s, 32, true); });
+    Register("200k x 32, free in order", [](auto& s) { AllThenFree<Subject>(s, Order::Same); });
+    Register("200k x 32, free in reverse",
+             [](auto& s) { AllThenFree<Subject>(s, Order::Reverse); });
+    Register("200k x 32, free in random order",
+             [](auto& s) { AllThenFree<Subject>(s, Order::Random); });
+    Register("churn 16 bytes, 1k live", [](auto& s) { Churn<Subject>(s, 1000, {16}); });
+    Register(
+        "churn 16 bytes, 10M live", [](auto& s) { Churn<Subject>(s, 10000000, {16}); }, 1000000);
+    Register("pair, no other block", [](auto& s) { Pair<Subject>(s, 32, false); });
+}
+
+template <typename Subject>
+void RegisterMixedRows() {
+    Register("churn mixed, 1k live", [](auto& s) { Churn<Subject>(s, 1000, MixedSizes()); });
+    Register(
+        "churn mixed, 20k live", [](auto& s) { Churn<Subject>(s, 20000, MixedSizes()); }, 1000000);
+    Register(
+        "churn mixed, 200k live", [](auto& s) { Churn<Subject>(s, 200000, MixedSizes()); },
+        1000000);
+    Register("build 200k mixed, drop all", [](auto& s) { BuildAndDrop<Subject>(s); });
+    Register("trace lua", [](auto& s) { Replay<Subject>(s, "lua"); });
+    Register("trace jq", [](auto& s) { Replay<Subject>(s, "jq"); });
+    Register("trace sqlite", [](auto& s) { Replay<Subject>(s, "sqlite"); });
+    Register("pair of 2000 bytes", [](auto& s) { Pair<Subject>(s, 2000, true); });
+    Register("churn mixed, 1k live, alignment 3", [](auto& s) {
+        const unsigned alignment = OBR::MemPool::NUV_OBR_MEMPOOL_DATA_ALIGNMENT();
+        OBR::MemPool::NUV_OBR_MEMPOOL_DATA_ALIGNMENT(3);
+        Churn<Subject>(s, 1000, MixedSizes());
+        OBR::MemPool::NUV_OBR_MEMPOOL_DATA_ALIGNMENT(alignment);
+    });
+}
+
+bool RegisterRows(const std::string& subject) {
+    if (subject == "pool" || subject == "pool-keep" || subject == "pool-64k") {
+        OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);
+        OBR::MemPool::NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS(subject == "pool-keep");
+        if (subject == "pool-64k") { OBR::MemPool::NUV_OBR_MEMPOOL_BUCKET_SIZE(65535); }
+        RegisterOneSizeRows<Pool>();
+        RegisterMixedRows<Pool>();
+        Register("size of a block", AskSize<Pool>);
+        Register("Contains", AskContains);
+        Register("100k pools: make, find, destroy", ManyPools);
+    } else if (subject == "heap") {
+        RegisterOneSizeRows<Heap>();
+        RegisterMixedRows<Heap>();
+        Register("size of a block", AskSize<Heap>);
+    } else if (subject == "boost") {
+        RegisterOneSizeRows<Boost>();
+    } else if (subject == "pmr") {
+        RegisterOneSizeRows<Pmr>();
+        RegisterMixedRows<Pmr>();
+    } else {
+        return false;
+    }
+    return true;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    const std::string option = "--subject=";
+    const std::string first = argc > 1 ? argv[1] : "";
+    if (first.compare(0, option.size(), option) != 0 ||
+        !RegisterRows(first.substr(option.size()))) {
+        std::cerr << "usage: PoolBench --subject=pool|pool-keep|pool-64k|heap|boost|pmr "
+                     "[benchmark options]"
+                  << std::endl;
+        return 2;
+    }
+    argv[1] = argv[0];
+    --argc;
+    ++argv;
+    benchmark::Initialize(&argc, argv);
+    if (benchmark::ReportUnrecognizedArguments(argc, argv)) { return 2; }
+    LengthenHeap();
+    benchmark::RunSpecifiedBenchmarks();
+    return 0;
+}

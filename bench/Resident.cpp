@@ -1,0 +1,86 @@
+// What a live block costs in memory, one subject and one size a process:
+//
+//     Resident pool|heap|boost|pmr SIZE
+//
+// prints the resident bytes a block, and for the pool the bytes a block that it holds from the
+// heap. heap is whatever malloc is, LD_PRELOAD included. All blocks are written whole, and together
+// they are large beside what a process needs anyway.
+
+#include <MemPool>
+
+#include <unistd.h>
+
+#include <cstdlib>
+#include <cstring>
+#include <fstream>
+#include <iostream>
+#include <memory_resource>
+#include <new>
+#include <string>
+#include <vector>
+
+#include <boost/pool/pool.hpp>
+
+namespace {
+
+std::size_t askedInArrayForm = 0;  // By the library, which makes its buckets in this form.
+
+std::size_t ResidentBytes() {
+    std::ifstream statm("/proc/self/statm");
+    std::size_t total = 0;
+    std::size_t resident = 0;
+    statm >> total >> resident;
+    return resident * static_cast<std::size_t>(sysconf(_SC_PAGESIZE));
+}
+
+template <typename Alloc>
+void Measure(unsigned size, bool showHeld, Alloc alloc) {
+    const std::size_t number = std::size_t{64} * 1024 * 1024 / size;
+    std::memset(alloc(), 1, size);  // The first block brings the subject's own tables along.
+    const std::size_t before = ResidentBytes();
+    askedInArrayForm = 0;
+    for (std::size_t i = 0; i < number; ++i) { std::memset(alloc(), 1, size); }
+    const auto blocks = static_cast<double>(number);
+    std::cout << static_cast<double>(ResidentBytes() - before) / blocks;
+    if (showHeld) { std::cout << ' ' << static_cast<double>(askedInArrayForm) / blocks; }
+    std::cout << std::endl;
+}
+
+}  // namespace
+
+void* operator new[](std::size_t size) {
+    askedInArrayForm += size;
+    return ::operator new(size);
+}
+void operator delete[](void* block) noexcept {
+    ::operator delete(block);
+}
+void operator delete[](void* block, std::size_t) noexcept {
+    ::operator delete(block);
+}
+
+int main(int argc, char** argv) {
+    const std::string subject = argc == 3 ? argv[1] : "";
+    const auto size = static_cast<unsigned>(argc == 3 ? std::strtoul(argv[2], nullptr, 10) : 0);
+    if (size == 0) {
+        std::cerr << "usage: Resident pool|heap|boost|pmr SIZE" << std::endl;
+        return 2;
+    }
+    if (subject == "pool") {
+        OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);
+        OBR::MemPool::Mgr pool;
+        Measure(size, true, [&] { return pool.Alloc(size); });
+    } else if (subject == "heap") {
+        Measure(size, false, [&] { return std::malloc(size); });
+    } else if (subject == "boost") {
+        boost::pool<> pool(size);
+        Measure(size, false, [&] { return pool.malloc(); });
+    } else if (subject == "pmr") {
+        std::pmr::unsynchronized_pool_resource pool;
+        Measure(size, false, [&] { return pool.allocate(size); });
+    } else {
+        std::cerr << "Resident: unknown subject " << subject << std::endl;
+        return 2;
+    }
+    return 0;
+}
