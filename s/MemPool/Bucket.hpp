@@ -46,8 +46,8 @@ public:
     // heap leaves those bytes alone.
     static void Destroy(Bucket* bucket);
 
-    // The number of records. It is stored nowhere.
-    // 0 for a header so damaged that it has no record size.
+    // The number of records. It is stored nowhere. 0 for a header so damaged that it has no record
+    // size; a damaged `size` below 2 can give a negative one.
     std::int32_t TotalRecs() const {
         if (recSize == 0) { return 0; }
         return (std::int32_t{size} - std::int32_t{firstOffset}) / std::int32_t{recSize};
@@ -150,17 +150,21 @@ private:
     static constexpr std::uint32_t numFreeMask = 0xFFFF0000;
 
 public:
-    // For reports of a bucket that may be damaged: whether a whole record lies at `offset`, and the
-    // type of a record, unless its header reaches beyond the bucket.
+    // For reports of a bucket that may be damaged. They read no byte beyond it: a header that it
+    // does not hold, the guard aside, has an unknown type and no link. A record is where the way
+    // from record to record comes by and finds a header, be it in a piece of a record at the end.
+    bool HasHeaderAt(std::uint32_t offset) const {
+        return offset + offsetof(RecHdr, guard) <= size;
+    }
     bool HasRecordAt(std::uint32_t offset) const {
         return offset >= firstOffset && recSize != 0 && (offset - firstOffset) % recSize == 0 &&
-               offset + recSize <= size;
+               HasHeaderAt(offset);
     }
     std::uint8_t TypeAt(std::uint32_t offset) const {
-        return offset + sizeof(RecHdr) <= size ? RecordAt(offset)->type : typeUnknown;
+        return HasHeaderAt(offset) ? RecordAt(offset)->type : typeUnknown;
     }
     std::uint16_t LinkAt(std::uint32_t offset) const {
-        return offset + sizeof(RecHdr) <= size ? RecordAt(offset)->Link() : std::uint16_t{0};
+        return HasHeaderAt(offset) ? RecordAt(offset)->Link() : std::uint16_t{0};
     }
     std::uint16_t OffsetOf(const RecHdr* record) const {
         return static_cast<std::uint16_t>(reinterpret_cast<const char*>(record) - RecsBase());

@@ -72,7 +72,12 @@ struct RecHdr {
         return (word & 0xFF000000) | std::uint32_t{type} << 16 | link;
     }
 
-    std::uint16_t Link() const { return LinkOf(Word()); }
+    // The link alone, for those who have no use for the rest.
+    std::uint16_t Link() const {
+        std::uint16_t offset;
+        std::memcpy(&offset, link, sizeof offset);
+        return offset;
+    }
 
     // Makes a FREE record of raw memory. Two stores: a run of records is faster made so than with
     // their guards read in order to be kept.

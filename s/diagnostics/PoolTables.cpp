@@ -31,14 +31,14 @@ void BucketMgr::DbgBuckets(std::ostream& stream, std::uint32_t level) const {
         ForEachBucket(group, [&](const Bucket& bucket) {
             const auto totalRecs = static_cast<std::uint32_t>(bucket.TotalRecs());
             const std::uint32_t used = totalRecs - bucket.numFree;
+            const double percentage = totalRecs == 0 ? 0.0 : used * 100.0 / totalRecs;
             stream << indent;
             WriteId(stream, ++id, ' ');
             stream << std::setw(5) << index << " ";
             stream << std::setw(5) << used << " ";
             stream << std::setw(5) << bucket.numFree << " ";
             stream << std::setw(5) << totalRecs << " ";
-            stream << std::fixed << std::setprecision(3) << std::setw(7) << used * 100.0 / totalRecs
-                   << "% ";
+            stream << std::fixed << std::setprecision(3) << std::setw(7) << percentage << "% ";
             stream << std::setw(8) << bucket.recSize << " ";
             stream << std::setw(16) << PtrText(&bucket) << " " << std::endl;
         });

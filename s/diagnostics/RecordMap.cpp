@@ -36,7 +36,9 @@ void WriteLeft(std::ostream& stream, int width, const Text& text) {
 }  // namespace
 
 void Bucket::DbgRecordMap(std::ostream& stream) const {
-    const auto totalRecs = static_cast<std::uint32_t>(TotalRecs());
+    // A damaged header can have a negative number of records: more than its bytes, if taken as
+    // unsigned, and more than the walk finds.
+    const auto totalRecs = std::min<std::uint32_t>(static_cast<std::uint32_t>(TotalRecs()), size);
     Records records;
     records.reserve(totalRecs);
     std::uint16_t count = 0;
@@ -46,7 +48,7 @@ void Bucket::DbgRecordMap(std::ostream& stream) const {
     });
 
     stream << std::setw(6) << " ";
-    for (int number = 1; number <= std::min(count, boxesPerRow); ++number) {
+    for (std::uint16_t number = 1; number <= std::min(count, boxesPerRow); ++number) {
         stream << "    " << number << "     ";
     }
     stream << std::endl;
@@ -127,7 +129,7 @@ void Bucket::DbgMapValues(std::ostream& stream, std::uint16_t n, std::uint16_t f
                 break;
             default:
                 stream << "u=";
-                WriteLeft(stream, 6, 0);
+                WriteLeft(stream, 6, 0U);
                 break;
         }
     }
