@@ -3,10 +3,10 @@
 
 #include <MemPool>
 
-#include <iomanip>
-#include <locale>
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
 #include <memory>
-#include <sstream>
 #include <string>
 
 #include "MemPool/BucketMgr.hpp"
@@ -20,13 +20,12 @@ static_assert(sizeof(OBR::vector<Mgr*>) == 16, "One pointer and two 32-bit count
 
 namespace {
 
+// Made without a stream, which would take exhausted memory for a reason to write half a name.
 std::string NextName() {
     static std::uint32_t nameCounter = 1;
-    const std::uint32_t number = nameCounter++;
-    std::ostringstream name;
-    name.imbue(std::locale::classic());
-    name << "__OBR_MEMPOOL_" << std::setfill('0') << std::setw(5) << number;
-    return name.str();
+    const std::string number = std::to_string(nameCounter++);
+    const std::string zeros(5 - std::min<std::size_t>(number.size(), 5), '0');
+    return "__OBR_MEMPOOL_" + zeros + number;
 }
 
 }  // namespace
