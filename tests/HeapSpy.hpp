@@ -1,0 +1,62 @@
+// The heap as tests see it. HeapSpy.cpp replaces the global operators new and delete of a test
+// program on top of malloc and free: the form of each block is remembered and compared when it is
+// released, any request can be refused, and the last request and release can be looked at. New
+// blocks are filled with one byte and released ones with another, so that nothing holds by luck.
+
+#ifndef OBR_TESTS_HEAPSPY_HPP
+#define OBR_TESTS_HEAPSPY_HPP
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <new>
+
+#include <gtest/gtest.h>
+
+namespace HeapSpy {
+
+enum class Form { single, array };
+
+struct Block {
+    const void* start;
+    std::size_t size;
+    Form form;
+
+    bool operator==(const Block& other) const {
+        return start == other.start && size == other.size && form == other.form;
+    }
+};
+
+constexpr std::uint8_t freshByte = 0xC5;
+constexpr std::uint8_t releasedByte = 0xD7;
+
+extern Block lastRequest;                          // `start` is null if it was refused.
+extern Block lastRelease;                          // The block as it was requested.
+extern std::array<std::uint8_t, 48> releasedHead;  // Its first bytes when it was released.
+extern std::size_t numRequests;
+extern std::size_t numReleases;
+extern std::size_t numLive;     // Blocks requested and not yet released.
+extern std::size_t numMisfits;  // Releases in the wrong form, or of what is no living block.
+extern std::size_t refuseIn;    // 1: the next request is refused, and so on; 0: none is.
+
+// The living block at this address, or null.
+const Block* Find(const void* start);
+
+// Runs `action` with its n-th request, from 0 on, refused. True if that failed; a refusal that the
+// action swallows is an error.
+template <typename Action>
+bool FailsAt(std::size_t n, Action action) {
+    bool failed = false;
+    refuseIn = n + 1;
+    try {
+        action();
+    } catch (const std::bad_alloc&) { failed = true; }
+    const bool refused = refuseIn == 0;
+    refuseIn = 0;
+    EXPECT_EQ(failed, refused);
+    return failed;
+}
+
+}  // namespace HeapSpy
+
+#endif
