@@ -1,0 +1,108 @@
+// A seeded walk through everything that a host can do to a pool, beside a simple account of the
+// blocks that live. All laws hold after every step, and no block's bytes are ever touched.
+
+#include <algorithm>
+#include <cstdint>
+#include <cstring>
+#include <iterator>
+#include <map>
+#include <random>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include "HeapSpy.hpp"
+#include "MemPool/BucketMgr.hpp"
+#include "PoolFixture.hpp"
+#include "PoolLaws.hpp"
+
+namespace OBR::MemPool {
+
+namespace {
+
+struct WalkSettings {
+    std::uint32_t bucketSize;
+    std::uint16_t alignment;
+    std::uint32_t maximum, minimum;
+    bool keepEmptyBuckets;
+};
+
+class RandomWalkTest : public PoolFixture, public testing::WithParamInterface<WalkSettings> {
+protected:
+    struct Block {
+        std::uint32_t usable;
+        std::uint8_t fill;
+    };
+
+    std::uint32_t Below(std::size_t n) { return static_cast<std::uint32_t>(random() % n); }
+
+    void Alloc(BucketMgr& pool) {
+        const std::uint32_t maximum = GetParam().maximum;
+        const std::uint32_t sizes[] = {Below(40), Below(maximum), maximum - Below(12),
+                                       Below(3 * maximum)};
+        const std::uint32_t size = sizes[Below(4)];
+        void* data = nullptr;
+        if (Below(8) == 0) {
+            if (HeapSpy::FailsAt(Below(2), [&] { data = pool.Alloc(size); })) { return; }
+        } else {
+            const SlowRoad road(Below(4) == 0);
+            data = pool.Alloc(size);
+        }
+        const Block block{pool.GetSize(data), static_cast<std::uint8_t>(Below(256))};
+        ASSERT_GE(block.usable, size);
+        std::memset(data, block.fill, block.usable);
+        ASSERT_TRUE(live.emplace(static_cast<std::uint8_t*>(data), block).second);
+    }
+
+    void Free(BucketMgr& pool) {
+        if (live.empty()) { return; }
+        const auto entry = std::next(live.begin(), Below(live.size()));
+        const auto [data, block] = *entry;
+        EXPECT_EQ(std::count(data, data + block.usable, block.fill), block.usable);
+        const SlowRoad road(Below(4) == 0);
+        const bool staysInBucket = pool.keepEmptyBuckets && pool.FindBucket(data) != nullptr;
+        // A heap record of no bytes waits for Clear.
+        EXPECT_EQ(pool.Free(data), block.usable != 0);
+        if (block.usable != 0) { live.erase(entry); }
+        if (staysInBucket) { EXPECT_FALSE(pool.Free(data)) << "freed twice"; }
+    }
+
+    std::mt19937 random{3};
+    std::map<std::uint8_t*, Block> live;
+};
+
+}  // namespace
+
+TEST_P(RandomWalkTest, KeepsEveryLaw) {
+    const WalkSettings& is = GetParam();
+    Use(is.bucketSize, is.alignment, is.maximum, is.minimum, is.keepEmptyBuckets);
+    BucketMgr pool(nullptr, "pool");
+    for (int step = 0; step < 1500 && !HasFailure(); ++step) {
+        SCOPED_TRACE(step);
+        const bool grows = step % 300 < 150;
+        const std::uint32_t event = Below(200);
+        if (event == 0) {
+            pool.Clear();
+            live.clear();
+        } else if (event < (grows ? 150u : 60u)) {
+            Alloc(pool);
+        } else {
+            Free(pool);
+        }
+        Blocks expected;
+        for (const auto& [data, block] : live) { expected[data] = block.usable; }
+        ASSERT_EQ(CheckLaws(pool), expected);
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Settings, RandomWalkTest,
+                         testing::Values(WalkSettings{200, 4, 100, 8, false},
+                                         WalkSettings{200, 4, 100, 8, true},
+                                         WalkSettings{103, 1, 50, 8, false},
+                                         WalkSettings{300, 3, 90, 40, true},
+                                         WalkSettings{500, 32, 490, 64, false},
+                                         WalkSettings{24, 4, 20, 20, false},  // one record each
+                                         WalkSettings{24, 4, 20, 20, true},
+                                         WalkSettings{4010, 16, 19, 4, false}));  // no bucket
+
+}  // namespace OBR::MemPool
