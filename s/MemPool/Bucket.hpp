@@ -46,10 +46,10 @@ public:
     // heap leaves those bytes alone.
     static void Destroy(Bucket* bucket);
 
-    // The number of records. It is stored nowhere. 0 for a header so damaged that it has no record
-    // size; a damaged `size` below 2 can give a negative one.
+    // The number of records. It is stored nowhere. 0 for a header so damaged that it has no room for
+    // any.
     std::int32_t TotalRecs() const {
-        if (recSize == 0) { return 0; }
+        if (recSize == 0 || size < firstOffset) { return 0; }
         return (std::int32_t{size} - std::int32_t{firstOffset}) / std::int32_t{recSize};
     }
     std::uint32_t DataSize() const { return recSize - std::uint32_t{sizeof(RecHdr)}; }

@@ -36,9 +36,7 @@ void WriteLeft(std::ostream& stream, int width, const Text& text) {
 }  // namespace
 
 void Bucket::DbgRecordMap(std::ostream& stream) const {
-    // A damaged header can have a negative number of records: more than its bytes, if taken as
-    // unsigned, and more than the walk finds.
-    const auto totalRecs = std::min<std::uint32_t>(static_cast<std::uint32_t>(TotalRecs()), size);
+    const auto totalRecs = static_cast<std::uint32_t>(TotalRecs());
     Records records;
     records.reserve(totalRecs);
     std::uint16_t count = 0;
