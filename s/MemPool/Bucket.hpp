@@ -46,8 +46,8 @@ public:
     // heap leaves those bytes alone.
     static void Destroy(Bucket* bucket);
 
-    // The number of records. It is stored nowhere. 0 for a header so damaged that it has no room for
-    // any.
+    // The number of records. It is stored nowhere. 0 for a header so damaged that it has room for
+    // none.
     std::int32_t TotalRecs() const {
         if (recSize == 0 || size < firstOffset) { return 0; }
         return (std::int32_t{size} - std::int32_t{firstOffset}) / std::int32_t{recSize};
