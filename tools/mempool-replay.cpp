@@ -454,16 +454,13 @@ void Replay(Side& side, const Event* event, const Event* end) {
 template <typename Side, typename Function>
 std::int64_t BytesHeld(const Trace& trace, Function atPeak) {
     const Event* const first = trace.events.data();
-    const Event* const peak = first + trace.peakEvents;
     Side side(trace);
     heldBytes = 0;
     counting = true;
-    Replay(side, first, peak);
+    Replay(side, first, first + trace.peakEvents);
     counting = false;
-    const std::int64_t held = heldBytes;
     atPeak();
-    Replay(side, peak, first + trace.events.size());
-    return held;
+    return heldBytes;
 }
 
 template <typename Side>
