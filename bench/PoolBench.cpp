@@ -31,7 +31,10 @@
 #include <vector>
 
 #include <benchmark/benchmark.h>
+#if __has_include(<boost/pool/pool.hpp>)
 #include <boost/pool/pool.hpp>
+#define HAS_BOOST
+#endif
 
 namespace {
 
@@ -54,17 +57,19 @@ struct Heap {
     unsigned GetSize(void* block) { return static_cast<unsigned>(malloc_usable_size(block)); }
 };
 
+#ifdef HAS_BOOST
 struct Boost {
     explicit Boost(unsigned size) : pool(size) {}
     boost::pool<> pool;
     void* Alloc(unsigned) { return pool.malloc(); }
     void Free(void* block, unsigned) { pool.free(block); }
 };
+#endif
 
 struct Pmr {
     std::pmr::unsynchronized_pool_resource pool;
-    void* Alloc(unsigned size) { return pool.allocate(size); }
-    void Free(void* block, unsigned size) { pool.deallocate(block, size); }
+    void* Alloc(unsigned size) { return pool.allocate(size, 8); }
+    void Free(void* block, unsigned size) { pool.deallocate(block, size, 8); }
     void DropAll(const Blocks&) { pool.release(); }
 };
 
@@ -72,10 +77,12 @@ template <typename Subject>
 std::unique_ptr<Subject> Make(unsigned) {
     return std::make_unique<Subject>();
 }
+#ifdef HAS_BOOST
 template <>
 std::unique_ptr<Boost> Make<Boost>(unsigned size) {
     return std::make_unique<Boost>(size);
 }
+#endif
 
 template <typename Subject>
 void* AllocAndTouch(Subject& subject, unsigned size) {
@@ -236,12 +243,16 @@ void Replay(benchmark::State& state, const std::string& name) {
 }
 
 template <typename Subject>
-void AskSize(benchmark::State& state) {
+void AskSizes(benchmark::State& state, std::size_t number) {
     const auto subject = Make<Subject>(32);
-    void* const block = subject->Alloc(32);
-    for (auto _ : state) { benchmark::DoNotOptimize(subject->GetSize(block)); }
-    subject->Free(block, 32);
-    SetOperations(state, 1);
+    Blocks blocks(number);
+    for (void*& block : blocks) { block = AllocAndTouch(*subject, 32); }
+    std::shuffle(blocks.begin(), blocks.end(), std::mt19937(4));
+    for (auto _ : state) {
+        for (void* const block : blocks) { benchmark::DoNotOptimize(subject->GetSize(block)); }
+    }
+    for (void* const block : blocks) { subject->Free(block, 32); }
+    SetOperations(state, number);
 }
 
 void AskContains(benchmark::State& state) {
@@ -324,6 +335,12 @@ void RegisterMixedRows() {
     });
 }
 
+template <typename Subject>
+void RegisterSizeRows() {
+    Register("size of one block", [](auto& s) { AskSizes<Subject>(s, 1); });
+    Register("size of each of 200k, random order", [](auto& s) { AskSizes<Subject>(s, numBuilt); });
+}
+
 bool RegisterRows(const std::string& subject) {
     if (subject == "pool" || subject == "pool-keep" || subject == "pool-64k") {
         OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);
@@ -331,15 +348,17 @@ bool RegisterRows(const std::string& subject) {
         if (subject == "pool-64k") { OBR::MemPool::NUV_OBR_MEMPOOL_BUCKET_SIZE(65535); }
         RegisterOneSizeRows<Pool>();
         RegisterMixedRows<Pool>();
-        Register("size of a block", AskSize<Pool>);
+        RegisterSizeRows<Pool>();
         Register("Contains", AskContains);
         Register("100k pools: make, find, destroy", ManyPools);
     } else if (subject == "heap") {
         RegisterOneSizeRows<Heap>();
         RegisterMixedRows<Heap>();
-        Register("size of a block", AskSize<Heap>);
+        RegisterSizeRows<Heap>();
+#ifdef HAS_BOOST
     } else if (subject == "boost") {
         RegisterOneSizeRows<Boost>();
+#endif
     } else if (subject == "pmr") {
         RegisterOneSizeRows<Pmr>();
         RegisterMixedRows<Pmr>();

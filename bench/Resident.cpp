@@ -8,8 +8,6 @@
 
 #include <MemPool>
 
-#include <unistd.h>
-
 #include <cstdlib>
 #include <cstring>
 #include <fstream>
@@ -19,18 +17,22 @@
 #include <string>
 #include <vector>
 
+#if __has_include(<boost/pool/pool.hpp>)
 #include <boost/pool/pool.hpp>
+#define HAS_BOOST
+#endif
 
 namespace {
 
 std::size_t askedInArrayForm = 0;  // By the library, which makes its buckets in this form.
 
 std::size_t ResidentBytes() {
-    std::ifstream statm("/proc/self/statm");
-    std::size_t total = 0;
-    std::size_t resident = 0;
-    statm >> total >> resident;
-    return resident * static_cast<std::size_t>(sysconf(_SC_PAGESIZE));
+    std::ifstream smaps("/proc/self/smaps_rollup");  // To the page, where statm is approximate.
+    std::string word;
+    while (smaps >> word && word != "Rss:") {}
+    std::size_t kilobytes = 0;
+    smaps >> kilobytes;
+    return kilobytes * 1024;
 }
 
 template <typename Alloc>
@@ -72,12 +74,14 @@ int main(int argc, char** argv) {
         Measure(size, true, [&] { return pool.Alloc(size); });
     } else if (subject == "heap") {
         Measure(size, false, [&] { return std::malloc(size); });
+#ifdef HAS_BOOST
     } else if (subject == "boost") {
         boost::pool<> pool(size);
         Measure(size, false, [&] { return pool.malloc(); });
+#endif
     } else if (subject == "pmr") {
         std::pmr::unsynchronized_pool_resource pool;
-        Measure(size, false, [&] { return pool.allocate(size); });
+        Measure(size, false, [&] { return pool.allocate(size, 8); });
     } else {
         std::cerr << "Resident: unknown subject " << subject << std::endl;
         return 2;

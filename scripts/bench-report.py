@@ -18,6 +18,7 @@ import sys
 
 POOLS = ["pool", "pool-keep", "pool-64k"]
 PEERS = ["glibc", "mimalloc", "jemalloc", "tcmalloc", "boost", "pmr"]
+MALLOCS = ["glibc", "mimalloc", "jemalloc", "tcmalloc"]
 TRACES = ["trace lua", "trace jq", "trace sqlite"]
 IN_PICTURE = ["mimalloc", "jemalloc", "tcmalloc", "pmr"]
 
@@ -73,7 +74,7 @@ class Ratios:
         return None if None in values else geometric_mean(values)
 
 
-def goals(ratios, rows):
+def goals(ratios, rows, resident):
     """(what, goal, measured) triples: ratios that are to stay at or below their goals."""
     def worst(names, peer, pool="pool"):
         values = [ratios.of(row, peer, pool) for row in names]
@@ -100,13 +101,19 @@ def goals(ratios, rows):
         ("the same, stretch", 1.0, ratios.mean(TRACES, "mimalloc", "best")),
         ("worst row but the empty pool's pair / pmr", 0.9, worst(beside_pmr, "pmr")),
         ("all those rows, geometric mean / pmr", 0.5, ratios.mean(beside_pmr, "pmr")),
+    ] + [
+        (f"resident bytes of {size} / best malloc", 1.0,
+         resident["pool"][size] / min(resident[peer][size] for peer in MALLOCS if peer in resident))
+        for size in (20, 40, 100, 200, 900)
     ]
 
 
 def machine():
     cpu = re.search(r"model name\s*: (.*)", pathlib.Path("/proc/cpuinfo").read_text()).group(1)
     cores = pathlib.Path("/proc/cpuinfo").read_text().count("processor\t:")
-    compiler = subprocess.run(["c++", "--version"], capture_output=True, text=True,
+    cache = pathlib.Path("build/bench/CMakeCache.txt").read_text()
+    compiler = subprocess.run([re.search(r"CMAKE_CXX_COMPILER:\w+=(.*)", cache).group(1),
+                               "--version"], capture_output=True, text=True,
                               check=True).stdout.split("\n")[0]
     packages = subprocess.run(
         ["dpkg-query", "-W", "-f=${Package} ${Version}, ", "libc6", "libmimalloc2.0",
@@ -116,13 +123,18 @@ def machine():
             f"{compiler}; {packages}.")
 
 
-def resident_tables(results):
+def read_resident(results):
+    """Resident bytes a block, as resident[subject][size], and bytes that the pool holds."""
     resident, held = {}, {}
     for line in (results / "resident").read_text().splitlines():
         subject, size, *figures = line.split()
         resident.setdefault(subject, {})[int(size)] = float(figures[0])
         if len(figures) > 1:
             held[int(size)] = float(figures[1])
+    return resident, held
+
+
+def resident_tables(resident, held):
     subjects = ["pool"] + [peer for peer in PEERS if peer in resident]
     yield from table(["bytes asked"] + subjects,
                      ([str(size)] + [number(resident[subject][size], 1) for subject in subjects]
@@ -143,6 +155,7 @@ def resident_tables(results):
 def main():
     results, output = map(pathlib.Path, sys.argv[1:])
     times, rows = read_times(results)
+    resident, held = read_resident(results)
     ratios = Ratios(times)
     peers = [peer for peer in PEERS if peer in times]
     timed = [row for row in rows if any(row in times[peer] for peer in peers)]
@@ -152,6 +165,9 @@ def main():
             "pool has the default settings, pool-keep also keeps empty buckets, and pool-64k has",
             "buckets of 65535 bytes. All subjects are called through the dynamic linker, but for",
             "boost and pmr, whose code is partly in headers. boost serves only one size.", "",
+            "Each row has a process of its own, in which the heap is made long first and kept so by",
+            "a block at its end, as other data of a host would. Without it the C library hands the",
+            "memory of each round back to the system, and the rows measure that.", "",
             "## Nanoseconds an operation, medians", ""]
     text += table(["work"] + POOLS + peers,
                   ([row] + [number(times[subject].get(row), 1) for subject in POOLS + peers]
@@ -170,10 +186,10 @@ def main():
     text += ["", "## Goals", ""]
     text += table(["ratio", "goal", "measured", ""],
                   ([what, number(goal), number(measured),
-                    "" if measured is None else "met" if round(measured, 2) <= goal else "missed"]
-                   for what, goal, measured in goals(ratios, rows)))
+                    "" if measured is None else "met" if measured <= goal else "missed"]
+                   for what, goal, measured in goals(ratios, rows, resident)))
     text += ["## Resident bytes a live block", ""]
-    text += resident_tables(results)
+    text += resident_tables(resident, held)
     output.write_text("\n".join(text).rstrip() + "\n")
 
     with (results / "ratios.dat").open("w") as data:
