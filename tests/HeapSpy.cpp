@@ -1,83 +1,60 @@
-// The replaced operators. Their own table of blocks lives on malloc and is never destroyed, since
-// blocks are released until the very end of the program.
+// The replaced operators. What they remember of a block stands ahead of it.
 
 #include "HeapSpy.hpp"
 
 #include <algorithm>
 #include <cstdlib>
 #include <cstring>
-#include <functional>
-#include <unordered_map>
-#include <utility>
 
 namespace HeapSpy {
 
-Block lastRequest = {};
-Block lastRelease = {};
+std::size_t lastRequest = 0;
+const void* lastRelease = nullptr;
 std::array<std::uint8_t, 48> releasedHead = {};
-std::size_t numRequests = 0;
-std::size_t numReleases = 0;
 std::size_t numLive = 0;
 std::size_t numMisfits = 0;
 std::size_t refuseIn = 0;
 
 namespace {
 
-template <typename T>
-struct MallocAllocator {
-    using value_type = T;
-    MallocAllocator() = default;
-    template <typename Other>
-    MallocAllocator(const MallocAllocator<Other>&) {}
-    T* allocate(std::size_t n) { return static_cast<T*>(std::malloc(n * sizeof(T))); }
-    void deallocate(T* block, std::size_t) { std::free(block); }
-    bool operator==(const MallocAllocator&) const { return true; }
-    bool operator!=(const MallocAllocator&) const { return false; }
+constexpr std::uint8_t releasedByte = 0xD7;
+
+enum class Form : std::size_t { single = 0x51461E51461E51, array = 0xA88A1A88A1A8 };
+
+struct alignas(std::max_align_t) Header {
+    std::size_t size;
+    Form form;
 };
 
-using Table = std::unordered_map<const void*, Block, std::hash<const void*>, std::equal_to<>,
-                                 MallocAllocator<std::pair<const void* const, Block>>>;
-
-Table& Living() {
-    static Table& table = *new (std::malloc(sizeof(Table))) Table;
-    return table;
-}
-
 void* Request(std::size_t size, Form form) {
-    ++numRequests;
-    lastRequest = {nullptr, size, form};
+    lastRequest = size;
     if (refuseIn != 0 && --refuseIn == 0) { throw std::bad_alloc(); }
-    void* const start = std::malloc(size);
-    if (start == nullptr) { throw std::bad_alloc(); }
-    std::memset(start, freshByte, size);
-    lastRequest.start = start;
-    Living().emplace(start, lastRequest);
+    auto* const header = static_cast<Header*>(std::malloc(sizeof(Header) + size));
+    if (header == nullptr) { throw std::bad_alloc(); }
+    *header = {size, form};
     ++numLive;
-    return start;
+    return std::memset(header + 1, freshByte, size);
 }
 
 void Release(void* start, Form form) {
     if (start == nullptr) { return; }
-    const auto entry = Living().find(start);
-    if (entry == Living().end()) {
+    Header* const header = static_cast<Header*>(start) - 1;
+    if (header->form != form) {
         ++numMisfits;
         return;
     }
-    ++numReleases;
     --numLive;
-    lastRelease = entry->second;
-    if (form != lastRelease.form) { ++numMisfits; }
-    Living().erase(entry);
-    std::memcpy(releasedHead.data(), start, std::min(releasedHead.size(), lastRelease.size));
-    std::memset(start, releasedByte, lastRelease.size);
-    std::free(start);
+    lastRelease = start;
+    std::memcpy(releasedHead.data(), start, std::min(releasedHead.size(), header->size));
+    std::memset(header, releasedByte, sizeof(Header) + header->size);
+    std::free(header);
 }
 
 }  // namespace
 
-const Block* Find(const void* start) {
-    const auto entry = Living().find(start);
-    return entry == Living().end() ? nullptr : &entry->second;
+bool IsArray(const void* start, std::size_t size) {
+    const Header* const header = static_cast<const Header*>(start) - 1;
+    return header->form == Form::array && header->size == size;
 }
 
 }  // namespace HeapSpy

@@ -15,32 +15,17 @@
 
 namespace HeapSpy {
 
-enum class Form { single, array };
-
-struct Block {
-    const void* start;
-    std::size_t size;
-    Form form;
-
-    bool operator==(const Block& other) const {
-        return start == other.start && size == other.size && form == other.form;
-    }
-};
-
 constexpr std::uint8_t freshByte = 0xC5;
-constexpr std::uint8_t releasedByte = 0xD7;
 
-extern Block lastRequest;                          // `start` is null if it was refused.
-extern Block lastRelease;                          // The block as it was requested.
-extern std::array<std::uint8_t, 48> releasedHead;  // Its first bytes when it was released.
-extern std::size_t numRequests;
-extern std::size_t numReleases;
-extern std::size_t numLive;     // Blocks requested and not yet released.
+extern std::size_t lastRequest;                    // Its bytes, also if it was refused.
+extern const void* lastRelease;                    // The block's address,
+extern std::array<std::uint8_t, 48> releasedHead;  // and its first bytes when it was released.
+extern std::size_t numLive;                        // Blocks requested and not yet released.
 extern std::size_t numMisfits;  // Releases in the wrong form, or of what is no living block.
 extern std::size_t refuseIn;    // 1: the next request is refused, and so on; 0: none is.
 
-// The living block at this address, or null.
-const Block* Find(const void* start);
+// Whether a living block of this size starts here that was requested in array form.
+bool IsArray(const void* start, std::size_t size);
 
 // Runs `action` with its n-th request, from 0 on, refused. True if that failed; a refusal that the
 // action swallows is an error.
@@ -51,9 +36,8 @@ bool FailsAt(std::size_t n, Action action) {
     try {
         action();
     } catch (const std::bad_alloc&) { failed = true; }
-    const bool refused = refuseIn == 0;
+    EXPECT_EQ(failed, refuseIn == 0);
     refuseIn = 0;
-    EXPECT_EQ(failed, refused);
     return failed;
 }
 

@@ -1,17 +1,22 @@
-// What every test of a pool starts from and ends with: settings of its own, and a heap on which
-// nothing is left behind and every block went back in the form in which it came.
+// What every test of a pool starts from, checks on the way and ends with: settings of its own, the
+// laws of a pool's memory, restated from the outside where they can be, and a heap on which nothing
+// is left behind and every block went back in the form in which it came.
 
 #ifndef OBR_TESTS_POOLFIXTURE_HPP
 #define OBR_TESTS_POOLFIXTURE_HPP
 
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <iostream>
+#include <map>
 #include <streambuf>
+#include <vector>
 
 #include <gtest/gtest.h>
 
 #include "HeapSpy.hpp"
+#include "MemPool/BucketMgr.hpp"
 #include "MemPool/Settings.hpp"
 
 namespace OBR::MemPool {
@@ -22,8 +27,6 @@ protected:
     ~PoolFixture() override {
         EXPECT_EQ(HeapSpy::numLive, numLive);
         EXPECT_EQ(HeapSpy::numMisfits, 0u);
-        Settings::off = true;
-        Settings::trace = false;
     }
 
     // New pools are enabled and have these sizes.
@@ -36,7 +39,6 @@ protected:
         Settings::minRecordSize = minRecordSize;
         Settings::keepEmptyBuckets = keepEmptyBuckets;
         Settings::off = false;
-        Settings::trace = false;
     }
 
 private:
@@ -51,8 +53,9 @@ private:
 // Sends every request down the slow road while it lives, if asked to, and swallows its trace.
 class SlowRoad {
 public:
-    explicit SlowRoad(bool on) : former(on ? std::cout.rdbuf(nullptr) : std::cout.rdbuf()) {
+    explicit SlowRoad(bool on) : former(std::cout.rdbuf()) {
         Settings::trace = on;
+        if (on) { std::cout.rdbuf(nullptr); }
     }
     ~SlowRoad() {
         Settings::trace = false;
@@ -64,6 +67,119 @@ public:
 private:
     std::streambuf* const former;
 };
+
+// The nodes of a list, which must be whole in both directions: a list in a circle is not.
+template <typename Node>
+std::vector<const Node*> ListOf(const Node* front, Node* Node::*next, Node* Node::*prev) {
+    std::vector<const Node*> nodes;
+    for (const Node* node = front; node != nullptr; node = node->*next) {
+        if (node->*prev != (nodes.empty() ? nullptr : nodes.back())) {
+            ADD_FAILURE() << "A link back leads elsewhere.";
+            break;
+        }
+        nodes.push_back(node);
+    }
+    return nodes;
+}
+
+using Buckets = std::vector<const Bucket*>;
+inline Buckets AllBuckets(const Group& group) {
+    return ListOf(group.head, &Bucket::next1, &Bucket::prev1);
+}
+inline Buckets FreeBuckets(const Group& group) {
+    return ListOf(group.freeBuckets, &Bucket::next2, &Bucket::prev2);
+}
+
+// The blocks that a pool has given out: their usable bytes by their data.
+using Blocks = std::map<const std::uint8_t*, std::uint32_t>;
+
+// The records of a bucket follow each other, each of them is either on the free list, once, or USED
+// and known to the pool.
+inline void CheckBucket(const BucketMgr& pool, const Group& group, const Bucket& bucket,
+                        Blocks& blocks) {
+    const std::uint32_t recSize = group.recDataSize + 4u;
+    ASSERT_EQ(bucket.parent, &group);
+    ASSERT_EQ(bucket.recSize, recSize);
+    const std::uint32_t totalRecs = (pool.bucketSize - 2) / recSize;
+    ASSERT_EQ(bucket.size, 2 + totalRecs * recSize);
+    EXPECT_TRUE(HeapSpy::IsArray(&bucket, bucket.size + 46u));
+    EXPECT_TRUE(pool.keepEmptyBuckets || bucket.numFree < totalRecs);
+
+    const auto* const recsBase = reinterpret_cast<const std::uint8_t*>(&bucket) + 46;
+    const auto linkAt = [recsBase](std::uint32_t offset) {
+        return recsBase[offset] + recsBase[offset + 1] * 0x100u;
+    };
+    std::vector<bool> isFree(bucket.size, false);
+    for (std::uint32_t offset = bucket.freeHead; offset != 0; offset = linkAt(offset)) {
+        ASSERT_LT(offset, bucket.size);
+        ASSERT_FALSE(isFree[offset]) << "The free list runs in a circle.";
+        isFree[offset] = true;
+    }
+    EXPECT_EQ(std::count(isFree.begin(), isFree.end(), true), bucket.numFree);
+
+    std::uint32_t numUsed = 0;
+    for (std::uint32_t offset = 2; offset < bucket.size; offset += recSize) {
+        const std::uint8_t* const data = recsBase + offset + 4;
+        ASSERT_EQ(recsBase[offset + 2], isFree[offset] ? 0 : 1);
+        ASSERT_EQ(pool.FindBucket(data), isFree[offset] ? nullptr : &bucket);
+        if (isFree[offset]) { continue; }
+        ++numUsed;
+        EXPECT_EQ(pool.GetSize(data), group.recDataSize);
+        blocks[data] = group.recDataSize;
+    }
+    EXPECT_EQ(numUsed + bucket.numFree, totalRecs);
+}
+
+// Both lists of a group have the counts that they should, and a bucket is on the second while it
+// has a free record.
+inline void CheckGroup(const BucketMgr& pool, const Group& group, Blocks& blocks) {
+    ASSERT_EQ(group.parent, &pool);
+    const Buckets all = AllBuckets(group);
+    EXPECT_EQ(group.tail, all.empty() ? nullptr : all.back());
+    EXPECT_EQ(group.numBuckets, all.size());
+    Buckets withFree;
+    for (const Bucket* const bucket : all) {
+        CheckBucket(pool, group, *bucket, blocks);
+        if (bucket->numFree > 0) { withFree.push_back(bucket); }
+    }
+    const Buckets listed = FreeBuckets(group);
+    EXPECT_TRUE(
+        std::is_permutation(listed.begin(), listed.end(), withFree.begin(), withFree.end()));
+    EXPECT_EQ(group.numFreeBuckets, withFree.size());
+}
+
+// Checks all laws of `pool` and returns the blocks that live in it.
+inline Blocks CheckLaws(const BucketMgr& pool) {
+    Blocks blocks;
+    std::uint32_t numBuckets = 0;
+    for (std::uint32_t index = 0; index < pool.numGroups; ++index) {
+        const Group* const group = pool.groups[index];
+        if (group == nullptr) { continue; }
+        CheckGroup(pool, *group, blocks);
+        for (const Bucket* const bucket : AllBuckets(*group)) {
+            EXPECT_EQ(pool.GetBucket(numBuckets++), bucket);
+        }
+    }
+    EXPECT_EQ(pool.GetNumBuckets(), numBuckets);
+    EXPECT_EQ(pool.GetBucket(numBuckets), nullptr);
+
+    const auto extRecs = ListOf<ExtRec>(pool.extRecs, &ExtRec::next, &ExtRec::prev);
+    EXPECT_EQ(pool.numExtRecs, extRecs.size());
+    for (const ExtRec* const extRec : extRecs) {
+        EXPECT_TRUE(HeapSpy::IsArray(extRec, extRec->length + 24u));
+        const auto* const data = reinterpret_cast<const std::uint8_t*>(extRec) + 24;
+        EXPECT_EQ(pool.GetSize(data), extRec->length);
+        EXPECT_EQ(pool.Contains(data), extRec->length != 0);
+        blocks[data] = extRec->length;
+    }
+
+    const std::uint8_t* end = nullptr;
+    for (const auto& [data, size] : blocks) {
+        EXPECT_LE(end, data) << "Two blocks overlap.";
+        end = data + size;
+    }
+    return blocks;
+}
 
 }  // namespace OBR::MemPool
 

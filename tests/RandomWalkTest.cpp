@@ -1,5 +1,6 @@
-// A seeded walk through everything that a host can do to a pool, beside a simple account of the
-// blocks that live. All laws hold after every step, and no block's bytes are ever touched.
+// A seeded walk through everything that a host can do to a pool, with a heap that refuses at times,
+// beside a simple account of the blocks that live. All laws hold after every step, and no block's
+// bytes are ever touched.
 
 #include <algorithm>
 #include <cstdint>
@@ -14,7 +15,6 @@
 #include "HeapSpy.hpp"
 #include "MemPool/BucketMgr.hpp"
 #include "PoolFixture.hpp"
-#include "PoolLaws.hpp"
 
 namespace OBR::MemPool {
 
@@ -77,6 +77,9 @@ TEST_P(RandomWalkTest, KeepsEveryLaw) {
     const WalkSettings& is = GetParam();
     Use(is.bucketSize, is.alignment, is.maximum, is.minimum, is.keepEmptyBuckets);
     BucketMgr pool(nullptr, "pool");
+    const std::size_t numLiveIfNew = HeapSpy::numLive;
+    Use(100, 7, 77, 1, !is.keepEmptyBuckets);  // Later settings do not reach the pool.
+    Settings::off = true;
     for (int step = 0; step < 1500 && !HasFailure(); ++step) {
         SCOPED_TRACE(step);
         const bool grows = step % 300 < 150;
@@ -84,6 +87,9 @@ TEST_P(RandomWalkTest, KeepsEveryLaw) {
         if (event == 0) {
             pool.Clear();
             live.clear();
+            EXPECT_EQ(HeapSpy::numLive, numLiveIfNew);
+            EXPECT_EQ(std::count(pool.groups, pool.groups + pool.numGroups, nullptr),
+                      pool.numGroups);
         } else if (event < (grows ? 150u : 60u)) {
             Alloc(pool);
         } else {

