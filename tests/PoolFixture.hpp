@@ -27,6 +27,8 @@ protected:
     ~PoolFixture() override {
         EXPECT_EQ(HeapSpy::numLive, numLive);
         EXPECT_EQ(HeapSpy::numMisfits, 0u);
+        Settings::trace = false;
+        std::cout.rdbuf(output);
     }
 
     // New pools are enabled and have these sizes.
@@ -48,24 +50,8 @@ private:
     }
 
     const std::size_t numLive = NumLive();
-};
-
-// Sends every request down the slow road while it lives, if asked to, and swallows its trace.
-class SlowRoad {
-public:
-    explicit SlowRoad(bool on) : former(std::cout.rdbuf()) {
-        Settings::trace = on;
-        if (on) { std::cout.rdbuf(nullptr); }
-    }
-    ~SlowRoad() {
-        Settings::trace = false;
-        std::cout.rdbuf(former);
-    }
-    SlowRoad(const SlowRoad&) = delete;
-    SlowRoad& operator=(const SlowRoad&) = delete;
-
-private:
-    std::streambuf* const former;
+    // The trace sends every request down the slow road. Nobody reads it here.
+    std::streambuf* const output = std::cout.rdbuf(nullptr);
 };
 
 // The nodes of a list, which must be whole in both directions: a list in a circle is not.

@@ -61,8 +61,8 @@ SizeClass ClassOf(std::uint32_t size, const SizeSettings& is) {
 
 void ExpectNone(BucketMgr& pool, void* data) {
     const Blocks before = CheckLaws(pool);
-    for (const bool slow : {false, true}) {
-        const SlowRoad road(slow);
+    for (const bool slow : {true, false}) {
+        Settings::trace = slow;
         EXPECT_EQ(pool.FindBucket(data), nullptr);
         EXPECT_FALSE(pool.Contains(data));
         EXPECT_EQ(pool.GetSize(data), 0u);
@@ -105,7 +105,7 @@ TEST_F(PoolTest, EverySizeIsServedByItsClass) {
             EXPECT_EQ(pool.minRecordSize, is.poolMinimum);
             ASSERT_EQ(pool.numGroups, is.numGroups);
 
-            const SlowRoad road(variant >= 2);
+            Settings::trace = variant >= 2;
             for (std::uint32_t i = 0; i < classes.size(); ++i) {
                 const std::uint32_t size = variant % 2 == 0 ? i : is.poolMaximum + 8 - i;
                 const SizeClass& expected = classes[size];
@@ -187,8 +187,8 @@ TEST_F(PoolTest, ADisabledPoolIsTheHeap) {
     Settings::off = false;
     EXPECT_EQ(pool.numGroups, 249u);
     for (const std::uint32_t size : {0u, 12u, 70000u}) {
-        for (const bool slow : {false, true}) {
-            const SlowRoad road(slow);
+        for (const bool slow : {true, false}) {
+            Settings::trace = slow;
             void* const data = pool.Alloc(size);
             EXPECT_FALSE(pool.Contains(data));
             EXPECT_EQ(pool.GetSize(data), 0u);

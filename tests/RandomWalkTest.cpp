@@ -42,12 +42,10 @@ protected:
                                        Below(3 * maximum)};
         const std::uint32_t size = sizes[Below(4)];
         void* data = nullptr;
-        if (Below(8) == 0) {
-            if (HeapSpy::FailsAt(Below(2), [&] { data = pool.Alloc(size); })) { return; }
-        } else {
-            const SlowRoad road(Below(4) == 0);
-            data = pool.Alloc(size);
-        }
+        const bool refuses = Below(8) == 0;
+        Settings::trace = !refuses && Below(4) == 0;  // The trace asks the heap for its own.
+        const std::size_t refusal = refuses ? Below(2) : SIZE_MAX - 1;
+        if (HeapSpy::FailsAt(refusal, [&] { data = pool.Alloc(size); })) { return; }
         const Block block{pool.GetSize(data), static_cast<std::uint8_t>(Below(256))};
         ASSERT_GE(block.usable, size);
         std::memset(data, block.fill, block.usable);
@@ -59,7 +57,7 @@ protected:
         const auto entry = std::next(live.begin(), Below(live.size()));
         const auto [data, block] = *entry;
         EXPECT_EQ(std::count(data, data + block.usable, block.fill), block.usable);
-        const SlowRoad road(Below(4) == 0);
+        Settings::trace = Below(4) == 0;
         const bool staysInBucket = pool.keepEmptyBuckets && pool.FindBucket(data) != nullptr;
         // A heap record of no bytes waits for Clear.
         EXPECT_EQ(pool.Free(data), block.usable != 0);

@@ -2,6 +2,7 @@
 
 #include <MemPool>
 
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <memory>
@@ -31,6 +32,7 @@ struct Notebook {
     }
     void deallocate(T* block, std::size_t n) {
         elementsOut -= n;
+        std::fill_n(block, n, -1);
         std::allocator<T>().deallocate(block, n);
     }
 };
