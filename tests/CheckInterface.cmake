@@ -1,24 +1,18 @@
 # Compares what the shared library exports with the committed list of symbols, and what it needs
-# with the standard libraries. Takes NM, READELF, LIBRARY, EXPECTED, and ALLOWED: a pattern of
-# further libraries that a build may need.
+# with the standard libraries. Takes NM, READELF, LIBRARY, EXPECTED, and ALLOWED: the names of
+# further libraries that a build may need, each behind a bar.
 
 cmake_minimum_required(VERSION 3.25)
 
 execute_process(COMMAND ${NM} -D --defined-only ${LIBRARY}
                 OUTPUT_VARIABLE symbols COMMAND_ERROR_IS_FATAL ANY)
-string(REGEX MATCHALL " [A-Za-z] [^ \n]+" symbols "${symbols}")
+string(REGEX MATCHALL "[A-Za-z] [^ \n]+\n" symbols "${symbols}")
 list(TRANSFORM symbols STRIP)
 list(TRANSFORM symbols REPLACE "^(A [^@]+)@@.*" "\\1")  # A version, which LLVM's nm repeats.
 file(STRINGS ${EXPECTED} expected)
-set(surplus ${symbols})
-list(REMOVE_ITEM surplus ${expected})
-set(missing ${expected})
-list(REMOVE_ITEM missing ${symbols})
-if(surplus OR missing)
-    list(JOIN surplus "\n  " surplus)
-    list(JOIN missing "\n  " missing)
-    message(SEND_ERROR "The exported symbols differ from ${EXPECTED}.\n"
-                       "Surplus:\n  ${surplus}\nMissing:\n  ${missing}")
+if(NOT symbols STREQUAL expected)
+    list(JOIN symbols "\n" symbols)
+    message(SEND_ERROR "The exported symbols are not those of ${EXPECTED}:\n${symbols}")
 endif()
 
 execute_process(COMMAND ${READELF} -d -W ${LIBRARY}
@@ -27,11 +21,8 @@ if(NOT dynamic MATCHES "\\(SONAME\\) +Library soname: \\[libObrMemPool\\.so\\.1\
     message(SEND_ERROR "The library's name is not libObrMemPool.so.1:\n${dynamic}")
 endif()
 string(REGEX MATCHALL "Shared library: \\[[^]]+" needed "${dynamic}")
-list(TRANSFORM needed REPLACE ".*\\[" "")
-list(FILTER needed EXCLUDE REGEX "^(libstdc\\+\\+|libgcc_s|libc|libm|ld-linux-x86-64)\\.so\\.")
-if(ALLOWED)
-    list(FILTER needed EXCLUDE REGEX "${ALLOWED}")
-endif()
+list(FILTER needed EXCLUDE REGEX
+     "\\[(libstdc\\+\\+|libgcc_s|libc|libm|ld-linux-x86-64${ALLOWED})\\.so\\.")
 if(needed)
     message(SEND_ERROR "The library needs more than the standard libraries: ${needed}")
 endif()

@@ -1,9 +1,6 @@
 // The trace, line by line, and the moment of each line within its event.
 
 #include <MemPool>
-#include <cstdint>
-#include <cstdio>
-#include <cstdlib>
 #include <functional>
 #include <iostream>
 #include <memory>
@@ -11,6 +8,8 @@
 #include <string>
 
 #include <gtest/gtest.h>
+
+#include "diagnostics/Text.hpp"
 
 using namespace OBR::MemPool;
 
@@ -40,18 +39,14 @@ private:
     std::streambuf* const former;
 };
 
-std::string Line(const char* event, const void* pool) {
-    char text[32];
-    std::snprintf(text, sizeof text, "xmpt:%s:%016jx", event,
-                  static_cast<std::uintmax_t>(reinterpret_cast<std::uintptr_t>(pool)));
-    return text;
+std::string Line(const char* event, const BucketMgr* pool) {
+    return "xmpt:" + std::string(event) + ":" + BareHex(pool);
 }
 std::string Freed(const Mgr& pool, const void* data) {
-    return Line("f", pool.GetBucketMgr()) + Line("", data).substr(5) + ":\n";
+    return Line("f", pool.GetBucketMgr()) + ":" + BareHex(data) + ":\n";
 }
 std::string Allocated(const Mgr& pool, const void* data, unsigned int size) {
-    return Line("a", pool.GetBucketMgr()) + Line("", data).substr(5) + ":" + std::to_string(size) +
-           "\n";
+    return Line("a", pool.GetBucketMgr()) + ":" + BareHex(data) + ":" + std::to_string(size) + "\n";
 }
 
 class Trace : public testing::TestWithParam<bool> {
@@ -82,80 +77,66 @@ TEST_P(Trace, EachEventWritesItsLine) {
         EXPECT_EQ(output.Take(), Freed(*pool, data));
     }
     EXPECT_FALSE(pool->Free(nullptr));
-    EXPECT_EQ(output.Take(), "");
     pool->Clear();
     EXPECT_EQ(output.Take(), "");
+
+    // The switch counts from the next event on.
+    NUV_OBR_MEMPOOL_TRACE(false);
+    void* const quiet = pool->Alloc(10);
+    pool->Free(pool->Alloc(10));
+    EXPECT_EQ(output.Take(), "");
+    NUV_OBR_MEMPOOL_TRACE(true);
+    pool->Free(quiet);
+    EXPECT_EQ(output.Take(), Freed(*pool, quiet));
 
     pool.reset();
     EXPECT_EQ(output.Take(), Line("d", address) + "\n");
 }
 
-TEST_P(Trace, TheSwitchCountsFromTheNextEventOn) {
-    NUV_OBR_MEMPOOL_TRACE(false);
-    Mgr pool("switched");
-    void* const quiet = pool.Alloc(10);
-    EXPECT_EQ(output.Take(), "");
-    NUV_OBR_MEMPOOL_TRACE(true);
-    void* const told = pool.Alloc(10);
-    EXPECT_EQ(output.Take(), Allocated(pool, told, 10));
-    pool.Free(quiet);
-    EXPECT_EQ(output.Take(), Freed(pool, quiet));
-    NUV_OBR_MEMPOOL_TRACE(false);
-    pool.Free(told);
-    EXPECT_EQ(output.Take(), "");
-}
-
-TEST(TraceOfFailures, AFailedFreeIsToldLikeAnother) {
+// A pool enters the registry behind its "c:" line and leaves it ahead of its "d:" line. A block is
+// in use at the moments of both its lines, and at the end of its pool. A failed Free is told like
+// another.
+TEST(TraceOfMoments, EachLineHasItsMoment) {
     NUV_OBR_MEMPOOL_ON(true);
-    Output output;
-    Mgr pool("own");
     Mgr other("other");
     void* const foreign = other.Alloc(10);
     NUV_OBR_MEMPOOL_TRACE(true);
-    EXPECT_FALSE(pool.Free(foreign));
-    EXPECT_EQ(output.Take(), Freed(pool, foreign));
-    EXPECT_TRUE(other.Contains(foreign));
-    NUV_OBR_MEMPOOL_TRACE(false);
-}
-
-// A pool enters the registry behind its "c:" line and leaves it ahead of its "d:" line. A block is
-// in use at the moments of both its lines, and at the end of its pool.
-TEST(TraceOfMoments, EachLineHasItsMoment) {
-    NUV_OBR_MEMPOOL_ON(true);
-    NUV_OBR_MEMPOOL_TRACE(true);
     Output output;
     unsigned int events = 0;
-    output.onFlush = [&] {
+    const auto unlisted = [&] {
         ++events;
         EXPECT_EQ(GetMgr("watched"), nullptr);
     };
+    output.onFlush = unlisted;
     auto pool = std::make_unique<Mgr>("watched");
     EXPECT_EQ(GetMgr("watched"), pool.get());
     output.Take();
 
-    const auto inUse = [&] {
-        ++events;
-        const std::string line = output.Take();  // "xmpt:a:", the pool, ":", the block, ...
-        const auto block = std::strtoull(line.c_str() + 24, nullptr, 16);
-        EXPECT_TRUE(pool->Contains(reinterpret_cast<const void*>(block))) << line;
-    };
-    output.onFlush = inUse;
-    for (const unsigned int size : {10u, 2000u}) { pool->Free(pool->Alloc(size)); }
-    output.onFlush = [&] { ++events; };
-    const void* const record = pool->Alloc(10);
-    const void* const heapRecord = pool->Alloc(2000);
     output.onFlush = [&] {
         ++events;
-        EXPECT_EQ(GetMgr("watched"), nullptr);
+        const std::string line = output.Take();  // "xmpt:a:", the pool, ":", the block, ...
+        const auto block = std::stoull(line.substr(24), nullptr, 16);
+        EXPECT_TRUE(pool->Contains(reinterpret_cast<const void*>(block))) << line;
+    };
+    for (const unsigned int size : {10u, 2000u}) { pool->Free(pool->Alloc(size)); }
+    const void* const record = pool->Alloc(10);
+    const void* const heapRecord = pool->Alloc(2000);
+
+    output.onFlush = [] {};
+    EXPECT_FALSE(pool->Free(foreign));
+    EXPECT_EQ(output.Take(), Freed(*pool, foreign));
+    EXPECT_TRUE(other.Contains(foreign));
+
+    output.onFlush = [&] {
+        unlisted();
         EXPECT_TRUE(pool->Contains(record));
         EXPECT_TRUE(pool->Contains(heapRecord));
     };
     // A moment inside the destructor: the handle is still there to be asked.
-    Mgr* const handle = pool.get();
-    handle->~Mgr();
-    output.onFlush = [] {};
+    pool->~Mgr();
     ::operator delete(pool.release());
     EXPECT_EQ(events, 8u);
+    output.onFlush = [] {};
     NUV_OBR_MEMPOOL_TRACE(false);
 }
 

@@ -10,9 +10,8 @@ using namespace OBR::MemPool;
 
 static const Mgr own("own");
 
-// The pools that handles have left, so that a leak checker still knows them.
-const void* abandoned[2] = {};
-const void** nextAbandoned = abandoned;
+// The pool that a handle has left, so that a leak checker still knows it.
+const void* abandoned = nullptr;
 
 extern "C" {
 
@@ -23,13 +22,13 @@ void Build(void* place, const char* name) {
     pool->Alloc(5000);
 }
 
-void Share(void* left, const void* right) {
-    *nextAbandoned++ = static_cast<Mgr*>(left)->GetBucketMgr();
-    *static_cast<Mgr*>(left) = *static_cast<const Mgr*>(right);
+void Share(Mgr* left, const Mgr* right) {
+    abandoned = left->GetBucketMgr();
+    *left = *right;
 }
 
-void Destroy(void* place) {
-    static_cast<Mgr*>(place)->~Mgr();
+void Destroy(Mgr* pool) {
+    pool->~Mgr();
 }
 
 // Shows the registry as each of its functions tells it.
