@@ -6,7 +6,7 @@ set -euo pipefail
 packages=()
 for job in "$@"; do
     case $job in
-        build) packages+=(g++ cmake ninja-build libcli11-dev libgtest-dev zlib1g-dev) ;;
+        build) packages+=(g++ cmake ninja-build libcli11-dev libgmock-dev zlib1g-dev) ;;
         test) packages+=(clang libclang-rt-14-dev binutils pkg-config) ;;
         lint) packages+=(git clang-format clang-tidy shellcheck) ;;
         bench) packages+=(libbenchmark-dev libmimalloc2.0 libjemalloc2 libtcmalloc-minimal4

@@ -9,10 +9,9 @@
 #include <cstdlib>
 #include <fstream>
 #include <iterator>
-#include <regex>
+#include <map>
 #include <sstream>
 #include <string>
-#include <utility>
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -25,13 +24,18 @@ using testing::Not;
 namespace {
 
 // A trace from a shorthand, in which the pools are P and Q, the addresses of blocks X and Y.
-std::string Trace(std::string text) {
-    for (const auto& [letter, address] :
-         {std::pair{"P", "00000000006a1200"}, std::pair{"Q", "00000000006a1300"},
-          std::pair{"X", "00007f0000000010"}, std::pair{"Y", "00007f0000000020"}}) {
-        text = std::regex_replace(text, std::regex(letter), address);
+std::string Trace(const std::string& shorthand) {
+    const std::map<char, const char*> meanings = {{'@', "xmpt:"},
+                                                  {'P', "00000000006a1200"},
+                                                  {'Q', "00000000006a1300"},
+                                                  {'X', "00007f0000000010"},
+                                                  {'Y', "00007f0000000020"}};
+    std::string text;
+    for (const char letter : shorthand) {
+        const auto meaning = meanings.find(letter);
+        text += meaning != meanings.end() ? meaning->second : std::string(1, letter);
     }
-    return std::regex_replace(text, std::regex("@"), "xmpt:");
+    return text;
 }
 
 // Writes a trace and returns its name.
@@ -90,8 +94,12 @@ TEST(Replay, ReportsOnEachTrace) {
         File("plain", std::string(200000, 'x') + '\0' + pools + "\n") + " " + File("bad", bad);
     const std::string report = Tool("--rounds 2 " + files, 1);
 
-    const std::regex figures("( {3}(?:bytes held at the peak|ns an event {11}))( +[0-9.]+){3}\n");
-    const std::string text = std::regex_replace(report, figures, "$1   # # #\n");
+    std::string text;
+    std::istringstream lines(report);
+    for (std::string line; std::getline(lines, line); text += line + "\n") {
+        const bool compares = line.find("   bytes held") == 0 || line.find("   ns an event") == 0;
+        if (compares && line.back() != '-') { line.replace(27, std::string::npos, "# # #"); }
+    }
     const std::string path = EXPECTED_DIR "/replay.txt";
     if (std::getenv("OBR_MEMPOOL_APPROVE") != nullptr) { std::ofstream(path) << text; }
     std::ifstream file(path);
@@ -111,8 +119,9 @@ TEST(Replay, RefusesACommandLineThatMakesNoSense) {
 // The block of 200 bytes is gone by the peak, that of 56 is yet to come. Sizes that the allocator
 // does not round.
 TEST(Replay, CountsWhatIsHeldAtThePeak) {
-    const std::string path = File(
-        "held", Trace("@c:P\n@a:P:X:200\n@f:P:X:\n@a:P:X:5000\n@a:P:Y:24\n@f:P:X:\n@a:P:X:56\n"));
+    const std::string path =
+        File("held", Trace("@c:P\n@a:P:X:200\n@f:P:X:\n@a:P:X:1992\n@a:P:Y:24\n@f:P:X:\n") +
+                         Trace("@a:P:X:5000\n@f:P:X:\n@a:P:X:56\n"));
     const auto held = [&](const std::string& options) {
         return Find(Tool("--rounds 1 " + options + path), "bytes held at the peak");
     };

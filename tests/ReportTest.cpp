@@ -74,6 +74,14 @@ void AddBlocks(Blocks& blocks, const BucketMgr& pool) {
     }
 }
 
+std::string Contents(const Blocks& blocks) {
+    std::string bytes;
+    for (const auto& [start, size] : blocks) {
+        bytes.append(static_cast<const char*>(start), size);
+    }
+    return bytes;
+}
+
 std::string Stable(std::string text, const Blocks& blocks) {
     std::map<const void*, std::size_t> numbers;
     for (auto at = text.find("0x"); at != std::string::npos; at = text.find("0x", at + 2)) {
@@ -126,12 +134,15 @@ std::vector<void*> Alloc(Mgr& pool, unsigned int size, int times) {
     return blocks;
 }
 
-// What `print` writes about the pool.
+// What `print` writes about the pool, of which it changes no byte.
 template <typename Print>
 std::string Printed(const Mgr& pool, Print print) {
     Blocks blocks;
     AddBlocks(blocks, *pool.GetBucketMgr());
-    return Stable(Printed(print), blocks);
+    const std::string before = Contents(blocks);
+    const std::string text = Stable(Printed(print), blocks);
+    EXPECT_TRUE(Contents(blocks) == before);
+    return text;
 }
 std::string Plain(const Mgr& pool) {
     return Printed(pool, [&] { pool.Dbg(); });
@@ -311,6 +322,21 @@ TEST_F(Report, OfADamagedBucketStaysWithinIt) {
         EXPECT_EXIT(check(), ExitedWithCode(fault.empty() ? 0 : 1), Eq(fault)) << name;
     }
     ExpectText("damaged-buckets", text);
+}
+
+TEST_F(Report, WarnsOnStandardOutputWhereverItGoes) {
+    std::unique_ptr<Bucket, void (*)(Bucket*)> bucket(Bucket::Create(nullptr, 50, 12),
+                                                      Bucket::Destroy);
+    bucket->size = 48;
+    bucket->RecordAt(34)->Format(2);
+    std::ostringstream elsewhere;
+    EXPECT_EQ(Printed([&] {
+                  bucket->DbgAllRecords(elsewhere, 0);
+                  bucket->DbgFreeList(elsewhere, 0);
+              }),
+              "WARNING:../s/MemPool: 2916: Exceeded the total number of recs 3 > 2\n"
+              "WARNING:../s/MemPool: 2970: Exceeded the number of total number of recs 3 > 2\n");
+    EXPECT_EQ(elsewhere.str().find("WARNING"), std::string::npos);
 }
 
 // The first free record but one is damaged, so that the operation itself does not meet it.
