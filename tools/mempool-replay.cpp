@@ -602,9 +602,7 @@ constexpr Setting settings[] = {
      "Data sizes are rounded up to a multiple of it"},
 };
 
-}  // namespace
-
-int main(int argc, char** argv) {
+int Run(int argc, char** argv) {
     CLI::App app(description);
     app.footer(notes);
 
@@ -648,4 +646,15 @@ int main(int argc, char** argv) {
         }
     }
     return status;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    try {
+        return Run(argc, argv);
+    } catch (const std::exception& error) {
+        std::cerr << "mempool-replay: " << error.what() << '\n';
+        return EXIT_FAILURE;
+    }
 }
