@@ -205,7 +205,7 @@ int Run(int argc, char** argv) {
     bool detailed = false;
     app.add_option("FILE", files, "Texts to read; - is the standard input")->required();
     app.add_option("--top", top, "How many of the most frequent words to print")
-        ->check(CLI::NonNegativeNumber)
+        ->check(CLI::Range(0, 1000000))
         ->capture_default_str();
     app.add_flag("--heap", heap, "Turn the pools off: every block comes from the heap");
     app.add_flag("--detailed", detailed, "Report every bucket and every record of the pools");

@@ -5,10 +5,10 @@
 # shellcheck source=scripts/build.sh
 source "$(dirname "$0")/build.sh"
 
-rounds=7 seconds=0.1
+rounds=5 seconds=0.1
 case "${1:-}" in
     "") ;;
-    --quick) rounds=3 seconds=0.02 ;;
+    --quick) rounds=2 seconds=0.02 ;;
     *)
         echo "usage: scripts/bench.sh [--quick]" >&2
         exit 2
