@@ -4,6 +4,7 @@
 #ifndef OBR_MEMPOOL_GROUP_HPP
 #define OBR_MEMPOOL_GROUP_HPP
 
+#include <cstddef>
 #include <cstdint>
 
 #include "MemPool/Bucket.hpp"
@@ -67,6 +68,8 @@ private:
 
     void Release(Bucket* bucket, bool wasFull);
 };
+static_assert(sizeof(Group) == 48 && offsetof(Group, recDataSize) == 40,
+              "Four pointers, two counts and the data size, in this order.");
 
 }  // namespace OBR::MemPool
 

@@ -33,6 +33,17 @@ void WriteLeft(std::ostream& stream, int width, const Text& text) {
     stream << std::left << std::setw(width) << text << std::right << "| ";
 }
 
+// A line of boxes that begins at the margin, with the text of each by the index of its record.
+template <typename WriteBox>
+void WriteBoxes(std::ostream& stream, std::uint16_t n, std::uint16_t first, WriteBox writeBox) {
+    WriteMargin(stream);
+    stream << "| ";
+    for (std::uint32_t index = first; index < std::uint32_t{first} + n; ++index) {
+        writeBox(index);
+    }
+    stream << std::endl;
+}
+
 }  // namespace
 
 void Bucket::DbgRecordMap(std::ostream& stream) const {
@@ -79,26 +90,20 @@ void Bucket::DbgMapRule(std::ostream& stream, std::uint16_t n) const {
 
 void Bucket::DbgMapKinds(std::ostream& stream, std::uint16_t n, std::uint16_t first,
                          const Records& records) const {
-    WriteMargin(stream);
-    stream << "| ";
-    for (std::uint32_t index = first; index < std::uint32_t{first} + n; ++index) {
+    WriteBoxes(stream, n, first, [&](std::uint32_t index) {
         const std::uint16_t offset = OffsetOf(records[index]);
         std::string kind = RecKindName(TypeAt(offset));
         if (offset == freeHead) { kind += " +"; }
         WriteLeft(stream, 8, kind);
-    }
-    stream << std::endl;
+    });
 }
 
 void Bucket::DbgMapOffsets(std::ostream& stream, std::uint16_t n, std::uint16_t first,
                            const Records& records) const {
-    WriteMargin(stream);
-    stream << "| ";
-    for (std::uint32_t index = first; index < std::uint32_t{first} + n; ++index) {
+    WriteBoxes(stream, n, first, [&](std::uint32_t index) {
         stream << "o=";
         WriteLeft(stream, 6, OffsetOf(records[index]));
-    }
-    stream << std::endl;
+    });
 }
 
 void Bucket::DbgMapSizes(std::ostream& stream, std::uint16_t n, std::uint16_t first) const {
@@ -112,9 +117,7 @@ void Bucket::DbgMapSizes(std::ostream& stream, std::uint16_t n, std::uint16_t fi
 
 void Bucket::DbgMapValues(std::ostream& stream, std::uint16_t n, std::uint16_t first,
                           const Records& records) const {
-    WriteMargin(stream);
-    stream << "| ";
-    for (std::uint32_t index = first; index < std::uint32_t{first} + n; ++index) {
+    WriteBoxes(stream, n, first, [&](std::uint32_t index) {
         const std::uint16_t offset = OffsetOf(records[index]);
         switch (TypeAt(offset)) {
             case typeFree:
@@ -130,8 +133,7 @@ void Bucket::DbgMapValues(std::ostream& stream, std::uint16_t n, std::uint16_t f
                 WriteLeft(stream, 6, 0U);
                 break;
         }
-    }
-    stream << std::endl;
+    });
 }
 
 }  // namespace OBR::MemPool
