@@ -84,7 +84,7 @@ TEST_F(VectorTest, ReservesExactlyAndNeverShrinks) {
     Vector numbers;
     numbers.reserve(0);
     EXPECT_EQ(numbers.data, nullptr);
-    for (const std::size_t n : {3, 2, 3, 8}) { numbers.reserve(n); }
+    for (const std::size_t n : {3U, 2U, 3U, 8U}) { numbers.reserve(n); }
     EXPECT_EQ(requests, (Counts{3, 8}));
     EXPECT_EQ(numbers.capacity, 8u);
 }
