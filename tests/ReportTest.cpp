@@ -169,7 +169,7 @@ TEST_F(Report, OfAPool) {
     Use(100, 96, true);
     Mgr detailed("detailed");
     const auto blocks = Alloc(detailed, 12, 14);
-    for (const std::size_t index : {2, 4, 9}) { detailed.Free(blocks[index]); }
+    for (const std::size_t index : {2U, 4U, 9U}) { detailed.Free(blocks[index]); }
     detailed.Free(detailed.Alloc(28));
     Alloc(detailed, 40, 2);
     Alloc(detailed, 100, 2);
