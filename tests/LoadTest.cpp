@@ -24,9 +24,9 @@ struct Place {
 // The plugin, loaded, and the library with it.
 struct Plugin {
     void* const file = dlopen(PLUGIN, RTLD_NOW);
-    void (*const build)(Place*, const char* name) = Find<void(Place*, const char*)>("Build");
-    void (*const share)(Place*, const Place*) = Find<void(Place*, const Place*)>("Share");
-    void (*const destroy)(Place*) = Find<void(Place*)>("Destroy");
+    void (*const build)(void*, const char* name) = Find<void(void*, const char*)>("Build");
+    void (*const share)(void*, const void*) = Find<void(void*, const void*)>("Share");
+    void (*const destroy)(void*) = Find<void(void*)>("Destroy");
     void (*const showPools)(const char* name) = Find<void(const char*)>("ShowPools");
 
 private:

@@ -22,13 +22,13 @@ void Build(void* place, const char* name) {
     pool->Alloc(5000);
 }
 
-void Share(Mgr* left, const Mgr* right) {
-    abandoned = left->GetBucketMgr();
-    *left = *right;
+void Share(void* left, const void* right) {
+    abandoned = static_cast<Mgr*>(left)->GetBucketMgr();
+    *static_cast<Mgr*>(left) = *static_cast<const Mgr*>(right);
 }
 
-void Destroy(Mgr* pool) {
-    pool->~Mgr();
+void Destroy(void* pool) {
+    static_cast<Mgr*>(pool)->~Mgr();
 }
 
 // Shows the registry as each of its functions tells it.
