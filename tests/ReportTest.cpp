@@ -7,6 +7,7 @@
 #include <cstdint>
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <fstream>
 #include <functional>
 #include <iomanip>
@@ -189,6 +190,83 @@ TEST_F(Report, OfAPool) {
     disabled.Free(block);
 }
 
+TEST_F(Report, HoldsEveryLineInItsPlace) {
+    Mgr demo("demo");
+    Alloc(demo, 10, 3);
+    demo.Alloc(2000);
+    std::string text = Plain(demo);
+
+    Use(4010, 1000, true);
+    Mgr tables("tables");
+    const auto blocks = Alloc(tables, 12, 503);
+    for (std::size_t index = 0; index < 249; ++index) { tables.Free(blocks[index]); }
+    tables.Free(tables.Alloc(32));
+    tables.Alloc(2000);
+    tables.Alloc(5000);
+    text += Plain(tables);
+
+    Use(242, 200);
+    Mgr bucket("bucket");
+    bucket.Free(Alloc(bucket, 20, 3)[1]);
+    text += Printed(bucket, [&] {
+        bucket.GetBucketMgr()->GetBucket(0)->DbgBucket(std::cout, 1, 1, true, true);
+    });
+    ExpectText("examples", text);
+}
+
+TEST_F(Report, ShowsItsSectionsOneByOne) {
+    Use(50, 40);
+    Mgr pool("sections");
+    pool.Alloc(12);
+    for (const unsigned int flags : {0U, 1U, 2U, 3U, 4U, 5U, 6U, 7U}) {
+        const bool showBuckets = (flags & 1U) != 0;
+        const bool showRecords = (flags & 2U) != 0;
+        const bool showFreeList = (flags & 4U) != 0;
+        const std::string text = Printed([&] {
+            pool.GetBucketMgr()->DbgReport(std::cout, 0, showBuckets, showRecords, showFreeList);
+        });
+        const auto shows = [&](const char* part) { return text.find(part) != std::string::npos; };
+        EXPECT_EQ(shows("   MemPool::Bucket #001\n"), showBuckets);
+        EXPECT_EQ(shows(" #001 ALL RECORDS ("), showBuckets && showRecords);
+        EXPECT_EQ(shows(" #001 FREE LIST ("), showBuckets && showFreeList);
+    }
+}
+
+TEST_F(Report, ShowsThePoolsOwnSettings) {
+    Use(70000, 998);
+    Settings::minRecordSize = 9;
+    const Mgr pool("settings");
+    Use(50, 40);
+    Settings::dataAlignment = 8;
+    const std::string text = Plain(pool);
+    for (const char* line :
+         {"Bucket Size :            65535\n", "Min Rec Sz  :               12\n",
+          "Max Rec Sz  :              996\n", "Data Align  :                4\n"}) {
+        EXPECT_NE(text.find(line), std::string::npos) << line;
+    }
+}
+
+TEST_F(Report, WritesNumbersWiderThanTheirColumnsWhole) {
+    Use(4 + 192 * 16, 16);
+    Mgr pool("wide");
+    Alloc(pool, 12, 15);
+    pool.Alloc(12345678);
+    Bucket& bucket = *pool.GetBucketMgr()->groups[2]->head;
+    std::string text = Plain(pool);
+    bucket.numFree = 193;  // Of 192 records.
+    text += Plain(pool);
+    bucket.numFree = 0;  // Of none: full and empty.
+    bucket.recSize = 0;
+    text += Plain(pool);
+    bucket.recSize = 16;
+    ExpectText("wide", text);
+
+    SizeCounts many;
+    for (std::uint32_t size = 1; size <= 100000; ++size) { many[size] = 1; }
+    const std::string rows = Printed([&] { pool.GetBucketMgr()->DbgUsedData(std::cout, 0, many); });
+    EXPECT_EQ(rows.substr(rows.rfind('\n', rows.size() - 2)), "\n100000  100000         1 **\n");
+}
+
 // A handle that was assigned to shows the pool that it has now, under each pool that it made; a
 // pool that has lost its handle is not shown.
 TEST_F(Report, OfAllPoolsIsInTheOrderOfTheirNames) {
@@ -210,15 +288,27 @@ TEST_F(Report, OfAllPoolsIsInTheOrderOfTheirNames) {
     const std::string text = library();
     assigned.reset();
     ExpectText("library", text + library());
-    registry.Erase("orphan");
-    delete orphan;
+
+    // Nor is a pool whose handle has moved on to one that is gone.
+    const std::string before = library();
+    Mgr stranded("stranded");
+    BucketMgr* const left = stranded.GetBucketMgr();
+    {
+        const Mgr gone("gone");
+        stranded = gone;
+    }
+    EXPECT_EQ(library(), before);
+    for (BucketMgr* const pool : {orphan, left}) {
+        registry.Erase(pool->name);
+        delete pool;
+    }
 }
 
 TEST_F(Report, DrawsBarsByTheirFrequency) {
     const Mgr pool("bars");
     ExpectText("bars", Printed([&] {
-                   for (const std::uint32_t largest :
-                        {1U, 99U, 100U, std::numeric_limits<std::uint32_t>::max()}) {
+                   for (const std::uint32_t largest : {1U, 3U, 49U, 50U, 99U, 100U, 149U, 150U,
+                                                       std::numeric_limits<std::uint32_t>::max()}) {
                        pool.GetBucketMgr()->DbgUsedData(std::cout, 2, {{8, 1}, {2000, largest}});
                    }
                    for (const int used : {1, 50, 51}) {
@@ -239,8 +329,17 @@ TEST_F(Report, DrawsTheRecordsOfABucketAsAMap) {
         return Printed([&] { bucket->DbgRecordMap(std::cout); });
     };
     const std::string text = map(1, 0) + map(7, 7) + map(8, 4) + map(9, 0) + map(16, 9);
-    const std::string longest = map(4093, 0);
-    ExpectText("maps", text + longest.substr(longest.size() - 800));
+
+    // Row labels of four and of five columns.
+    Use(65535, 8);
+    Settings::dataAlignment = 1;
+    Settings::minRecordSize = 5;
+    Mgr pool("longest");
+    pool.Alloc(1);
+    std::string longest =
+        Printed([&] { pool.GetBucketMgr()->GetBucket(0)->DbgRecordMap(std::cout); });
+    longest.erase(longest.find("\n10008 |") + 1);
+    ExpectText("maps", text + longest.substr(longest.find("\n9992 |") + 1));
 }
 
 // What the host has set counts until a report sets it, and what a report sets stays. The numbers
@@ -259,8 +358,8 @@ TEST_F(Report, TakesTheStreamAsItIsWhereItSetsNothing) {
     std::string text;
     for (const auto& report : reports) {
         std::cout.imbue(groupingLocale);
-        std::cout << std::left << std::hex << std::showbase << std::uppercase << std::scientific
-                  << std::setprecision(9) << std::setfill('#') << std::setw(20);
+        std::cout << std::left << std::boolalpha << std::hex << std::showbase << std::uppercase
+                  << std::scientific << std::setprecision(9) << std::setfill('#') << std::setw(20);
         text += Printed(pool, [&] {
             report();
             std::cout << 1234 << std::setw(12) << 1234 << std::setw(16) << 0.5 << std::endl;
@@ -289,6 +388,17 @@ const struct {
     {"a link ahead of them", [](Bucket& bucket) { bucket.RecordAt(34)->Format(1); }, unknown},
     {"a head behind the end", [](Bucket& bucket) { bucket.freeHead = 65522; }, unknown},
     {"a list cut short", [](Bucket& bucket) { bucket.freeHead = 0; }, ""},
+    {"a head between records", [](Bucket& bucket) { bucket.freeHead = 17; }, unknown},
+    {"a head a whole record ahead of them",
+     [](Bucket& bucket) {
+         bucket.size = 47;
+         bucket.recSize = 15;
+         bucket.freeHead = 1;
+     },
+     unknown},
+    {"too many free records told", [](Bucket& bucket) { bucket.numFree = 9; }, ""},
+    {"a heap record's type", [](Bucket& bucket) { bucket.RecordAt(34)->type = typeExt; },
+     notFree + "EXT\n"},
     {"an unknown type", [](Bucket& bucket) { bucket.RecordAt(18)->type = 7; }, unknown},
     {"a size one short", [](Bucket& bucket) { bucket.size = 49; }, ""},
     {"just a header at the end", [](Bucket& bucket) { bucket.size = 37; }, ""},
@@ -303,6 +413,9 @@ TEST_F(Report, OfADamagedBucketStaysWithinIt) {
     for (const auto& [name, damage, fault] : damages) {
         Bucket* const whole = Bucket::Create(nullptr, 50, 12);
         whole->TakeRecord();
+        for (const std::uint32_t offset : {2U, 18U, 34U}) {
+            std::memset(whole->RecordAt(offset)->Data(), 0xEE, 12);
+        }
         damage(*whole);
         const char* const start = reinterpret_cast<const char*>(whole);
         const std::size_t told = Bucket::baseDistance + whole->size;
