@@ -3,13 +3,14 @@ set terminal svg size 960,560 font "sans,12" background "white"
 set output output
 set title "Time of an operation, glibc's malloc = 1 (less is better)"
 set logscale x 2
-set xrange [0.0625:4]
-set xtics ("1/16" 0.0625, "1/8" 0.125, "1/4" 0.25, "1/2" 0.5, "1" 1, "2" 2, "4" 4)
+set xrange [0.03125:16]
+set xtics ("1/32" 0.03125, "1/16" 0.0625, "1/8" 0.125, "1/4" 0.25, "1/2" 0.5, "1" 1, "2" 2, "4" 4, "8" 8, "16" 16)
 set grid xtics ytics lc rgb "#dddddd"
 set arrow from 1, graph 0 to 1, graph 1 nohead lc rgb "#888888"
 set key outside bottom center horizontal
 set datafile separator "\t"
 set datafile missing "-"
+set offsets 0, 0, 0.5, 0
 set yrange [-0.5:*] reverse
 set lmargin 34
 plot data using 2:0:ytic(1) title "pool, default" with points pt 7 ps 1.2 lc rgb "#c02020", \
