@@ -15,9 +15,6 @@ namespace {
 
 constexpr std::uint32_t recHdrSize = sizeof(RecHdr);
 
-// The fields of a bucket are 16 bits wide.
-constexpr std::uint32_t maxBucketSize = 65535;
-
 }  // namespace
 
 BucketMgr::BucketMgr(Mgr* handle, const std::string& poolName)

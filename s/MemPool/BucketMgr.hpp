@@ -22,6 +22,9 @@ class Mgr;
 // The largest size that Mgr::Alloc lets through: sums of a size and a header never wrap.
 constexpr std::uint32_t maxAllocSize = 0x3FFFFFFF;
 
+// The fields of a bucket are 16 bits wide.
+constexpr std::uint32_t maxBucketSize = 65535;
+
 // The smallest multiple of `multiple` that is at least `value`, but never 0. In 32 bits.
 constexpr std::uint32_t RoundUp(std::uint32_t value, std::uint32_t multiple) {
     const std::uint32_t below = value == 0 ? 0 : value - 1;

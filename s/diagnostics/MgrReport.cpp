@@ -17,9 +17,8 @@ namespace OBR::MemPool {
 
 namespace {
 
-// Bounds of the bucket size that the report shows. Nothing enforces them.
+// The least bucket size that the report advises. Nothing enforces it.
 constexpr std::uint32_t minBucketSize = 128;
-constexpr std::uint32_t maxBucketSize = 65535;
 
 struct Figures {
     std::uint32_t emptyBuckets = 0;  // No record in use.
