@@ -81,6 +81,13 @@ public:
         SetFreeState(((state + oneFree) & numFreeMask) | RecHdr::LinkOf(hdr));
     }
 
+    // Whether a record's header is USED with a link that can be an offset. One comparison for both.
+    static bool IsUsed(std::uint32_t hdr) {
+        const std::uint32_t unguarded = hdr & 0x00FFFFFF;
+        return unguarded >= RecHdr::Marked(0, typeUsed, firstOffset) &&
+               unguarded <= RecHdr::Marked(0, typeUsed, 0xFFFF);
+    }
+
     // The bucket that a record's own link leads to.
     static Bucket* Holding(void* data, std::uint16_t offset) {
         return reinterpret_cast<Bucket*>(static_cast<char*>(data) - sizeof(RecHdr) - offset -

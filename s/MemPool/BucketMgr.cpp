@@ -4,6 +4,7 @@
 #include "MemPool/BucketMgr.hpp"
 
 #include <algorithm>
+#include <limits>
 #include <new>
 
 #include "diagnostics/Messages.hpp"
@@ -55,13 +56,16 @@ void BucketMgr::RoundRecordSizes() {
 
 void BucketMgr::PrepareShortRoad() {
     const bool isPowerOfTwo = (dataAlignment & (dataAlignment - 1)) == 0;
-    if (!enabled || !isPowerOfTwo || maxRecordSize < dataAlignment + recHdrSize) { return; }
+    const bool fits = minRecordSize <= std::numeric_limits<std::int16_t>::max();
+    if (!enabled || !isPowerOfTwo || !fits || maxRecordSize < dataAlignment + recHdrSize) {
+        return;
+    }
 
     while (std::uint32_t{1} << alignmentShift < dataAlignment) { ++alignmentShift; }
-    firstStep = static_cast<std::uint16_t>(minRecordSize >> alignmentShift);
-    headerSteps = static_cast<std::uint8_t>(1 + (recHdrSize >> alignmentShift));
+    const std::uint32_t headerSteps = 1 + (recHdrSize >> alignmentShift);
+    skippedSteps = static_cast<std::int16_t>((minRecordSize >> alignmentShift) - headerSteps);
     const std::uint32_t largest = (maxRecordSize - recHdrSize) >> alignmentShift << alignmentShift;
-    shortEnd = static_cast<std::uint16_t>(largest + 1);
+    shortMax = static_cast<std::uint16_t>(largest);
 }
 
 // The place in `groups` of records of `recSize` bytes.
@@ -85,6 +89,7 @@ Group* BucketMgr::GroupFor(std::uint32_t recSize) {
 }
 
 OBR_NOINLINE void* BucketMgr::AllocOnSlowRoad(std::uint32_t size) {
+    if (size > maxAllocSize) { Messages::SizeAboveLimit(size, maxAllocSize); }
     void* data = nullptr;
     if (!enabled) {
         data = ::operator new[](size);

@@ -19,7 +19,7 @@ namespace OBR::MemPool {
 
 class Mgr;
 
-// The largest size that Mgr::Alloc lets through: sums of a size and a header never wrap.
+// The largest size that Alloc lets through: sums of a size and a header never wrap.
 constexpr std::uint32_t maxAllocSize = 0x3FFFFFFF;
 
 // The fields of a bucket are 16 bits wide.
@@ -53,12 +53,11 @@ public:
     bool enabled = true;  // False: every request goes straight to the heap.
 
 private:
-    // The size-class rule for the short road, worked out once, without its division and its cases.
-    // All but shortEnd count in steps of dataAlignment, and are valid while shortEnd is not 0.
-    std::uint16_t shortEnd = 0;       // One past the largest size for it. 0: none goes that way.
-    std::uint16_t firstStep = 0;      // minRecordSize.
+    // The size-class rule for the short road, worked out once, without its division and its cases:
+    // the index for `size` is (size - 1) >> alignmentShift, less skippedSteps, but at least 0.
+    std::uint16_t shortMax = 0;       // Sizes from 1 to this go that way. 0: none does.
+    std::int16_t skippedSteps = 0;    // Steps of dataAlignment up to index 0. Can be below 0.
     std::uint8_t alignmentShift = 0;  // dataAlignment is 2 to the power of this.
-    std::uint8_t headerSteps = 0;     // Whole steps from (size - 1) up to the size of its record.
 
 public:
     // Builds a pool from the settings. Stops the process if they cannot make one.
@@ -67,10 +66,15 @@ public:
     BucketMgr& operator=(const BucketMgr&) = delete;
     ~BucketMgr();
 
-    // Returns a block of at least `size` bytes, never null. `size` is at most maxAllocSize.
+    // Returns a block of at least `size` bytes, never null. Stops the process if `size` is above
+    // maxAllocSize.
     void* Alloc(std::uint32_t size) {
-        if (OBR_UNLIKELY(size >= shortEnd || Settings::trace)) { return AllocOnSlowRoad(size); }
-        Group* const group = groups[ShortIndex(size)];
+        const std::uint32_t below =
+            size - 1;  // Wraps for 0, which is then none for the short road.
+        if (OBR_UNLIKELY(below >= shortMax || Settings::trace)) { return AllocOnSlowRoad(size); }
+        const std::int32_t skipped = skippedSteps;
+        const auto step = static_cast<std::int32_t>(below >> alignmentShift);
+        Group* const group = groups[std::max(step, skipped) - skipped];
         if (OBR_UNLIKELY(group == nullptr)) { return AllocOnSlowRoad(size); }
         return group->Alloc();
     }
@@ -93,10 +97,8 @@ public:
     OBR_READS_FOREIGN Bucket* FindBucket(void* data) const {
         if (data == nullptr) { return nullptr; }
         const std::uint32_t hdr = RecHdr::Of(data)->Word();
-        if (RecHdr::TypeOf(hdr) != typeUsed) { return nullptr; }
-        const std::uint16_t offset = RecHdr::LinkOf(hdr);
-        if (offset < Bucket::firstOffset) { return nullptr; }
-        Bucket* const bucket = Bucket::Holding(data, offset);
+        if (!Bucket::IsUsed(hdr)) { return nullptr; }
+        Bucket* const bucket = Bucket::Holding(data, RecHdr::LinkOf(hdr));
         const Group* const owner = bucket->Owner();
         if (owner == nullptr || owner->parent != this) { return nullptr; }
         return bucket;
@@ -122,12 +124,6 @@ public:
     void DbgExtRecs(std::ostream& stream, std::uint32_t level) const;
 
 private:
-    std::uint32_t ShortIndex(std::uint32_t size) const {
-        const std::uint32_t below = size - static_cast<std::uint32_t>(size != 0);
-        const std::uint32_t step = (below >> alignmentShift) + headerSteps;
-        return std::max<std::uint32_t>(step, firstStep) - firstStep;
-    }
-
     void RoundRecordSizes();
     void PrepareShortRoad();
     std::uint32_t IndexOf(std::uint32_t recSize) const;

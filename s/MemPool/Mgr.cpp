@@ -1,5 +1,5 @@
-// The exported class: names, the size limit, and handles that share a pool. All memory work lies in
-// the BucketMgr behind it, whose short roads are inline here.
+// The exported class: names, and handles that share a pool. All memory work lies in the BucketMgr
+// behind it, whose short roads are inline here.
 
 #include <MemPool>
 
@@ -68,7 +68,6 @@ Mgr& Mgr::operator=(const Mgr& other) {
 }
 
 void* Mgr::Alloc(unsigned int size) {
-    if (OBR_UNLIKELY(size > maxAllocSize)) { Messages::SizeAboveLimit(size, maxAllocSize); }
     return bucketMgr->Alloc(size);
 }
 

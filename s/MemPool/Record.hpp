@@ -67,9 +67,9 @@ struct RecHdr {
     void SetWord(std::uint32_t word) { std::memcpy(this, &word, sizeof word); }
 
     static std::uint16_t LinkOf(std::uint32_t word) { return static_cast<std::uint16_t>(word); }
-    static std::uint8_t TypeOf(std::uint32_t word) { return static_cast<std::uint8_t>(word >> 16); }
-    static std::uint32_t Marked(std::uint32_t word, std::uint8_t type, std::uint16_t link) {
-        return (word & 0xFF000000) | std::uint32_t{type} << 16 | link;
+    static constexpr std::uint32_t Marked(std::uint32_t word, std::uint8_t type,
+                                          std::uint16_t link) {
+        return (word & 0xFF000000) + ((std::uint32_t{type} << 16) + link);
     }
 
     // The link alone, for those who have no use for the rest.
