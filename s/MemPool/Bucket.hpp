@@ -53,8 +53,11 @@ public:
         return (std::int32_t{size} - std::int32_t{firstOffset}) / std::int32_t{recSize};
     }
     std::uint32_t DataSize() const { return recSize - std::uint32_t{sizeof(RecHdr)}; }
-    // The same question as numFree == TotalRecs(), without its division.
-    bool IsEmpty() const { return std::uint32_t{numFree} * recSize + firstOffset == size; }
+    // The same question as numFree == TotalRecs(), without its division, in the 16 bits of `size`.
+    bool IsEmpty() const {
+        const std::uint32_t freeExtent = std::uint32_t{numFree} * recSize + firstOffset;
+        return static_cast<std::uint16_t>(freeExtent) == size;
+    }
     bool IsFull() const { return numFree == 0; }
 
     // Takes the first free record; there must be one. Returns its data.
@@ -65,11 +68,11 @@ public:
         const std::uint32_t hdr = record->Word();
         record->SetWord(RecHdr::Marked(hdr, typeUsed, offset));
         SetFreeState(((state - oneFree) & numFreeMask) | RecHdr::LinkOf(hdr));
-        PrefetchFirstFree();
+        __builtin_prefetch(RecordAt(RecHdr::LinkOf(hdr)));  // The next to be taken may be cold.
         return record->Data();
     }
 
-    // The next record to be taken is one that nothing has touched since it was freed.
+    // For a bucket that will be the next to give a record, and may not have been touched for long.
     void PrefetchFirstFree() const { __builtin_prefetch(RecordAt(freeHead)); }
 
     // Puts the used record of these data in front of the free list.

@@ -74,7 +74,7 @@ public:
         if (OBR_UNLIKELY(below >= shortMax || Settings::trace)) { return AllocOnSlowRoad(size); }
         const std::int32_t skipped = skippedSteps;
         const auto step = static_cast<std::int32_t>(below >> alignmentShift);
-        Group* const group = groups[std::max(step, skipped) - skipped];
+        Group* const group = groups[static_cast<std::uint32_t>(std::max(step, skipped) - skipped)];
         if (OBR_UNLIKELY(group == nullptr)) { return AllocOnSlowRoad(size); }
         return group->Alloc();
     }
