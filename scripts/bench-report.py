@@ -3,8 +3,9 @@
 
 usage: bench-report.py RESULTS OUTPUT
 
-RESULTS holds SUBJECT.ROUND.json (Google Benchmark's) and "resident" (subject, size, bytes a block
-and, for the pool, bytes held). The figures for the picture go back there, as ratios.dat.
+RESULTS holds NUMBER.SUBJECT.ROUND.json (Google Benchmark's, by the number of the row) and "resident"
+(subject, size, bytes a block and, for the pool, bytes held). The figures for the picture go back
+there, as ratios.dat.
 """
 
 import json
@@ -24,19 +25,18 @@ IN_PICTURE = ["mimalloc", "jemalloc", "tcmalloc", "pmr"]
 
 
 def read_times(results):
-    """Median nanoseconds an operation, as times[subject][row]; rows in their order."""
-    samples = {}
+    """Nanoseconds an operation by round, as times[subject][row]; the rows in their order."""
+    times = {}
     rows = []
     for path in sorted(results.glob("*.json")):
-        subject = path.name.split(".")[0]
+        _, subject, round_number, _ = path.name.split(".")
         for bench in json.loads(path.read_text())["benchmarks"]:
             row = bench["name"].split("/")[0]
-            if row not in rows and subject == "pool":
+            if row not in rows:
                 rows.append(row)
-            samples.setdefault(subject, {}).setdefault(row, []).append(
-                1e9 / bench["items_per_second"])
-    return {subject: {row: statistics.median(times) for row, times in by_row.items()}
-            for subject, by_row in samples.items()}, rows
+            by_round = times.setdefault(subject, {}).setdefault(row, {})
+            by_round[round_number] = 1e9 / bench["items_per_second"]
+    return times, rows
 
 
 def table(header, lines):
@@ -55,52 +55,57 @@ def geometric_mean(values):
     return math.exp(statistics.fmean(math.log(value) for value in values))
 
 
-class Ratios:
-    """The pool's times divided by a peer's."""
+class Measured:
+    """Medians over the rounds: of the times, and of the ratios of the two times of a round."""
 
     def __init__(self, times):
         self.times = times
 
-    def best(self, row):
-        return min(self.times[pool][row] for pool in POOLS)
+    def time(self, row, subject):
+        by_round = self.times.get(subject, {}).get(row)
+        return None if by_round is None else statistics.median(by_round.values())
 
-    def of(self, row, peer, pool="pool"):
-        own = self.best(row) if pool == "best" else self.times[pool][row]
-        other = self.times.get(peer, {}).get(row)
-        return None if other is None else own / other
+    def of(self, row, peer, subject="pool"):
+        if subject == "best":
+            ratios = [self.of(row, peer, pool) for pool in POOLS]
+            return None if None in ratios else min(ratios)
+        own, other = (self.times.get(name, {}).get(row) for name in (subject, peer))
+        if own is None or other is None:
+            return None
+        return statistics.median(own[number] / other[number] for number in own)
 
-    def mean(self, rows, peer, pool="pool"):
-        values = [self.of(row, peer, pool) for row in rows]
+    def mean(self, rows, peer, subject="pool"):
+        values = [self.of(row, peer, subject) for row in rows]
         return None if None in values else geometric_mean(values)
 
 
-def goals(ratios, rows, resident):
+def goals(measured, rows, resident):
     """(what, goal, measured) triples: ratios that are to stay at or below their goals."""
     def worst(names, peer, pool="pool"):
-        values = [ratios.of(row, peer, pool) for row in names]
+        values = [measured.of(row, peer, pool) for row in names]
         return None if None in values else max(values)
 
     one_size = "200k x 32, free in "
-    beside_pmr = [row for row in rows if ratios.of(row, "pmr") and row != "pair, no other block"]
+    beside_pmr = [row for row in rows if measured.of(row, "pmr") and row != "pair, no other block"]
     return [
-        ("pair, another block live / glibc", 1.0, ratios.of("pair, another block live", "glibc")),
-        ("the same, stretch", 0.8, ratios.of("pair, another block live", "glibc")),
+        ("pair, another block live / glibc", 1.0, measured.of("pair, another block live", "glibc")),
+        ("the same, stretch", 0.8, measured.of("pair, another block live", "glibc")),
         ("free in order or reverse / glibc", 0.6,
          worst([one_size + "order", one_size + "reverse"], "glibc")),
-        ("free in random order / glibc", 0.75, ratios.of(one_size + "random order", "glibc")),
-        ("churn mixed, 1k live / glibc", 0.75, ratios.of("churn mixed, 1k live", "glibc")),
-        ("churn mixed, 20k live / glibc", 1.0, ratios.of("churn mixed, 20k live", "glibc")),
-        ("churn mixed, 200k live / glibc", 0.75, ratios.of("churn mixed, 200k live", "glibc")),
-        ("build and drop / glibc", 0.3, ratios.of("build 200k mixed, drop all", "glibc")),
-        ("build and drop / mimalloc", 0.85, ratios.of("build 200k mixed, drop all", "mimalloc")),
+        ("free in random order / glibc", 0.75, measured.of(one_size + "random order", "glibc")),
+        ("churn mixed, 1k live / glibc", 0.75, measured.of("churn mixed, 1k live", "glibc")),
+        ("churn mixed, 20k live / glibc", 1.0, measured.of("churn mixed, 20k live", "glibc")),
+        ("churn mixed, 200k live / glibc", 0.75, measured.of("churn mixed, 200k live", "glibc")),
+        ("build and drop / glibc", 0.3, measured.of("build 200k mixed, drop all", "glibc")),
+        ("build and drop / mimalloc", 0.85, measured.of("build 200k mixed, drop all", "mimalloc")),
         ("worst trace / glibc", 1.1, worst(TRACES, "glibc")),
         ("worst trace, best setting / glibc", 1.0, worst(TRACES, "glibc", "best")),
-        ("traces, geometric mean / glibc", 0.75, ratios.mean(TRACES, "glibc")),
+        ("traces, geometric mean / glibc", 0.75, measured.mean(TRACES, "glibc")),
         ("traces, best setting, geometric mean / mimalloc", 1.15,
-         ratios.mean(TRACES, "mimalloc", "best")),
-        ("the same, stretch", 1.0, ratios.mean(TRACES, "mimalloc", "best")),
+         measured.mean(TRACES, "mimalloc", "best")),
+        ("the same, stretch", 1.0, measured.mean(TRACES, "mimalloc", "best")),
         ("worst row but the empty pool's pair / pmr", 0.9, worst(beside_pmr, "pmr")),
-        ("all those rows, geometric mean / pmr", 0.5, ratios.mean(beside_pmr, "pmr")),
+        ("all those rows, geometric mean / pmr", 0.5, measured.mean(beside_pmr, "pmr")),
     ] + [
         (f"resident bytes of {size} / best malloc", 1.0,
          resident["pool"][size] / min(resident[peer][size] for peer in MALLOCS if peer in resident))
@@ -156,7 +161,7 @@ def main():
     results, output = map(pathlib.Path, sys.argv[1:])
     times, rows = read_times(results)
     resident, held = read_resident(results)
-    ratios = Ratios(times)
+    measured = Measured(times)
     peers = [peer for peer in PEERS if peer in times]
     timed = [row for row in rows if any(row in times[peer] for peer in peers)]
     text = ["# Performance", "",
@@ -167,39 +172,39 @@ def main():
             "boost and pmr, whose code is partly in headers. boost serves only one size.", "",
             "Each row has a process of its own, in which the heap is made long first and kept so by",
             "a block at its end, as other data of a host would. Without it the C library hands the",
-            "memory of each round back to the system, and the rows measure that.", "",
+            "memory of each round back to the system, and the rows measure that. Subjects take turns",
+            "row by row; a ratio is the median of the ratios of the rounds.", "",
             "## Nanoseconds an operation, medians", ""]
     text += table(["work"] + POOLS + peers,
-                  ([row] + [number(times[subject].get(row), 1) for subject in POOLS + peers]
+                  ([row] + [number(measured.time(row, subject), 1) for subject in POOLS + peers]
                    for row in rows))
     text += ["## Ratios, less than 1 is a win", ""]
     compared = [peer for peer in ("glibc", "mimalloc", "pmr") if peer in peers]
     text += table(["work"] + [f"pool / {peer}" for peer in compared] +
                   [f"best setting / {peer}" for peer in compared],
-                  ([row] + [number(ratios.of(row, peer)) for peer in compared] +
-                   [number(ratios.of(row, peer, "best")) for peer in compared] for row in timed))
+                  ([row] + [number(measured.of(row, peer)) for peer in compared] +
+                   [number(measured.of(row, peer, "best")) for peer in compared] for row in timed))
     for peer in compared:
-        both = [row for row in timed if ratios.of(row, peer) is not None]
+        both = [row for row in timed if measured.of(row, peer) is not None]
         text.append(f"Geometric mean of all rows beside {peer}: "
-                    f"{number(ratios.mean(both, peer))} at the default settings, "
-                    f"{number(ratios.mean(both, peer, 'best'))} with the best.")
+                    f"{number(measured.mean(both, peer))} at the default settings, "
+                    f"{number(measured.mean(both, peer, 'best'))} with the best.")
     text += ["", "## Goals", ""]
     text += table(["ratio", "goal", "measured", ""],
-                  ([what, number(goal), number(measured),
-                    "" if measured is None else "met" if measured <= goal else "missed"]
-                   for what, goal, measured in goals(ratios, rows, resident)))
+                  ([what, number(goal), number(ratio),
+                    "" if ratio is None else "met" if ratio <= goal else "missed"]
+                   for what, goal, ratio in goals(measured, rows, resident)))
     text += ["## Resident bytes a live block", ""]
     text += resident_tables(resident, held)
     output.write_text("\n".join(text).rstrip() + "\n")
 
     with (results / "ratios.dat").open("w") as data:
         for row in timed:
-            glibc = times["glibc"].get(row)
-            if glibc is None:
+            if row not in times["glibc"]:
                 continue
-            marks = [times["pool"][row], ratios.best(row)]
-            marks += [times.get(peer, {}).get(row) for peer in IN_PICTURE]
-            cells = ["-" if mark is None else f"{mark / glibc:.3f}" for mark in marks]
+            marks = [measured.of(row, "glibc"), measured.of(row, "glibc", "best")]
+            marks += [measured.of(row, "glibc", peer) for peer in IN_PICTURE]
+            cells = ["-" if mark is None else f"{mark:.3f}" for mark in marks]
             data.write("\t".join([row] + cells) + "\n")
 
 

@@ -1,7 +1,8 @@
 #!/usr/bin/env bash
 # Measures the pool beside its peers and writes docs/performance.md and docs/performance.svg.
-# Every subject runs once a round, so that what the machine does meanwhile meets all of them; the
-# report takes medians over the rounds. --quick: fewer and shorter rounds, for a first look.
+# Every subject does a row right behind the others, so that what the machine does meanwhile meets all
+# of them; the report takes medians over the rounds. --quick: fewer and shorter rounds, for a first
+# look.
 # shellcheck source=scripts/build.sh
 source "$(dirname "$0")/build.sh"
 
@@ -42,24 +43,30 @@ else
 fi
 peers+=(pmr)
 
-# The rows of a subject, each in a process of its own: none runs on the heap that another left.
+# One row of one subject in a process of its own: it does not run on the heap that another left.
 measure() {
-    local subject=$1 round=$2 name=$1 row number=100
+    local subject=$1 row=$2 output=$3 name=$1
     [ -z "${preload[$subject]+set}" ] || name=heap
-    build/bench/bench/PoolBench --subject="$name" --benchmark_list_tests | while read -r row; do
-        number=$((number + 1))
-        LD_PRELOAD=${preload[$subject]:-} build/bench/bench/PoolBench --subject="$name" \
-            --benchmark_filter="^$row\$" --benchmark_min_time="$seconds" \
-            --benchmark_out_format=json \
-            --benchmark_out="$results/$subject.$round.$number.json" >/dev/null 2>"$results/log" ||
-            { cat "$results/log" >&2 && exit 1; }
-    done
+    grep -qxF "$row" "$results/$name.rows" || return 0
+    LD_PRELOAD=${preload[$subject]:-} build/bench/bench/PoolBench --subject="$name" \
+        --benchmark_filter="^$row\$" --benchmark_min_time="$seconds" \
+        --benchmark_out_format=json --benchmark_out="$output" >/dev/null 2>"$results/log" ||
+        { cat "$results/log" >&2 && exit 1; }
 }
 
+subjects=(pool pool-keep pool-64k "${peers[@]}")
+for name in pool pool-keep pool-64k heap boost pmr; do
+    build/bench/bench/PoolBench --subject=$name --benchmark_list_tests \
+        >"$results/$name.rows" 2>/dev/null || true
+done
+mapfile -t rows <"$results/pool.rows"
 for ((round = 1; round <= rounds; ++round)); do
     step "Round $round of $rounds"
-    for subject in pool pool-keep pool-64k "${peers[@]}"; do
-        measure "$subject" "$round"
+    for number in "${!rows[@]}"; do
+        for subject in "${subjects[@]}"; do
+            printf -v output '%s/%02d.%s.%d.json' "$results" "$number" "$subject" "$round"
+            measure "$subject" "${rows[number]}" "$output"
+        done
     done
 done
 
