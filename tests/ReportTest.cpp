@@ -27,6 +27,7 @@
 #include "Child.hpp"
 #include "MemPool/BucketMgr.hpp"
 #include "MemPool/MgrRegistry.hpp"
+#include "diagnostics/Messages.hpp"
 #include "diagnostics/Text.hpp"
 
 using namespace OBR::MemPool;
@@ -446,9 +447,11 @@ TEST_F(Report, WarnsOnStandardOutputWhereverItGoes) {
     EXPECT_EQ(Printed([&] {
                   bucket->DbgAllRecords(elsewhere, 0);
                   bucket->DbgFreeList(elsewhere, 0);
+                  Messages::TooFewRows(1, 2);
               }),
               "WARNING:../s/MemPool: 2916: Exceeded the total number of recs 3 > 2\n"
-              "WARNING:../s/MemPool: 2970: Exceeded the number of total number of recs 3 > 2\n");
+              "WARNING:../s/MemPool: 2970: Exceeded the number of total number of recs 3 > 2\n"
+              "WARNING:../s/MemPool: 2922: Did not reach the expected number of recs 1 < 2\n");
     EXPECT_EQ(elsewhere.str().find("WARNING"), std::string::npos);
 }
 

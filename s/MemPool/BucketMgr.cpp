@@ -102,9 +102,9 @@ OBR_NOINLINE void* BucketMgr::AllocOnSlowRoad(std::uint32_t size) {
 }
 
 void* BucketMgr::AllocExtRec(std::uint32_t size) {
-    auto* const extRec = static_cast<ExtRec*>(::operator new[](sizeof(ExtRec) + size));
-    *extRec = {extRecs, nullptr, size, {{0xAA, 0xBB}, typeExt, 0xCC}};
+    ExtRec* const extRec = ExtRec::Create(size);
     ++numExtRecs;
+    extRec->next = extRecs;
     if (extRecs != nullptr) { extRecs->prev = extRec; }
     extRecs = extRec;
     return extRec->Data();

@@ -1,5 +1,5 @@
 // The memory of a pool, byte by byte: what a record and a heap record are made of and how a data
-// pointer leads to its header. With Bucket.hpp the only place that casts or counts in bytes.
+// pointer leads to its header. With Bucket the only place that counts in the bytes of a block.
 //
 //   Bucket, one heap block                              ExtRec ("heap record"), one heap block
 //
@@ -28,6 +28,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
+#include <new>
 
 #define OBR_UNLIKELY(condition) __builtin_expect(static_cast<bool>(condition), 0)
 #define OBR_NOINLINE __attribute__((noinline))
@@ -50,9 +51,9 @@ constexpr std::uint8_t typeUsed = 1;
 constexpr std::uint8_t typeExt = 2;
 constexpr std::uint8_t typeUnknown = 0xFF;  // What reports take for a header that lies nowhere.
 
-// A record's header. A record may start at any address: its header is copied byte by byte, low byte
-// of the link first. All four bytes go in one copy, of which a compiler makes one load or store.
-// That is for speed: most records are freed or taken soon after they were taken or freed, and a
+// A record's header. A record may start at any address, so that its header is copied like bytes,
+// low byte of the link first; a compiler makes one load or store of a copy. All four bytes go at
+// once, for speed: most records are freed or taken soon after they were taken or freed, and a
 // machine hands a stored value straight on only to a load of the same bytes.
 struct RecHdr {
     std::uint8_t link[2];  // FREE: offset of the next free record; USED: own offset; EXT: AA BB.
@@ -102,6 +103,13 @@ struct ExtRec {
     ExtRec* prev;          // Previous one, null at the front.
     std::uint32_t length;  // Bytes asked for, not rounded. 0: no test takes it for a heap record.
     RecHdr hdr;            // Stands where a record's header stands: 4 bytes ahead of the data.
+
+    // Makes a heap record, on no list.
+    static ExtRec* Create(std::uint32_t length) {
+        auto* const extRec = static_cast<ExtRec*>(::operator new[](sizeof(ExtRec) + length));
+        *extRec = {nullptr, nullptr, length, {{0xAA, 0xBB}, typeExt, 0xCC}};
+        return extRec;
+    }
 
     void* Data() { return this + 1; }
     const void* Data() const { return this + 1; }

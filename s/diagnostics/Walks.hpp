@@ -42,7 +42,8 @@ void ForEachRecord(const Bucket& bucket, Visit visit) {
 //
 //     for (FreeListWalk walk(bucket); walk.IsOnRecord(); walk.Next()) { ... walk.Offset() ... }
 //
-// It has no end if the list runs in a circle. It never leaves a place that is no record's.
+// It has no end if the list runs in a circle, and no sense from the first place on that is not a
+// record's.
 class FreeListWalk {
 public:
     explicit FreeListWalk(const Bucket& walked) : bucket(walked), offset(walked.freeHead) {}
