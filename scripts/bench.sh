@@ -62,6 +62,7 @@ done
 mapfile -t rows <"$results/pool.rows"
 for ((round = 1; round <= rounds; ++round)); do
     step "Round $round of $rounds"
+    subjects=("${subjects[@]:1}" "${subjects[0]}")  # Each round begins with another.
     for number in "${!rows[@]}"; do
         for subject in "${subjects[@]}"; do
             printf -v output '%s/%02d.%s.%d.json' "$results" "$number" "$subject" "$round"
