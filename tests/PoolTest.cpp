@@ -123,6 +123,22 @@ TEST_F(PoolTest, EverySizeIsServedByItsClass) {
     }
 }
 
+// At the ends of what 16 bits hold, a minimum above 15 of them too.
+TEST_F(PoolTest, TheLargestRecordsAreServedByTheirClasses) {
+    for (const std::uint32_t minimum : {5u, 40000u}) {
+        Use(70000, 1, 65531, minimum);
+        BucketMgr pool(nullptr, "pool");
+        for (const std::uint32_t size : {1u, 39996u, 39997u, 65527u}) {
+            const std::uint32_t recSize = std::max(size + 4, minimum);
+            const Bucket* const bucket = pool.FindBucket(pool.Alloc(size));
+            ASSERT_NE(bucket, nullptr) << size;
+            EXPECT_EQ(bucket->parent, pool.groups[recSize - minimum]) << size;
+            EXPECT_EQ(bucket->recSize, recSize);
+        }
+        EXPECT_EQ(pool.FindBucket(pool.Alloc(65528)), nullptr);
+    }
+}
+
 // Headers that are like a record's in all but one point, also at odd addresses.
 TEST_F(PoolTest, EachTestOfARecordCounts) {
     BucketMgr pool(nullptr, "pool");

@@ -102,18 +102,6 @@ TEST(Process, SettingsThatCannotMakeAPoolStop) {
     }
 }
 
-TEST(Process, SettingsJustInsideTheBoundsMakeAPool) {
-    NUV_OBR_MEMPOOL_ON(true);
-    Store(1004, 4, 1001, 997);
-    EXPECT_EQ(Mgr("exact").GetBucketMgr()->numGroups, 1u);
-    Store(70000, 4, 65531, 8);
-    EXPECT_EQ(Mgr("capped").GetBucketMgr()->maxRecordSize, 65528u);
-    Store(4010, 0, 1000, 8);
-    EXPECT_EQ(Mgr("unaligned").GetBucketMgr()->dataAlignment, 1u);
-    EXPECT_EQ(NUV_OBR_MEMPOOL_DATA_ALIGNMENT(), 0u);
-    Store(4010, 4, 1000, 8);
-}
-
 TEST(Process, ARefusedPoolHasTracedItsCreation) {
     const auto build = [] {
         Child::Capture(Child::Captured::out);

@@ -214,16 +214,6 @@ TEST(Settings, RecordSizesThatCannotWorkEndTheLoad) {
         testing::Eq(refusal + "\nterminate called after throwing an instance of 'char const*'\n"));
 }
 
-TEST(Settings, APoolCopiesTheSwitchWhenItIsBuilt) {
-    NUV_OBR_MEMPOOL_OFF(true);
-    const Mgr before("before");
-    NUV_OBR_MEMPOOL_ON(true);
-    const Mgr after("after");
-    EXPECT_FALSE(before.IsEnabled());
-    NUV_OBR_MEMPOOL_OFF(true);
-    EXPECT_TRUE(after.IsEnabled());
-}
-
 TEST(Settings, AccessorsStoreWhatTheyAreGiven) {
     NUV_OBR_MEMPOOL_BUCKET_SIZE(4294967295);
     NUV_OBR_MEMPOOL_MAX_RECORD_SIZE(70000);
