@@ -69,8 +69,7 @@ public:
     // Returns a block of at least `size` bytes, never null. Stops the process if `size` is above
     // maxAllocSize.
     void* Alloc(std::uint32_t size) {
-        const std::uint32_t below =
-            size - 1;  // Wraps for 0, which is then none for the short road.
+        const std::uint32_t below = size - 1;  // Wraps for 0, which thus takes the slow road.
         if (OBR_UNLIKELY(below >= shortMax || Settings::trace)) { return AllocOnSlowRoad(size); }
         const std::int32_t skipped = skippedSteps;
         const auto step = static_cast<std::int32_t>(below >> alignmentShift);
