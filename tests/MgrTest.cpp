@@ -207,6 +207,7 @@ public:
         }
         EXPECT_EQ(GetNumMgrs(), numPools);
         EXPECT_EQ(All(), expected);
+        EXPECT_LE(registry.Sharers().size(), numPlaces);
         for (const Place& at : places) {
             if (!at.handle) { continue; }
             EXPECT_EQ(at.handle->GetBucketMgr(), at.pool == nullptr ? nullptr : at.pool->address);
