@@ -35,8 +35,14 @@ for peer in mimalloc:libmimalloc.so jemalloc:libjemalloc.so tcmalloc:libtcmalloc
     fi
 done
 
+# The rows that each way of asking for memory can do; none if it could not be built.
+for name in pool pool-keep pool-64k heap boost pmr; do
+    build/bench/bench/PoolBench --subject=$name --benchmark_list_tests \
+        >"$results/$name.rows" 2>/dev/null || true
+done
+
 peers=("${!preload[@]}")
-if build/bench/bench/PoolBench --subject=boost --benchmark_list_tests >/dev/null 2>&1; then
+if grep -q . "$results/boost.rows"; then
     peers+=(boost)
 else
     echo "Boost.Pool is left out: its headers are not installed."
@@ -55,10 +61,6 @@ measure() {
 }
 
 subjects=(pool pool-keep pool-64k "${peers[@]}")
-for name in pool pool-keep pool-64k heap boost pmr; do
-    build/bench/bench/PoolBench --subject=$name --benchmark_list_tests \
-        >"$results/$name.rows" 2>/dev/null || true
-done
 mapfile -t rows <"$results/pool.rows"
 for ((round = 1; round <= rounds; ++round)); do
     step "Round $round of $rounds"
