@@ -13,7 +13,7 @@
 
 #include "Child.hpp"
 #include "MemPool/BucketMgr.hpp"
-#include "diagnostics/Messages.hpp"
+#include "diagnostics/text/Messages.hpp"
 
 using namespace OBR::MemPool;
 

@@ -27,8 +27,8 @@
 #include "Child.hpp"
 #include "MemPool/BucketMgr.hpp"
 #include "MemPool/MgrRegistry.hpp"
-#include "diagnostics/Messages.hpp"
-#include "diagnostics/Text.hpp"
+#include "diagnostics/text/Messages.hpp"
+#include "diagnostics/text/Text.hpp"
 
 using namespace OBR::MemPool;
 using testing::Eq;

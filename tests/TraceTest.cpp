@@ -9,7 +9,7 @@
 
 #include <gtest/gtest.h>
 
-#include "diagnostics/Text.hpp"
+#include "diagnostics/text/Text.hpp"
 
 using namespace OBR::MemPool;
 

@@ -120,8 +120,8 @@ public:
         return reinterpret_cast<const RecHdr*>(RecsBase() + offset);
     }
 
-    // Reports, all read-only and exact to the character; s/diagnostics holds them. `level` indents
-    // by three blanks each. Number counts buckets from 1.
+    // Reports, all read-only and exact to the character; s/diagnostics/reports holds them. `level`
+    // indents by three blanks each. Number counts buckets from 1.
     void DbgBucket(std::ostream& stream, std::uint32_t number, std::uint32_t level,
                    bool showRecords, bool showFreeList) const;
     void DbgAllRecords(std::ostream& stream, std::uint32_t level) const;

@@ -7,8 +7,8 @@
 #include <limits>
 #include <new>
 
-#include "diagnostics/Messages.hpp"
-#include "diagnostics/Trace.hpp"
+#include "diagnostics/text/Messages.hpp"
+#include "diagnostics/text/Trace.hpp"
 
 namespace OBR::MemPool {
 

@@ -111,8 +111,8 @@ public:
     std::uint32_t GetNumBuckets() const;
     const Bucket* GetBucket(std::uint32_t index) const;
 
-    // Reports, all read-only and exact to the character; s/diagnostics holds them. `level` indents
-    // by three blanks each.
+    // Reports, all read-only and exact to the character; s/diagnostics/reports holds them. `level`
+    // indents by three blanks each.
     void DbgReport(std::ostream& stream, std::uint32_t level, bool showBuckets, bool showRecords,
                    bool showFreeList) const;
     void DbgUsedData(std::ostream& stream, std::uint32_t level,

@@ -6,7 +6,7 @@
 
 #include "HostLayer/HostEnv.hpp"
 #include "MemPool/Settings.hpp"
-#include "diagnostics/Messages.hpp"
+#include "diagnostics/text/Messages.hpp"
 
 namespace OBR::MemPool {
 

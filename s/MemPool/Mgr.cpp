@@ -11,7 +11,7 @@
 
 #include "MemPool/BucketMgr.hpp"
 #include "MemPool/MgrRegistry.hpp"
-#include "diagnostics/Messages.hpp"
+#include "diagnostics/text/Messages.hpp"
 
 namespace OBR::MemPool {
 

@@ -6,9 +6,9 @@
 #include <ostream>
 
 #include "MemPool/BucketMgr.hpp"
-#include "diagnostics/Table.hpp"
-#include "diagnostics/Text.hpp"
-#include "diagnostics/Walks.hpp"
+#include "diagnostics/reports/Table.hpp"
+#include "diagnostics/reports/Walks.hpp"
+#include "diagnostics/text/Text.hpp"
 
 namespace OBR::MemPool {
 

@@ -15,8 +15,8 @@
 #include <string>
 
 #include "MemPool/Bucket.hpp"
-#include "diagnostics/Text.hpp"
-#include "diagnostics/Walks.hpp"
+#include "diagnostics/reports/Walks.hpp"
+#include "diagnostics/text/Text.hpp"
 
 namespace OBR::MemPool {
 

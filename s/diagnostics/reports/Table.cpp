@@ -1,6 +1,6 @@
 // How the common parts of the tables are written.
 
-#include "diagnostics/Table.hpp"
+#include "diagnostics/reports/Table.hpp"
 
 #include <iomanip>
 #include <ostream>

@@ -5,7 +5,7 @@
 #include <ostream>
 
 #include "MemPool/Bucket.hpp"
-#include "diagnostics/Text.hpp"
+#include "diagnostics/text/Text.hpp"
 
 namespace OBR::MemPool {
 

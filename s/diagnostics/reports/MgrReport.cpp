@@ -9,9 +9,9 @@
 
 #include "MemPool/BucketMgr.hpp"
 #include "MemPool/MgrRegistry.hpp"
-#include "diagnostics/Table.hpp"
-#include "diagnostics/Text.hpp"
-#include "diagnostics/Walks.hpp"
+#include "diagnostics/reports/Table.hpp"
+#include "diagnostics/reports/Walks.hpp"
+#include "diagnostics/text/Text.hpp"
 
 namespace OBR::MemPool {
 

@@ -1,6 +1,6 @@
 // How the shared texts are written.
 
-#include "diagnostics/Text.hpp"
+#include "diagnostics/text/Text.hpp"
 
 #include <iomanip>
 #include <locale>

@@ -1,7 +1,7 @@
 // The exact texts. A message has a fixed number, which is its name for those who search for it; it
 // is no position in these files.
 
-#include "diagnostics/Messages.hpp"
+#include "diagnostics/text/Messages.hpp"
 
 #include <cstdlib>
 #include <iomanip>

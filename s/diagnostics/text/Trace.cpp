@@ -1,10 +1,10 @@
 // The exact text of each traced event.
 
-#include "diagnostics/Trace.hpp"
+#include "diagnostics/text/Trace.hpp"
 
 #include <iostream>
 
-#include "diagnostics/Text.hpp"
+#include "diagnostics/text/Text.hpp"
 
 namespace OBR::MemPool::Trace {
 

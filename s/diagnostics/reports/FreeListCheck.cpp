@@ -2,9 +2,9 @@
 // passes without a word.
 
 #include "MemPool/Bucket.hpp"
-#include "diagnostics/Messages.hpp"
-#include "diagnostics/Text.hpp"
-#include "diagnostics/Walks.hpp"
+#include "diagnostics/reports/Walks.hpp"
+#include "diagnostics/text/Messages.hpp"
+#include "diagnostics/text/Text.hpp"
 
 namespace OBR::MemPool {
 

@@ -6,10 +6,10 @@
 #include <ostream>
 
 #include "MemPool/Bucket.hpp"
-#include "diagnostics/Messages.hpp"
-#include "diagnostics/Table.hpp"
-#include "diagnostics/Text.hpp"
-#include "diagnostics/Walks.hpp"
+#include "diagnostics/reports/Table.hpp"
+#include "diagnostics/reports/Walks.hpp"
+#include "diagnostics/text/Messages.hpp"
+#include "diagnostics/text/Text.hpp"
 
 namespace OBR::MemPool {
 
