@@ -111,16 +111,16 @@ TEST_F(MgrTest, AHandlePassesEverythingOn) {
     void* const heapRecord = mgr.Alloc(997);
     EXPECT_TRUE(HeapSpy::FailsAt(0, [&] { mgr.Alloc(limit); }));
     EXPECT_EQ(HeapSpy::lastRequest, limit + 24);
-    EXPECT_EQ(CheckLaws(pool).size(), 2u);
+    EXPECT_EQ(CheckInvariants(pool).size(), 2u);
     EXPECT_EQ(mgr.GetSize(record), 8u);
     EXPECT_TRUE(mgr.Contains(record));
     EXPECT_FALSE(mgr.Contains(nullptr));
     EXPECT_FALSE(mgr.CollectGarbage());
     EXPECT_TRUE(mgr.Free(heapRecord));
     EXPECT_FALSE(mgr.Free(nullptr));
-    EXPECT_EQ(CheckLaws(pool).size(), 1u);
+    EXPECT_EQ(CheckInvariants(pool).size(), 1u);
     mgr.Clear();
-    EXPECT_EQ(CheckLaws(pool).size(), 0u);
+    EXPECT_EQ(CheckInvariants(pool).size(), 0u);
 }
 
 // Each request of the heap behind a new handle is refused in turn.

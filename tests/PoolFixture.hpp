@@ -1,6 +1,6 @@
 // What every test of a pool starts from, checks on the way and ends with: settings of its own, the
-// laws of a pool's memory, restated from the outside where they can be, and a heap on which nothing
-// is left behind and every block went back in the form in which it came.
+// invariants of a pool's memory, restated from the outside where they can be, and a heap on which
+// nothing is left behind and every block went back in the form in which it came.
 
 #ifndef OBR_TESTS_POOLFIXTURE_HPP
 #define OBR_TESTS_POOLFIXTURE_HPP
@@ -50,7 +50,7 @@ private:
     }
 
     const std::size_t numLive = NumLive();
-    // The trace sends every request down the slow road. Nobody reads it here.
+    // The trace sends every request down the slow path. Nobody reads it here.
     std::streambuf* const output = std::cout.rdbuf(nullptr);
 };
 
@@ -134,8 +134,8 @@ inline void CheckGroup(const BucketMgr& pool, const Group& group, Blocks& blocks
     EXPECT_EQ(group.numFreeBuckets, withFree.size());
 }
 
-// Checks all laws of `pool` and returns the blocks that live in it.
-inline Blocks CheckLaws(const BucketMgr& pool) {
+// Checks all invariants of `pool` and returns the blocks that live in it.
+inline Blocks CheckInvariants(const BucketMgr& pool) {
     Blocks blocks;
     std::uint32_t numBuckets = 0;
     for (std::uint32_t index = 0; index < pool.numGroups; ++index) {

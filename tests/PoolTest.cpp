@@ -60,7 +60,7 @@ SizeClass ClassOf(std::uint32_t size, const SizeSettings& is) {
 }
 
 void ExpectNone(BucketMgr& pool, void* data) {
-    const Blocks before = CheckLaws(pool);
+    const Blocks before = CheckInvariants(pool);
     for (const bool slow : {true, false}) {
         Settings::trace = slow;
         EXPECT_EQ(pool.FindBucket(data), nullptr);
@@ -68,7 +68,7 @@ void ExpectNone(BucketMgr& pool, void* data) {
         EXPECT_EQ(pool.GetSize(data), 0u);
         EXPECT_FALSE(pool.Free(data));
     }
-    EXPECT_EQ(CheckLaws(pool), before);
+    EXPECT_EQ(CheckInvariants(pool), before);
 }
 
 // Bytes that look like a bucket with one record, at any address: the record's data.
@@ -84,7 +84,7 @@ std::uint8_t* ForgeRecord(std::uint8_t* bucket, const Group* parent, std::uint16
 }  // namespace
 
 // All sizes up to well above the largest record live at once, the smallest or the largest asked for
-// first, on the short road or the slow one.
+// first, on the fast path or the slow one.
 TEST_F(PoolTest, EverySizeIsServedByItsClass) {
     for (const SizeSettings& is : sizeSettings) {
         std::vector<SizeClass> classes;
@@ -118,7 +118,7 @@ TEST_F(PoolTest, EverySizeIsServedByItsClass) {
                 ASSERT_EQ(pool.GetSize(data),
                           expected.isRecord ? recDataSizes[expected.index] : size);
             }
-            EXPECT_EQ(CheckLaws(pool).size(), classes.size());
+            EXPECT_EQ(CheckInvariants(pool).size(), classes.size());
         }
     }
 }
@@ -210,7 +210,7 @@ TEST_F(PoolTest, ADisabledPoolIsTheHeap) {
             EXPECT_EQ(pool.GetSize(data), 0u);
             pool.Clear();
             EXPECT_TRUE(HeapSpy::IsArray(data, size)) << "Clear is not for blocks of the heap.";
-            EXPECT_EQ(CheckLaws(pool), Blocks());
+            EXPECT_EQ(CheckInvariants(pool), Blocks());
             EXPECT_TRUE(pool.Free(data));
             EXPECT_EQ(HeapSpy::lastRelease, data);
             EXPECT_FALSE(pool.Free(nullptr));

@@ -1,6 +1,6 @@
 // A seeded walk through everything that a host can do to a pool, with a heap that refuses at times,
-// beside a simple account of the blocks that live. All laws hold after every step, and no block's
-// bytes are ever touched.
+// beside a simple account of the blocks that live. All invariants hold after every step, and no
+// block's bytes are ever touched.
 
 #include <algorithm>
 #include <cstdint>
@@ -71,7 +71,7 @@ protected:
 
 }  // namespace
 
-TEST_P(RandomWalkTest, KeepsEveryLaw) {
+TEST_P(RandomWalkTest, KeepsEveryInvariant) {
     const WalkSettings& is = GetParam();
     Use(is.bucketSize, is.alignment, is.maximum, is.minimum, is.keepEmptyBuckets);
     BucketMgr pool(nullptr, "pool");
@@ -95,7 +95,7 @@ TEST_P(RandomWalkTest, KeepsEveryLaw) {
         }
         Blocks expected;
         for (const auto& [data, block] : live) { expected[data] = block.usable; }
-        ASSERT_EQ(CheckLaws(pool), expected);
+        ASSERT_EQ(CheckInvariants(pool), expected);
     }
 }
 

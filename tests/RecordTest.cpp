@@ -134,7 +134,7 @@ TEST_F(RecordTest, TheBucketThatGainedRoomLastIsUsedNext) {
 
             EXPECT_TRUE(pool.Free(records[2 * gains[0] + 1]));
             EXPECT_EQ(AllBuckets(group).size(), keep ? 3u : 2u);
-            EXPECT_EQ(CheckLaws(pool).size(), 3u);
+            EXPECT_EQ(CheckInvariants(pool).size(), 3u);
         } while (std::next_permutation(gains.begin(), gains.end()));
     }
 }
@@ -143,12 +143,12 @@ TEST_F(RecordTest, AGroupTakesBackOnlyItsOwn) {
     BucketMgr pool(nullptr, "pool");
     void* const small = pool.Alloc(4);
     void* const large = pool.Alloc(8);
-    const Blocks before = CheckLaws(pool);
+    const Blocks before = CheckInvariants(pool);
     EXPECT_FALSE(pool.groups[0]->Free(large, pool.FindBucket(large)));
     EXPECT_FALSE(pool.groups[0]->Free(nullptr, pool.FindBucket(small)));
-    EXPECT_EQ(CheckLaws(pool), before);
+    EXPECT_EQ(CheckInvariants(pool), before);
     EXPECT_TRUE(pool.groups[0]->Free(small, pool.FindBucket(small)));
-    EXPECT_EQ(CheckLaws(pool).size(), 1u);
+    EXPECT_EQ(CheckInvariants(pool).size(), 1u);
 }
 
 }  // namespace OBR::MemPool

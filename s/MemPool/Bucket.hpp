@@ -21,8 +21,8 @@ class Group;
 // How many there are of each data size.
 using SizeCounts = std::map<std::uint32_t, std::uint32_t>;
 
-// Laws: used + numFree == TotalRecs(), size == 2 + TotalRecs() * recSize, and the free list that
-// starts at freeHead has numFree records.
+// Invariants: used + numFree == TotalRecs(), size == 2 + TotalRecs() * recSize, and the free list
+// that starts at freeHead has numFree records.
 class Bucket {
 public:
     // In the order of memory. The reports read them as they are.
@@ -147,7 +147,8 @@ public:
     void CheckFreeList() const;
 
 private:
-    // freeHead and numFree in one load or store, for the same reason as a record's header.
+    // freeHead and numFree in one load or store: store-to-load forwarding, as for a record's
+    // header.
     std::uint32_t FreeState() const {
         std::uint32_t state;
         std::memcpy(&state, RecsBase() - sizeof freeHead, sizeof state);

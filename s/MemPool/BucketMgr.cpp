@@ -1,4 +1,4 @@
-// The slow roads of a pool: it is built, grows a group, serves what is too large or traced, answers
+// The slow paths of a pool: it is built, grows a group, serves what is too large or traced, answers
 // questions and ends.
 
 #include "MemPool/BucketMgr.hpp"
@@ -31,7 +31,7 @@ BucketMgr::BucketMgr(Mgr* handle, const std::string& poolName)
     RoundRecordSizes();
     numGroups = (maxRecordSize - minRecordSize) / dataAlignment + 1;
     groups = new Group*[numGroups]();
-    PrepareShortRoad();
+    PrepareFastPath();
 }
 
 BucketMgr::~BucketMgr() {
@@ -54,7 +54,7 @@ void BucketMgr::RoundRecordSizes() {
     }
 }
 
-void BucketMgr::PrepareShortRoad() {
+void BucketMgr::PrepareFastPath() {
     const bool isPowerOfTwo = (dataAlignment & (dataAlignment - 1)) == 0;
     const bool fits = minRecordSize <= std::numeric_limits<std::int16_t>::max();
     if (!enabled || !isPowerOfTwo || !fits || maxRecordSize < dataAlignment + recHdrSize) {
@@ -65,7 +65,7 @@ void BucketMgr::PrepareShortRoad() {
     const std::uint32_t headerSteps = 1 + (recHdrSize >> alignmentShift);
     skippedSteps = static_cast<std::int16_t>((minRecordSize >> alignmentShift) - headerSteps);
     const std::uint32_t largest = (maxRecordSize - recHdrSize) >> alignmentShift << alignmentShift;
-    shortMax = static_cast<std::uint16_t>(largest);
+    fastMax = static_cast<std::uint16_t>(largest);
 }
 
 // The place in `groups` of records of `recSize` bytes.
@@ -88,7 +88,7 @@ Group* BucketMgr::GroupFor(std::uint32_t recSize) {
     return groups[index];
 }
 
-OBR_NOINLINE void* BucketMgr::AllocOnSlowRoad(std::uint32_t size) {
+OBR_NOINLINE void* BucketMgr::AllocSlow(std::uint32_t size) {
     if (size > maxAllocSize) { Messages::SizeAboveLimit(size, maxAllocSize); }
     void* data = nullptr;
     if (!enabled) {
@@ -110,7 +110,7 @@ void* BucketMgr::AllocExtRec(std::uint32_t size) {
     return extRec->Data();
 }
 
-OBR_NOINLINE bool BucketMgr::FreeOnSlowRoad(void* data) {
+OBR_NOINLINE bool BucketMgr::FreeSlow(void* data) {
     Trace::BlockFreed(this, data);
     if (!enabled) {
         ::operator delete[](data);

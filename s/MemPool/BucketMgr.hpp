@@ -53,9 +53,9 @@ public:
     bool enabled = true;  // False: every request goes straight to the heap.
 
 private:
-    // The size-class rule for the short road, worked out once, without its division and its cases:
+    // The size-class rule for the fast path, worked out once, without its division and its cases:
     // the index for `size` is (size - 1) >> alignmentShift, less skippedSteps, but at least 0.
-    std::uint16_t shortMax = 0;       // Sizes from 1 to this go that way. 0: none does.
+    std::uint16_t fastMax = 0;        // Sizes from 1 to this go that way. 0: none does.
     std::int16_t skippedSteps = 0;    // Steps of dataAlignment up to index 0. Can be below 0.
     std::uint8_t alignmentShift = 0;  // dataAlignment is 2 to the power of this.
 
@@ -69,19 +69,19 @@ public:
     // Returns a block of at least `size` bytes, never null. Stops the process if `size` is above
     // maxAllocSize.
     void* Alloc(std::uint32_t size) {
-        const std::uint32_t below = size - 1;  // Wraps for 0, which thus takes the slow road.
-        if (OBR_UNLIKELY(below >= shortMax || Settings::trace)) { return AllocOnSlowRoad(size); }
+        const std::uint32_t below = size - 1;  // Wraps for 0, which thus takes the slow path.
+        if (OBR_UNLIKELY(below >= fastMax || Settings::trace)) { return AllocSlow(size); }
         const std::int32_t skipped = skippedSteps;
         const auto step = static_cast<std::int32_t>(below >> alignmentShift);
         Group* const group = groups[static_cast<std::uint32_t>(std::max(step, skipped) - skipped)];
-        if (OBR_UNLIKELY(group == nullptr)) { return AllocOnSlowRoad(size); }
+        if (OBR_UNLIKELY(group == nullptr)) { return AllocSlow(size); }
         return group->Alloc();
     }
 
     // Gives a block back. False for null and, in an enabled pool, for what it does not recognise.
     OBR_READS_FOREIGN bool Free(void* data) {
         if (OBR_UNLIKELY(data == nullptr)) { return false; }
-        if (OBR_UNLIKELY(!enabled || Settings::trace)) { return FreeOnSlowRoad(data); }
+        if (OBR_UNLIKELY(!enabled || Settings::trace)) { return FreeSlow(data); }
         Bucket* const bucket = FindBucket(data);
         if (OBR_UNLIKELY(bucket == nullptr)) { return FreeExtRec(data); }
         assert(groups[IndexOf(bucket->recSize)] == bucket->parent);
@@ -124,13 +124,13 @@ public:
 
 private:
     void RoundRecordSizes();
-    void PrepareShortRoad();
+    void PrepareFastPath();
     std::uint32_t IndexOf(std::uint32_t recSize) const;
     Group* GroupFor(std::uint32_t recSize);
 
-    void* AllocOnSlowRoad(std::uint32_t size);
+    void* AllocSlow(std::uint32_t size);
     void* AllocExtRec(std::uint32_t size);
-    bool FreeOnSlowRoad(void* data);
+    bool FreeSlow(void* data);
     bool FreeExtRec(void* data);
 };
 static_assert(sizeof(BucketMgr) == 88, "A pool has 88 bytes, which the reports show.");

@@ -1,4 +1,4 @@
-// The slow roads of a group: buckets come, go, become full and regain a free record.
+// The slow paths of a group: buckets come, go, become full and regain a free record.
 
 #include "MemPool/Group.hpp"
 

@@ -17,9 +17,9 @@ class BucketMgr;
 // Two lists run through the buckets themselves, and new buckets enter both in front: all buckets
 // (next1, prev1), and those with at least one free record (next2, prev2).
 //
-// Laws: a bucket is on the free-bucket list exactly while its numFree > 0. Records are only taken
-// from the front of that list, so a bucket that becomes full leaves it from the front. The front
-// bucket's prev2 is null. freeBuckets is null exactly while numFreeBuckets is 0.
+// Invariants: a bucket is on the free-bucket list exactly while its numFree > 0. Records are only
+// taken from the front of that list, so a bucket that becomes full leaves it from the front. The
+// front bucket's prev2 is null. freeBuckets is null exactly while numFreeBuckets is 0.
 class Group {
 public:
     BucketMgr* parent;                 // The pool that owns the group.
@@ -60,7 +60,7 @@ public:
     void DestroyBuckets();
 
 private:
-    // These end the short roads above and return what their callers do.
+    // These end the fast paths above and return what their callers do.
     void* AllocFromNewBucket();
     void* UnlinkFull(void* data);
     bool LinkFree(Bucket* bucket);

@@ -1,5 +1,5 @@
 // The exported class: names, and handles that share a pool. All memory work lies in the BucketMgr
-// behind it, whose short roads are inline here.
+// behind it, whose fast paths are inline here.
 
 #include <MemPool>
 

@@ -13,8 +13,8 @@
 
 namespace OBR::MemPool {
 
-// Laws: one entry per living pool, under the pool's own name; a pool's `mgr` is the living handle
-// that made it, or null. The entries own no pool and no handle.
+// Invariants: one entry per living pool, under the pool's own name; a pool's `mgr` is the living
+// handle that made it, or null. The entries own no pool and no handle.
 //
 // A handle of the host's may be destroyed after the library's exit step. The one object of this
 // class is therefore never destroyed: from that step on it is an empty registry.

@@ -53,8 +53,8 @@ constexpr std::uint8_t typeUnknown = 0xFF;  // What reports take for a header th
 
 // A record's header. A record may start at any address, so that its header is copied like bytes,
 // low byte of the link first; a compiler makes one load or store of a copy. All four bytes go at
-// once, for speed: most records are freed or taken soon after they were taken or freed, and a
-// machine hands a stored value straight on only to a load of the same bytes.
+// once, for speed: most records are freed or taken soon after they were taken or freed, and
+// store-to-load forwarding works for a load of the same bytes only.
 struct RecHdr {
     std::uint8_t link[2];  // FREE: offset of the next free record; USED: own offset; EXT: AA BB.
     std::uint8_t type;     // typeFree, typeUsed or typeExt.
