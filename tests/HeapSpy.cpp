@@ -14,6 +14,7 @@ std::array<std::uint8_t, 48> releasedHead = {};
 std::size_t numLive = 0;
 std::size_t numMisfits = 0;
 std::size_t refuseIn = 0;
+bool refusesForGood = false;
 
 namespace {
 
@@ -28,7 +29,10 @@ struct alignas(std::max_align_t) Header {
 
 void* Request(std::size_t size, Form form) {
     lastRequest = size;
-    if (refuseIn != 0 && --refuseIn == 0) { throw std::bad_alloc(); }
+    if (refuseIn != 0 && --refuseIn == 0) {
+        if (refusesForGood) { refuseIn = 1; }
+        throw std::bad_alloc();
+    }
     auto* const header = static_cast<Header*>(std::malloc(sizeof(Header) + size));
     if (header == nullptr) { throw std::bad_alloc(); }
     *header = {size, form};

@@ -23,6 +23,7 @@ extern std::array<std::uint8_t, 48> releasedHead;  // and its first bytes when i
 extern std::size_t numLive;                        // Blocks requested and not yet released.
 extern std::size_t numMisfits;  // Releases in the wrong form, or of what is no living block.
 extern std::size_t refuseIn;    // 1: the next request is refused, and so on; 0: none is.
+extern bool refusesForGood;     // All requests behind that one are refused as well.
 
 // Whether a living block of this size starts here that was requested in array form.
 bool IsArray(const void* start, std::size_t size);

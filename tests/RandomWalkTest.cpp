@@ -43,7 +43,7 @@ protected:
         const std::uint32_t size = sizes[Below(4)];
         void* data = nullptr;
         const bool refuses = Below(8) == 0;
-        Settings::trace = !refuses && Below(4) == 0;  // The trace asks the heap for its own.
+        Settings::trace = Below(4) == 0;
         const std::size_t refusal = refuses ? Below(2) : SIZE_MAX - 1;
         if (HeapSpy::FailsAt(refusal, [&] { data = pool.Alloc(size); })) { return; }
         const Block block{pool.GetSize(data), static_cast<std::uint8_t>(Below(256))};

@@ -25,8 +25,10 @@
 #include <gtest/gtest.h>
 
 #include "Child.hpp"
+#include "HeapSpy.hpp"
 #include "MemPool/BucketMgr.hpp"
 #include "MemPool/MgrRegistry.hpp"
+#include "Output.hpp"
 #include "diagnostics/text/Messages.hpp"
 #include "diagnostics/text/Text.hpp"
 
@@ -36,26 +38,15 @@ using testing::ExitedWithCode;
 
 namespace {
 
-class CountingBuf final : public std::stringbuf {
-public:
-    std::ptrdiff_t numFlushes = 0;
-
-protected:
-    int sync() override {
-        ++numFlushes;
-        return 0;
-    }
-};
-
 // What `print` writes on standard output, where each line must be flushed by itself.
 template <typename Print>
 std::string Printed(Print print) {
-    CountingBuf buf;
-    std::streambuf* const screen = std::cout.rdbuf(&buf);
+    Output output;
+    std::ptrdiff_t numFlushes = 0;
+    output.onFlush = [&] { ++numFlushes; };
     print();
-    std::cout.rdbuf(screen);
-    const std::string text = buf.str();
-    EXPECT_EQ(buf.numFlushes, std::count(text.begin(), text.end(), '\n'));
+    const std::string text = output.Take();
+    EXPECT_EQ(numFlushes, std::count(text.begin(), text.end(), '\n'));
     return text;
 }
 
@@ -107,12 +98,6 @@ void ExpectText(const std::string& name, const std::string& text) {
     std::ifstream file(path);
     EXPECT_EQ(text, std::string(std::istreambuf_iterator<char>(file), {})) << path;
 }
-
-class Grouping final : public std::numpunct<char> {
-    char do_thousands_sep() const override { return '\''; }
-    std::string do_grouping() const override { return "\3"; }
-};
-const std::locale groupingLocale(std::locale::classic(), new Grouping);
 
 class Report : public testing::Test {
 protected:
@@ -358,9 +343,7 @@ TEST_F(Report, TakesTheStreamAsItIsWhereItSetsNothing) {
     };
     std::string text;
     for (const auto& report : reports) {
-        std::cout.imbue(groupingLocale);
-        std::cout << std::left << std::boolalpha << std::hex << std::showbase << std::uppercase
-                  << std::scientific << std::setprecision(9) << std::setfill('#') << std::setw(20);
+        SetStreamState();
         text += Printed(pool, [&] {
             report();
             std::cout << 1234 << std::setw(12) << 1234 << std::setw(16) << 0.5 << std::endl;
@@ -368,6 +351,34 @@ TEST_F(Report, TakesTheStreamAsItIsWhereItSetsNothing) {
         std::cout.copyfmt(std::ios(nullptr));
     }
     ExpectText("stream-state", text);
+}
+
+// Whichever request is refused, be it one of the growing output, the report throws.
+TEST_F(Report, PrintsAllOrThrowsOnAnExhaustedHeap) {
+    Use(50, 40);
+    Mgr pool("exhausted");
+    pool.Alloc(12);
+    const std::string whole = Printed([&] { pool.DbgDetailed(); });
+    std::size_t n = 0;
+    for (bool refused = true; refused; ++n) {
+        Output output;
+        refused = HeapSpy::FailsAt(n, [&] { pool.DbgDetailed(); });
+        EXPECT_EQ(output.Take() == whole, !refused);
+        EXPECT_EQ(std::cout.exceptions(), std::ios::goodbit);
+        std::cout.copyfmt(std::ios(nullptr));
+    }
+}
+
+// A host that has its stream throw hears of all else that fails, and others of nothing.
+TEST_F(Report, TellsOfAFailedWriteWhereTheStreamDoes) {
+    const Mgr pool("failing");
+    Output output;
+    output.onFlush = [] { throw "no device"; };
+    EXPECT_NO_THROW(pool.Dbg());
+    std::cout.clear();
+    std::cout.exceptions(std::ios::badbit);
+    EXPECT_THROW(pool.Dbg(), const char*);
+    std::cout.exceptions(std::ios::goodbit);
 }
 
 const std::string notFree = "ERROR:../s/MemPool: 2640: Invalid free record FREE != ";

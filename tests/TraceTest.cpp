@@ -1,43 +1,22 @@
-// The trace, line by line, and the moment of each line within its event.
+// The trace, line by line, the moment of each line within its event, and that no line needs the
+// heap or a stream that works.
 
 #include <MemPool>
-#include <functional>
 #include <iostream>
 #include <memory>
-#include <sstream>
+#include <new>
+#include <optional>
 #include <string>
 
 #include <gtest/gtest.h>
 
+#include "HeapSpy.hpp"
+#include "Output.hpp"
 #include "diagnostics/text/Text.hpp"
 
 using namespace OBR::MemPool;
 
 namespace {
-
-// Stands in for standard output while it lives. Each flush is a moment to look around at.
-class Output : public std::stringbuf {
-public:
-    Output() : former(std::cout.rdbuf(this)) {}
-    ~Output() override { std::cout.rdbuf(former); }
-
-    // What was written since the last call.
-    std::string Take() {
-        const std::string text = str();
-        str("");
-        return text;
-    }
-
-    std::function<void()> onFlush = [] {};
-
-private:
-    int sync() override {
-        onFlush();
-        return 0;
-    }
-
-    std::streambuf* const former;
-};
 
 std::string Line(const char* event, const BucketMgr* pool) {
     return "xmpt:" + std::string(event) + ":" + BareHex(pool);
@@ -55,7 +34,10 @@ protected:
         NUV_OBR_MEMPOOL_ON(GetParam());
         NUV_OBR_MEMPOOL_TRACE(true);
     }
-    ~Trace() override { NUV_OBR_MEMPOOL_TRACE(false); }
+    ~Trace() override {
+        NUV_OBR_MEMPOOL_TRACE(false);
+        std::cout.copyfmt(std::ios(nullptr));
+    }
 
     Output output;
 };
@@ -63,7 +45,9 @@ protected:
 INSTANTIATE_TEST_SUITE_P(, Trace, testing::Values(true, false),
                          [](const auto& param) { return param.param ? "Enabled" : "Disabled"; });
 
+// Whatever the host has set on the stream, which stays as it is.
 TEST_P(Trace, EachEventWritesItsLine) {
+    SetStreamState();
     auto pool = std::make_unique<Mgr>("traced");
     const BucketMgr* const address = pool->GetBucketMgr();
     EXPECT_EQ(output.Take(), Line("c", address) + "\n");
@@ -89,8 +73,52 @@ TEST_P(Trace, EachEventWritesItsLine) {
     pool->Free(quiet);
     EXPECT_EQ(output.Take(), Freed(*pool, quiet));
 
+    std::cout << 10;
+    EXPECT_EQ(output.Take(), "0XA#################");
+    std::cout.setstate(std::ios::failbit);
+    pool->Free(pool->Alloc(10));
+    std::cout.clear();
+    EXPECT_EQ(output.Take(), "");
+
     pool.reset();
     EXPECT_EQ(output.Take(), Line("d", address) + "\n");
+}
+
+// Wherever the output has to grow while the heap refuses its n-th request, once or for good, each
+// flush fails, and the host wants to hear of all that fails.
+TEST_P(Trace, AnEventIsAWholeLineOrNoneAndDoesItsWork) {
+    for (std::size_t filled = 0; filled <= 512 && !HasFailure(); ++filled) {
+        for (const bool forGood : {false, true}) {
+            const auto expectLine = [&](std::size_t size, std::size_t n, auto event) {
+                Output growing;
+                std::cout << std::string(filled, '.');
+                std::cout.exceptions(std::ios::badbit | std::ios::failbit);
+                growing.onFlush = [] { throw "no device"; };
+                const bool fits = growing.Room() >= size;
+                HeapSpy::refuseIn = n + 1;
+                HeapSpy::refusesForGood = forGood;
+                event();
+                HeapSpy::refuseIn = 0;
+                EXPECT_EQ(growing.Take().size(), filled + (fits ? size : 0)) << filled;
+                std::cout.exceptions(std::ios::goodbit);
+            };
+            std::optional<Mgr> pool;
+            expectLine(24, 1, [&pool] {
+                try {
+                    pool.emplace("traced");
+                } catch (const std::bad_alloc&) {}  // Its own.
+            });
+            if (!pool) { pool.emplace("traced"); }
+            void* const first = pool->Alloc(10);
+            void* data = nullptr;
+            expectLine(44, GetParam() ? 0 : 1, [&] { data = pool->Alloc(10); });
+            EXPECT_EQ(pool->Contains(data), GetParam());
+            expectLine(42, 0, [&] { EXPECT_TRUE(pool->Free(data)); });
+            EXPECT_TRUE(pool->Free(first));
+            expectLine(24, 0, [&] { pool.reset(); });
+            EXPECT_EQ(GetNumMgrs(), 0u);
+        }
+    }
 }
 
 // A pool enters the registry behind its "c:" line and leaves it ahead of its "d:" line. A block is

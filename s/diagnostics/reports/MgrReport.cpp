@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <iomanip>
 #include <iostream>
+#include <new>
 
 #include <MemPool>
 
@@ -127,8 +128,25 @@ void BucketMgr::DbgUsedData(std::ostream& stream, std::uint32_t level,
 
 namespace {
 
+// A failed write stays silent, unless the host has asked its stream to tell. But memory that is
+// exhausted while the stream's buffer grows ends the report as it does elsewhere, by its exception:
+// the stream would swallow it and leave half a number.
 void Print(const BucketMgr& pool, bool detailed) {
-    pool.DbgReport(std::cout, 0, detailed, detailed, detailed);
+    std::ostream& stream = std::cout;
+    const std::ios::iostate told = stream.exceptions();
+    if (!stream.bad()) { stream.exceptions(told | std::ios::badbit); }
+    const auto restore = [&] {
+        if ((told & std::ios::badbit) == 0) { stream.exceptions(told); }
+    };
+    try {
+        pool.DbgReport(stream, 0, detailed, detailed, detailed);
+    } catch (const std::bad_alloc&) {
+        restore();
+        throw;
+    } catch (...) {
+        if ((told & std::ios::badbit) != 0) { throw; }
+    }
+    restore();
 }
 
 void PrintAll(bool detailed) {

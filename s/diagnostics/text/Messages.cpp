@@ -6,23 +6,20 @@
 #include <cstdlib>
 #include <iomanip>
 #include <iostream>
-#include <locale>
-#include <sstream>
 
 #include <MemPool>
 
 #include "MemPool/Settings.hpp"
+#include "diagnostics/text/Text.hpp"
 
 namespace OBR::MemPool {
 
 namespace {
 
-constexpr const char* sourcePath = "../s/MemPool";
-
-// Writes one whole line. The stream's own fill and justification hold for the number's width.
+// One whole line. The stream's own fill and justification hold for the number's width.
 template <typename... Pieces>
 void WriteLine(const char* severity, int number, const Pieces&... pieces) {
-    std::cout << severity << ":" << sourcePath << ":" << std::setw(5) << number << ": ";
+    std::cout << severity << ":../s/MemPool:" << std::setw(5) << number << ": ";
     (std::cout << ... << pieces) << std::endl;
 }
 
@@ -51,22 +48,22 @@ void DuplicateName(const std::string& name) {
 }
 
 void SizeAboveLimit(std::uint32_t size, std::uint32_t limit) {
-    Stop(1711, "Cannot allocate ", size, " bytes, ", "the maximum is ", limit);
+    Stop(1711, "Cannot allocate ", size, " bytes, the maximum is ", limit);
 }
 
 void MaxRecordAboveBucket(std::uint32_t maxRecordSize, std::uint32_t room,
                           std::uint32_t bucketSize) {
-    Stop(1988, "Unexpected condition: ", "the maximum record size is larger than ",
-         "the bucket size (", maxRecordSize, ">", room, ") [", bucketSize, "]");
+    Stop(1988, "Unexpected condition: the maximum record size is larger than the bucket size (",
+         maxRecordSize, ">", room, ") [", bucketSize, "]");
 }
 
 void MinRecordAboveMax(std::uint32_t minRecordSize, std::uint32_t maxRecordSize) {
-    Stop(1996, "Unexpected condition: ", "the min rec size is larger than ", "the max rec size (",
+    Stop(1996, "Unexpected condition: the min rec size is larger than the max rec size (",
          minRecordSize, ">", maxRecordSize, ")");
 }
 
 void InvalidFreeRecord(const char* kind) {
-    Stop(2640, "Invalid free record ", "FREE", " != ", kind);
+    Stop(2640, "Invalid free record FREE != ", kind);
 }
 
 void FreeListTooLong(std::uint32_t walked, std::uint32_t totalRecs) {
@@ -87,10 +84,9 @@ void TooManyFreeRows(std::uint32_t rows, std::uint32_t totalRecs) {
 
 // Truth values are shown as 1 and 0, however the stream would write a bool.
 void Banner() {
-    const std::string rule = "# " + std::string(48, '=');
-    Inform(3259, rule);
+    Inform(3259, "# ================================================");
     Inform(3260, "# NUV_OBR_MEMPOOL_INFO");
-    Inform(3261, rule);
+    Inform(3261, "# ================================================");
     Inform(3262, "# Version            : ", GetVersion());
     Inform(3263, "# Bucket Size        : ", Settings::bucketSize);
     Inform(3264, "# Data Alignment     : ", Settings::dataAlignment);
@@ -101,23 +97,21 @@ void Banner() {
     Inform(3269, "# Use Heap           : ", int{Settings::off});
 }
 
+// The text is made in place, which neither the process's locale nor exhausted memory changes.
 const char* MinRecordNotBelowMax(std::uint32_t minRecordSize, std::uint32_t maxRecordSize) {
-    static std::string text;
-    std::ostringstream line;
-    line.imbue(std::locale::classic());
-    line << "EXCEPTION:" << sourcePath << ":" << 3337 << ": "
-         << "MIN_RECORD_SIZE >= MAX_RECORD_SIZE (" << minRecordSize << ">=" << maxRecordSize << ")";
-    text = line.str();
-    std::cerr << text << std::endl;
-    return text.c_str();
+    static FixedText text;
+    text = FixedText();
+    text.Add("EXCEPTION:../s/MemPool:3337: MIN_RECORD_SIZE >= MAX_RECORD_SIZE (");
+    text.AddNumber(minRecordSize).Add(">=").AddNumber(maxRecordSize).Add(")");
+    std::cerr << text.CString() << std::endl;
+    return text.CString();
 }
 
 }  // namespace Messages
 
 void MYASSERT(const char* text, const char* file, std::int32_t line) {
     std::cout << "MYASSERT:" << file << ":" << std::setw(5) << line << ": " << text << std::endl;
-    std::cout << "\tSet your debug breakpoint in " << sourcePath << " at line " << 100 << "."
-              << std::endl;
+    std::cout << "\tSet your debug breakpoint in ../s/MemPool at line 100." << std::endl;
     std::exit(1);
 }
 

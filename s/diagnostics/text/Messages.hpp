@@ -33,7 +33,8 @@ const char* MinRecordNotBelowMax(std::uint32_t minRecordSize, std::uint32_t maxR
 
 }  // namespace Messages
 
-// Reports a broken assumption of the program and ends the process through std::exit(1).
+// Reports a broken assumption of the program and ends the process through std::exit(1). It has no
+// caller in the library: it stands for the sake of those who search for its text.
 [[noreturn]] void MYASSERT(const char* text, const char* file, std::int32_t line);
 
 }  // namespace OBR::MemPool

@@ -1,11 +1,14 @@
-// The texts that reports, messages and traces share. They take nothing from the stream that they
-// end up on, nor from the process's locale.
+// The texts that messages, traces and reports share: indentation, addresses, and short texts put
+// together in place. They take nothing from the stream that they end up on, nor from the process's
+// locale.
 
 #ifndef OBR_DIAGNOSTICS_TEXT_HPP
 #define OBR_DIAGNOSTICS_TEXT_HPP
 
+#include <cstddef>
 #include <cstdint>
 #include <string>
+#include <string_view>
 
 namespace OBR::MemPool {
 
@@ -20,6 +23,21 @@ std::string BareHex(const void* pointer);
 
 // The name of a record header's `type`: "FREE", "USED", "EXT", or "UNKN" for any other value.
 const char* RecKindName(std::uint8_t type);
+
+// A text of at most 127 characters that asks the heap for nothing. The callers keep to that length.
+class FixedText {
+public:
+    FixedText& Add(std::string_view piece);
+    FixedText& AddNumber(std::uint32_t number);  // In decimal.
+    FixedText& AddBareHex(const void* pointer);
+
+    std::string_view View() const { return {text, length}; }
+    const char* CString() const { return text; }
+
+private:
+    char text[128] = {};
+    std::size_t length = 0;
+};
 
 }  // namespace OBR::MemPool
 

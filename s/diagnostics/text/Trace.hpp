@@ -1,12 +1,14 @@
-// The four lines of the trace, a line an event, on standard output. An event that is not traced
-// costs one test of the setting.
+// The four events of the trace, a line each, on standard output. An event that is not traced costs
+// a call and a test of the setting.
+//
+// A traced event is one whole line or none, and none of them fails or changes what is done: a line
+// takes nothing from the heap, and neither uses nor changes the state of the stream, which may hold
+// what the host has set. Where a line cannot be written it is left out in silence.
 
 #ifndef OBR_DIAGNOSTICS_TRACE_HPP
 #define OBR_DIAGNOSTICS_TRACE_HPP
 
 #include <cstdint>
-
-#include "MemPool/Settings.hpp"
 
 namespace OBR::MemPool {
 
@@ -14,23 +16,10 @@ class BucketMgr;
 
 namespace Trace {
 
-void WriteCreated(const BucketMgr* pool);
-void WriteAllocated(const BucketMgr* pool, const void* data, std::uint32_t size);
-void WriteFreed(const BucketMgr* pool, const void* data);
-void WriteDestroyed(const BucketMgr* pool);
-
-inline void PoolCreated(const BucketMgr* pool) {
-    if (Settings::trace) { WriteCreated(pool); }
-}
-inline void BlockAllocated(const BucketMgr* pool, const void* data, std::uint32_t size) {
-    if (Settings::trace) { WriteAllocated(pool, data, size); }
-}
-inline void BlockFreed(const BucketMgr* pool, const void* data) {
-    if (Settings::trace) { WriteFreed(pool, data); }
-}
-inline void PoolDestroyed(const BucketMgr* pool) {
-    if (Settings::trace) { WriteDestroyed(pool); }
-}
+void PoolCreated(const BucketMgr* pool) noexcept;
+void BlockAllocated(const BucketMgr* pool, const void* data, std::uint32_t size) noexcept;
+void BlockFreed(const BucketMgr* pool, const void* data) noexcept;
+void PoolDestroyed(const BucketMgr* pool) noexcept;
 
 }  // namespace Trace
 
