@@ -15,7 +15,6 @@
 #include <MemPool>
 
 #include <malloc.h>
-#include <zlib.h>
 
 #include <algorithm>
 #include <cstdint>
@@ -26,8 +25,9 @@
 #include <memory_resource>
 #include <numeric>
 #include <random>
+#include <stdexcept>
 #include <string>
-#include <unordered_map>
+#include <utility>
 #include <vector>
 
 #include <benchmark/benchmark.h>
@@ -35,6 +35,9 @@
 #include <boost/pool/pool.hpp>
 #define HAS_BOOST
 #endif
+
+#include "trace/OpenTrace.hpp"
+#include "trace/Resolver.hpp"
 
 namespace {
 
@@ -183,63 +186,44 @@ void BuildAndDrop(benchmark::State& state) {
     SetOperations(state, numBuilt);
 }
 
-struct Event {
-    std::uint32_t block;
-    std::uint32_t size;
-    bool isAlloc;
-};
-
-// The events of a trace with one pool: "xmpt:a:POOL:BLOCK:SIZE" and "xmpt:f:POOL:BLOCK:".
-std::vector<Event> ReadTrace(const std::string& name) {
-    const std::string path = std::string(TRACES) + "/" + name + ".xmpt.gz";
-    const std::unique_ptr<gzFile_s, int (*)(gzFile)> file(gzopen(path.c_str(), "rb"), gzclose);
-    if (file == nullptr) {
-        std::cerr << "PoolBench: cannot read " << path << std::endl;
-        std::exit(1);
+// The blocks that the events of a trace allocate and free, in their order.
+std::vector<Trace::Step> ReadTrace(const std::string& name) {
+    const auto source = Trace::OpenTrace(std::string(TRACES) + "/" + name + ".xmpt.gz");
+    std::vector<Trace::Step> steps;
+    Trace::Resolver resolver;
+    Trace::Event event;
+    Trace::Step step = {};
+    while (source->Next(event)) {
+        if (resolver.Resolve(event, step)) { throw std::runtime_error(name + ": a bad line"); }
+        const bool ofBlock = step.kind == Trace::Kind::Allocated || step.kind == Trace::Kind::Freed;
+        if (ofBlock) { steps.push_back(step); }
     }
-    std::vector<Event> events;
-    std::unordered_map<std::string, Event> live;
-    std::uint32_t numBlocks = 0;
-    char line[256];
-    while (gzgets(file.get(), line, sizeof line) != nullptr) {
-        const std::string text(line);
-        if (text.compare(0, 7, "xmpt:a:") == 0) {
-            const auto size = static_cast<std::uint32_t>(std::stoul(text.substr(41)));
-            const Event event{numBlocks++, size, true};
-            live[text.substr(24, 16)] = event;
-            events.push_back(event);
-        } else if (text.compare(0, 7, "xmpt:f:") == 0) {
-            Event event = live.at(text.substr(24, 16));
-            event.isAlloc = false;
-            events.push_back(event);
-        }
-    }
-    return events;
+    return steps;
 }
 
 template <typename Subject>
 void Replay(benchmark::State& state, const std::string& name) {
     const auto subject = Make<Subject>(0);
-    const std::vector<Event> events = ReadTrace(name);
-    Blocks blocks(events.size());
+    const std::vector<Trace::Step> steps = ReadTrace(name);
+    std::vector<Sized> blocks(steps.size());
     for (auto _ : state) {
-        for (const Event& event : events) {
-            void*& block = blocks[event.block];
-            if (event.isAlloc) {
-                block = AllocAndTouch(*subject, event.size);
+        for (const Trace::Step& step : steps) {
+            Sized& sized = blocks[step.block.index];
+            if (step.kind == Trace::Kind::Allocated) {
+                sized = {AllocAndTouch(*subject, step.block.size), step.block.size};
             } else {
-                subject->Free(block, event.size);
-                block = nullptr;
+                subject->Free(std::exchange(sized.block, nullptr), sized.size);
             }
         }
         state.PauseTiming();
-        for (const Event& event : events) {
-            if (blocks[event.block] != nullptr) { subject->Free(blocks[event.block], event.size); }
-            blocks[event.block] = nullptr;
+        for (Sized& sized : blocks) {
+            if (sized.block != nullptr) {
+                subject->Free(std::exchange(sized.block, nullptr), sized.size);
+            }
         }
         state.ResumeTiming();
     }
-    SetOperations(state, events.size());
+    SetOperations(state, steps.size());
 }
 
 template <typename Subject>

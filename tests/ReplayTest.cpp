@@ -1,4 +1,4 @@
-// mempool-replay as its users run it: traces in files, the report on standard output, all of it
+// `mempool replay` as its users run it: traces in files, the report on standard output, all of it
 // against expected/replay.txt. Times, and what the allocator makes of a request, are no fixed
 // figures: they are held against bounds. OBR_MEMPOOL_APPROVE makes the test write the text anew.
 
@@ -50,7 +50,7 @@ std::string File(const std::string& suffix, const std::string& content, const ch
 std::string Tool(const std::string& arguments, int exitStatus = 0,
                  const Child::Environment& environment = {}) {
     Child::SetEnvironment(environment);
-    const std::string command = "cd " + testing::TempDir() + " && " MEMPOOL_REPLAY " " + arguments;
+    const std::string command = "cd " + testing::TempDir() + " && " MEMPOOL " replay " + arguments;
     std::FILE* const tool = popen((command + " 2>&1").c_str(), "r");
     std::string text;
     for (int c = std::fgetc(tool); c != EOF; c = std::fgetc(tool)) { text += static_cast<char>(c); }

@@ -1,0 +1,24 @@
+// The program `mempool`: a subcommand adds itself to the command line and leaves there what is to
+// be done once that is read.
+
+#ifndef OBR_TOOLS_MEMPOOL_PROGRAM_HPP
+#define OBR_TOOLS_MEMPOOL_PROGRAM_HPP
+
+#include <functional>
+
+#include <CLI/CLI.hpp>
+
+namespace Tool {
+
+struct Program {
+    CLI::App commandLine;
+    std::function<int()> job;  // Of the subcommand that was asked for; returns the exit status.
+};
+
+// One line a subcommand, each in the file of its name; main.cpp calls them in the order of the
+// help.
+void AddReplay(Program& program);
+
+}  // namespace Tool
+
+#endif

@@ -1,0 +1,146 @@
+// mempool replay: replays traces through the pools and through the heap, and compares.
+
+#include <cstdint>
+#include <cstdlib>
+#include <exception>
+#include <iomanip>
+#include <iostream>
+#include <memory>
+#include <new>
+#include <string>
+#include <vector>
+
+#include <MemPool>
+
+#include "mempool/Print.hpp"
+#include "mempool/Program.hpp"
+#include "mempool/Progress.hpp"
+#include "mempool/Settings.hpp"
+#include "replay/Measure.hpp"
+#include "replay/Recording.hpp"
+#include "trace/OpenTrace.hpp"
+
+namespace Tool {
+
+namespace {
+
+constexpr const char* description =
+    "Replay traces of a program through the pools and through the heap, and compare";
+
+constexpr const char* notes =
+    R"(A TRACE is the output of a program that ran with NUV_OBR_MEMPOOL_TRACE=1, plain or compressed by
+gzip. Its lines "xmpt:..." count, all others are passed over.
+
+Settings without an option here come from the variables NUV_OBR_MEMPOOL_... as ever.
+
+pool          One enabled pool a traced pool.
+heap          operator new[] and delete[]. What a pool drops is freed on the heap too, block by
+              block; at a pool's end that time is not counted. No block is written to.
+the peak      The moment with the most bytes asked for.
+bytes held    What operator new has lent at the peak, in sizes of malloc_usable_size, without the
+              allocator's own headers. A replay of its own counts them, untimed; a timed one pays
+              one test of a flag for it at each heap request.
+ns an event   Processor time, page faults included; the median of all rounds.
+bad lines     Left out of the replay. The library's own trace does not show Mgr::Clear: after one,
+              pointers allocated twice are to be expected.
+)";
+
+struct Options {
+    std::vector<std::string> paths;
+    unsigned int rounds = 11;
+    bool dbg = false;
+};
+
+template <typename Value>
+void WriteCells(const char* label, Value pool, Value heap) {
+    std::cout << "   " << std::left << std::setw(24) << label << std::right << std::setw(12) << pool
+              << std::setw(12) << heap;
+}
+
+void WriteSame(const char* label, std::uint64_t value) {
+    WriteCells(label, value, value);
+    std::cout << '\n';
+}
+
+template <typename Value>
+void WriteCompared(const char* label, const Replay::Compared<Value>& figures) {
+    std::cout << std::fixed << std::setprecision(1);
+    WriteCells(label, figures.pool, figures.heap);
+    std::cout << std::setw(12) << std::setprecision(2);
+    if (figures.heap > 0) {
+        std::cout << static_cast<double>(figures.pool) / static_cast<double>(figures.heap) << '\n';
+    } else {
+        std::cout << "-" << '\n';
+    }
+}
+
+void Compare(const std::string& path, const Options& options) {
+    const Progress progress(path);
+    const auto source = Trace::OpenTrace(path);
+    const Replay::Recording recording = Replay::ReadRecording(
+        *source, [&](auto position) { progress.Show("line " + std::to_string(position)); });
+    progress.Clear();
+    if (!source->Problem().empty()) { throw std::runtime_error(path + ": " + source->Problem()); }
+
+    std::cout << path << '\n';
+    PrintBadLines(std::cout, path, recording);
+    const auto held = Replay::BytesHeld(recording, [&] {
+        if (options.dbg) { OBR::MemPool::Dbg(); }
+    });
+
+    WriteCells("", "pool", "heap");
+    std::cout << std::setw(12) << "pool/heap" << '\n';
+    WriteSame("pools", recording.pools.size());
+    WriteSame("events", recording.steps.size());
+    WriteSame("blocks at the peak", recording.peakBlocks);
+    WriteSame("bytes at the peak", recording.peakBytes);
+    WriteSame("blocks cleared", recording.numCleared);
+    WriteSame("blocks never freed", recording.numNeverFreed);
+    WriteCompared("bytes held at the peak", held);
+    std::cout << std::flush;
+    if (recording.steps.empty()) { return; }
+    const auto times = Replay::NanosecondsPerEvent(recording, options.rounds, [&](auto round) {
+        progress.Show("round " + std::to_string(round) + " of " + std::to_string(options.rounds));
+    });
+    progress.Clear();
+    WriteCompared("ns an event", times);
+}
+
+int CompareAll(const Options& options) {
+    OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);
+    OBR::MemPool::NUV_OBR_MEMPOOL_TRACE(false);
+    int status = EXIT_SUCCESS;
+    for (const std::string& path : options.paths) {
+        try {
+            Compare(path, options);
+        } catch (const std::bad_alloc&) {
+            std::cerr << "mempool: " << path << ": out of memory\n";
+            status = EXIT_FAILURE;
+        } catch (const std::exception& error) {
+            std::cerr << "mempool: " << error.what() << '\n';
+            status = EXIT_FAILURE;
+        }
+    }
+    return status;
+}
+
+}  // namespace
+
+void AddReplay(Program& program) {
+    CLI::App& replay = *program.commandLine.add_subcommand("replay", description);
+    replay.footer(notes);
+    const auto options = std::make_shared<Options>();
+    replay.add_option("TRACE", options->paths, "Files to replay, one after the other")
+        ->required()
+        ->type_name("");
+    AddSettings(replay);
+    replay.add_option("--rounds", options->rounds, "Timed replays a side")
+        ->type_name("N")
+        ->check(CLI::Range(1, 1000000))
+        ->capture_default_str();
+    replay.add_flag("--dbg", options->dbg, "Print the report of each pool at the peak");
+    replay.callback(
+        [&program, options] { program.job = [options] { return CompareAll(*options); }; });
+}
+
+}  // namespace Tool

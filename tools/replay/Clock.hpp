@@ -1,0 +1,13 @@
+// The clock of all measurements.
+
+#ifndef OBR_TOOLS_REPLAY_CLOCK_HPP
+#define OBR_TOOLS_REPLAY_CLOCK_HPP
+
+namespace Replay {
+
+// Time that the processor has spent on this program: others on the machine do not count.
+double ProcessorNanoseconds();
+
+}  // namespace Replay
+
+#endif

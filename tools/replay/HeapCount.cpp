@@ -1,0 +1,62 @@
+// The operators new and delete of this program.
+
+#include "replay/HeapCount.hpp"
+
+#include <malloc.h>
+
+#include <algorithm>
+#include <cstddef>
+#include <cstdlib>
+#include <new>
+
+namespace {
+
+bool counting = false;
+std::int64_t heldBytes = 0;
+
+void* Lend(std::size_t size) {
+    void* const block = std::malloc(std::max(size, std::size_t{1}));
+    if (block == nullptr) { throw std::bad_alloc(); }
+    if (counting) { heldBytes += static_cast<std::int64_t>(malloc_usable_size(block)); }
+    return block;
+}
+
+void TakeBack(void* block) noexcept {
+    if (counting) { heldBytes -= static_cast<std::int64_t>(malloc_usable_size(block)); }
+    std::free(block);
+}
+
+}  // namespace
+
+void* operator new(std::size_t size) {
+    return Lend(size);
+}
+void* operator new[](std::size_t size) {
+    return Lend(size);
+}
+void operator delete(void* block) noexcept {
+    TakeBack(block);
+}
+void operator delete[](void* block) noexcept {
+    TakeBack(block);
+}
+void operator delete(void* block, std::size_t) noexcept {
+    TakeBack(block);
+}
+void operator delete[](void* block, std::size_t) noexcept {
+    TakeBack(block);
+}
+
+namespace HeapCount {
+
+void Start() {
+    heldBytes = 0;
+    counting = true;
+}
+
+std::int64_t Stop() {
+    counting = false;
+    return heldBytes;
+}
+
+}  // namespace HeapCount

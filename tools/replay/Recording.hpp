@@ -1,0 +1,51 @@
+// A whole trace in memory, resolved: a replay looks nothing up.
+
+#ifndef OBR_TOOLS_REPLAY_RECORDING_HPP
+#define OBR_TOOLS_REPLAY_RECORDING_HPP
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <string>
+#include <vector>
+
+#include "trace/Event.hpp"
+#include "trace/Resolver.hpp"
+
+namespace Replay {
+
+struct BadLine {
+    std::uint64_t number;
+    Trace::Fault fault;
+};
+
+struct Recording {
+    // All events but names and facts. In place of a block, that of a pool cleared or destroyed has
+    // the range of its blocks in `dropped`: where it begins, and how many they are.
+    std::vector<Trace::Step> steps;
+    std::vector<std::uint32_t> dropped;  // Indices of blocks.
+    std::vector<Trace::Pool> pools;      // Each pool ever created.
+    std::uint32_t numBlocks = 0;         // Their indices are below.
+
+    std::uint64_t numCleared = 0;     // Blocks that were alive when their pool was cleared,
+    std::uint64_t numNeverFreed = 0;  // when it was destroyed, or at the end of the trace.
+
+    // The first moment with the most bytes asked for, and among those with the most blocks.
+    std::size_t peakSteps = 0;  // Steps up to and including it.
+    std::uint64_t peakBytes = 0;
+    std::uint64_t peakBlocks = 0;
+
+    std::array<std::uint64_t, Trace::faultNames.size()> numFaults = {};
+    std::vector<BadLine> badLines;             // The first few.
+    std::map<std::string, std::string> facts;  // What Info events tell.
+};
+
+// Reads to the end. `atEvent` is called with the position now and then.
+Recording ReadRecording(Trace::EventSource& source,
+                        const std::function<void(std::uint64_t position)>& atEvent);
+
+}  // namespace Replay
+
+#endif

@@ -1,0 +1,32 @@
+// The one place that knows which forms of a trace there are.
+
+#include "trace/OpenTrace.hpp"
+
+#include <memory>
+#include <stdexcept>
+#include <system_error>
+#include <utility>
+
+#include "trace/GzSource.hpp"
+#include "trace/TextReader.hpp"
+
+namespace Trace {
+
+std::unique_ptr<EventSource> MakeReader(Input input) {
+    // A form that is not text is told from it here, by what input.Ahead() begins with.
+    return std::make_unique<TextReader>(std::move(input));
+}
+
+std::unique_ptr<EventSource> OpenTrace(const std::string& path) {
+    try {
+        Input input(std::make_unique<GzSource>(path));
+        const bool isEmpty = !input.ReadMore();
+        const std::string problem = input.Problem();
+        if (isEmpty && !problem.empty()) { throw std::runtime_error(path + ": " + problem); }
+        return MakeReader(std::move(input));
+    } catch (const std::system_error& error) {
+        throw std::runtime_error(path + ": " + error.code().message());
+    }
+}
+
+}  // namespace Trace

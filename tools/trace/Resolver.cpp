@@ -1,0 +1,105 @@
+// Which pools and blocks live, by their addresses.
+
+#include "trace/Resolver.hpp"
+
+#include <algorithm>
+#include <iomanip>
+#include <sstream>
+
+#include "trace/LineForms.hpp"
+
+namespace Trace {
+
+namespace {
+
+constexpr std::uint64_t maxBlockSize = 0x3FFFFFFF;  // The largest that a pool takes.
+
+std::string AddressText(std::uint64_t address) {
+    std::ostringstream text;
+    text << std::hex << std::setw(addressDigits) << std::setfill('0') << address;
+    return text.str();
+}
+
+}  // namespace
+
+std::optional<Fault> Resolver::Resolve(const Event& event, Step& step) {
+    step = {event.kind, 0, {}};
+    if (event.kind == Kind::Malformed) { return Fault::Malformed; }
+    if (event.kind == Kind::Info) { return std::nullopt; }
+    if (event.kind == Kind::Created) { return Create(event.pool, step); }
+
+    const auto found = livePools.find(event.pool);
+    if (found == livePools.end()) { return Fault::UnknownPool; }
+    LivePool& pool = found->second;
+    step.pool = pool.index;
+    switch (event.kind) {
+        case Kind::Allocated:
+            return Allocate(pool, event, step);
+        case Kind::Freed:
+            return Free(pool, event.block, step);
+        case Kind::Cleared:
+            DropAll(pool);
+            break;
+        case Kind::Destroyed:
+            DropAll(pool);
+            livePools.erase(found);
+            break;
+        case Kind::Named:
+            pools[pool.index].name = event.text;
+            break;
+        default:
+            break;
+    }
+    return std::nullopt;
+}
+
+bool Resolver::EndPool() {
+    if (livePools.empty()) { return false; }
+    DropAll(livePools.begin()->second);
+    livePools.erase(livePools.begin());
+    return true;
+}
+
+std::optional<Fault> Resolver::Create(std::uint64_t address, Step& step) {
+    step.pool = static_cast<std::uint32_t>(pools.size());
+    if (!livePools.try_emplace(address, LivePool{step.pool, {}}).second) {
+        return Fault::PoolTwice;
+    }
+    pools.push_back({AddressText(address), {}});
+    return std::nullopt;
+}
+
+std::optional<Fault> Resolver::Allocate(LivePool& pool, const Event& event, Step& step) {
+    if (event.size > maxBlockSize) { return Fault::TooLarge; }
+    const auto [place, isNew] = pool.blocks.try_emplace(event.block);
+    if (!isNew) { return Fault::BlockTwice; }
+    std::uint32_t index = 0;
+    if (freeIndices.empty()) {
+        index = numBlocks++;
+    } else {
+        index = freeIndices.back();
+        freeIndices.pop_back();
+    }
+    step.block = place->second = {index, static_cast<std::uint32_t>(event.size)};
+    return std::nullopt;
+}
+
+std::optional<Fault> Resolver::Free(LivePool& pool, std::uint64_t address, Step& step) {
+    const auto place = pool.blocks.find(address);
+    if (place == pool.blocks.end()) { return Fault::NotAllocated; }
+    step.block = place->second;
+    freeIndices.push_back(step.block.index);
+    pool.blocks.erase(place);
+    return std::nullopt;
+}
+
+void Resolver::DropAll(LivePool& pool) {
+    dropped.clear();
+    for (const auto& [address, block] : pool.blocks) { dropped.push_back(block); }
+    std::sort(dropped.begin(), dropped.end(),
+              [](const Block& a, const Block& b) { return a.index < b.index; });
+    for (const Block& block : dropped) { freeIndices.push_back(block.index); }
+    pool.blocks.clear();
+}
+
+}  // namespace Trace

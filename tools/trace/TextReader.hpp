@@ -1,0 +1,35 @@
+// Reads a trace of lines. A program writes them among other output: a line without the mark is
+// passed over, and so is what stands in front of the mark.
+
+#ifndef OBR_TOOLS_TRACE_TEXTREADER_HPP
+#define OBR_TOOLS_TRACE_TEXTREADER_HPP
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+#include <utility>
+
+#include "trace/Event.hpp"
+#include "trace/Input.hpp"
+
+namespace Trace {
+
+class TextReader final : public EventSource {
+public:
+    explicit TextReader(Input bytes) : input(std::move(bytes)) {}
+
+    bool Next(Event& event) override;
+    std::uint64_t Position() const override { return number; }
+    std::string Problem() const override { return input.Problem(); }
+
+private:
+    bool NextLine(std::string_view& line);
+
+    Input input;
+    std::size_t lineSize = 0;  // Bytes of the last line, its end included, which are still ahead.
+    std::uint64_t number = 0;  // Of the last line.
+};
+
+}  // namespace Trace
+
+#endif
