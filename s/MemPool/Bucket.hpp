@@ -1,5 +1,7 @@
 // One bucket: a heap block of a header and equal records, with a free list of offsets. Record.hpp
 // draws it. A Group (Group.hpp) decides when buckets come and go and links them into its lists.
+//
+// Words: a bucket is empty when no record is in use, and full when none is free.
 
 #ifndef OBR_MEMPOOL_BUCKET_HPP
 #define OBR_MEMPOOL_BUCKET_HPP
@@ -29,12 +31,14 @@ public:
     Group* parent;           // The group that owns the bucket; null once it is destroyed.
     Bucket* next1;           // Next in the group's list of all buckets, null at the end.
     Bucket* prev1;           // Previous one, null at the front.
-    Bucket* next2;           // The same in its list of buckets with a free record. Both mean
-    Bucket* prev2;           // nothing while the bucket is full and thus not on that list.
+    Bucket* next2;           // Next in its list of buckets with a free record. Stale while full.
+    Bucket* prev2;           // Previous one, null at the front, and while full: see Group.
     std::uint16_t size;      // Bytes of the records and of numFree; 0 once it is destroyed.
     std::uint16_t recSize;   // Bytes of a record, its header included.
     std::uint16_t freeHead;  // Offset of the first free record, 0 when none is.
     std::uint16_t numFree;   // Free records. recsBase is the address of this field.
+
+    static constexpr std::uint32_t baseDistance = 46;  // From the bucket's address to recsBase.
 
     Bucket() = delete;
 
@@ -60,6 +64,20 @@ public:
     }
     bool IsFull() const { return numFree == 0; }
 
+    // Addresses and offsets of records.
+    char* RecsBase() { return reinterpret_cast<char*>(this) + baseDistance; }
+    const char* RecsBase() const { return reinterpret_cast<const char*>(this) + baseDistance; }
+    const char* RecsEnd() const { return RecsBase() + size; }
+    RecHdr* RecordAt(std::uint32_t offset) {
+        return reinterpret_cast<RecHdr*>(RecsBase() + offset);
+    }
+    const RecHdr* RecordAt(std::uint32_t offset) const {
+        return reinterpret_cast<const RecHdr*>(RecsBase() + offset);
+    }
+    std::uint16_t OffsetOf(const RecHdr* record) const {
+        return static_cast<std::uint16_t>(reinterpret_cast<const char*>(record) - RecsBase());
+    }
+
     // Takes the first free record; there must be one. Returns its data.
     void* TakeRecord() {
         const std::uint32_t state = FreeState();
@@ -84,20 +102,11 @@ public:
         SetFreeState(((state + oneFree) & numFreeMask) | RecHdr::LinkOf(hdr));
     }
 
-    // Whether a record's header is USED with a link that can be an offset. One comparison for both.
-    static bool IsUsed(std::uint32_t hdr) {
-        const std::uint32_t unguarded = hdr & 0x00FFFFFF;
-        return unguarded >= RecHdr::Marked(0, typeUsed, firstOffset) &&
-               unguarded <= RecHdr::Marked(0, typeUsed, 0xFFFF);
-    }
-
-    // The bucket that a record's own link leads to.
+    // The bucket that the link of a used record leads to. Of a foreign pointer's bytes it is any
+    // address.
     static Bucket* Holding(void* data, std::uint16_t offset) {
         return reinterpret_cast<Bucket*>(static_cast<char*>(data) - sizeof(RecHdr) - offset -
                                          baseDistance);
-    }
-    static const Bucket* Holding(const void* data, std::uint16_t offset) {
-        return Holding(const_cast<void*>(data), offset);
     }
 
     // The owner that the bytes of this header name, or null if they are no bucket's. They may be
@@ -105,19 +114,10 @@ public:
     OBR_READS_FOREIGN const Group* Owner() const {
         const Group* group;
         std::memcpy(&group, &parent, sizeof group);
+        if (group == nullptr) { return nullptr; }
         std::uint16_t extent;
         std::memcpy(&extent, &size, sizeof extent);
         return extent == 0 ? nullptr : group;
-    }
-
-    char* RecsBase() { return reinterpret_cast<char*>(this) + baseDistance; }
-    const char* RecsBase() const { return reinterpret_cast<const char*>(this) + baseDistance; }
-    const char* RecsEnd() const { return RecsBase() + size; }
-    RecHdr* RecordAt(std::uint32_t offset) {
-        return reinterpret_cast<RecHdr*>(RecsBase() + offset);
-    }
-    const RecHdr* RecordAt(std::uint32_t offset) const {
-        return reinterpret_cast<const RecHdr*>(RecsBase() + offset);
     }
 
     // Reports, all read-only and exact to the character; s/diagnostics/reports holds them. `level`
@@ -159,37 +159,13 @@ private:
     }
     static constexpr std::uint32_t oneFree = 0x10000;
     static constexpr std::uint32_t numFreeMask = 0xFFFF0000;
-
-public:
-    // For reports of a bucket that may be damaged. They read no byte beyond it: a header that it
-    // does not hold, the guard aside, has an unknown type and no link. A record is where the way
-    // from record to record comes by and finds a header, be it in a piece of a record at the end.
-    bool HasHeaderAt(std::uint32_t offset) const {
-        return offset + offsetof(RecHdr, guard) <= size;
-    }
-    bool HasRecordAt(std::uint32_t offset) const {
-        return offset >= firstOffset && recSize != 0 && (offset - firstOffset) % recSize == 0 &&
-               HasHeaderAt(offset);
-    }
-    std::uint8_t TypeAt(std::uint32_t offset) const {
-        return HasHeaderAt(offset) ? RecordAt(offset)->type : typeUnknown;
-    }
-    std::uint16_t LinkAt(std::uint32_t offset) const {
-        return HasHeaderAt(offset) ? RecordAt(offset)->Link() : std::uint16_t{0};
-    }
-    std::uint16_t OffsetOf(const RecHdr* record) const {
-        return static_cast<std::uint16_t>(reinterpret_cast<const char*>(record) - RecsBase());
-    }
-
-    static constexpr std::uint16_t firstOffset = 2;    // Offset of the first record.
-    static constexpr std::uint32_t baseDistance = 46;  // From the bucket's address to recsBase.
 };
 static_assert(sizeof(Bucket) == 48, "The first record starts 48 bytes behind the bucket's start.");
 static_assert(offsetof(Bucket, size) == 40 && offsetof(Bucket, recSize) == 42 &&
                   offsetof(Bucket, freeHead) == 44,
               "The four counts follow the five links.");
 static_assert(offsetof(Bucket, numFree) == Bucket::baseDistance &&
-                  Bucket::baseDistance + Bucket::firstOffset == sizeof(Bucket),
+                  Bucket::baseDistance + firstOffset == sizeof(Bucket),
               "Offsets count from numFree, so that 0 is never a record.");
 
 }  // namespace OBR::MemPool

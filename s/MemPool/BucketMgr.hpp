@@ -96,7 +96,7 @@ public:
     OBR_READS_FOREIGN Bucket* FindBucket(void* data) const {
         if (data == nullptr) { return nullptr; }
         const std::uint32_t hdr = RecHdr::Of(data)->Word();
-        if (!Bucket::IsUsed(hdr)) { return nullptr; }
+        if (!RecHdr::IsUsed(hdr)) { return nullptr; }
         Bucket* const bucket = Bucket::Holding(data, RecHdr::LinkOf(hdr));
         const Group* const owner = bucket->Owner();
         if (owner == nullptr || owner->parent != this) { return nullptr; }

@@ -45,6 +45,9 @@ inline void KeepStores(const void* block) {
     __asm__ volatile("" : : "r"(block) : "memory");
 }
 
+// The offset of a bucket's first record.
+constexpr std::uint16_t firstOffset = 2;
+
 // Written as plain bytes: a header can hold any other value where memory was damaged.
 constexpr std::uint8_t typeFree = 0;
 constexpr std::uint8_t typeUsed = 1;
@@ -71,6 +74,13 @@ struct RecHdr {
     static constexpr std::uint32_t Marked(std::uint32_t word, std::uint8_t type,
                                           std::uint16_t link) {
         return (word & 0xFF000000) + ((std::uint32_t{type} << 16) + link);
+    }
+
+    // Whether a word says USED, with a link that can be an offset. One comparison for both.
+    static bool IsUsed(std::uint32_t word) {
+        const std::uint32_t unguarded = word & 0x00FFFFFF;
+        return unguarded >= Marked(0, typeUsed, firstOffset) &&
+               unguarded <= Marked(0, typeUsed, 0xFFFF);
     }
 
     // The link alone, for those who have no use for the rest.

@@ -2,6 +2,7 @@
 // passes without a word.
 
 #include "MemPool/Bucket.hpp"
+#include "diagnostics/reports/RecordHeaders.hpp"
 #include "diagnostics/reports/Walks.hpp"
 #include "diagnostics/text/Messages.hpp"
 #include "diagnostics/text/Text.hpp"
@@ -12,7 +13,7 @@ void Bucket::CheckFreeList() const {
     const auto totalRecs = static_cast<std::uint32_t>(TotalRecs());
     std::uint32_t walked = 0;
     for (FreeListWalk walk(*this); !walk.IsAtEnd(); walk.Next()) {
-        const std::uint8_t type = walk.IsOnRecord() ? TypeAt(walk.Offset()) : typeUnknown;
+        const std::uint8_t type = walk.IsOnRecord() ? TypeAt(*this, walk.Offset()) : typeUnknown;
         if (type != typeFree) { Messages::InvalidFreeRecord(RecKindName(type)); }
         if (walked >= totalRecs) { Messages::FreeListTooLong(walked + 1, totalRecs); }
         ++walked;

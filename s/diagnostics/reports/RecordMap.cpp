@@ -15,6 +15,7 @@
 #include <string>
 
 #include "MemPool/Bucket.hpp"
+#include "diagnostics/reports/RecordHeaders.hpp"
 #include "diagnostics/reports/Walks.hpp"
 #include "diagnostics/text/Text.hpp"
 
@@ -92,7 +93,7 @@ void Bucket::DbgMapKinds(std::ostream& stream, std::uint16_t n, std::uint16_t fi
                          const Records& records) const {
     WriteBoxes(stream, n, first, [&](std::uint32_t index) {
         const std::uint16_t offset = OffsetOf(records[index]);
-        std::string kind = RecKindName(TypeAt(offset));
+        std::string kind = RecKindName(TypeAt(*this, offset));
         if (offset == freeHead) { kind += " +"; }
         WriteLeft(stream, 8, kind);
     });
@@ -119,10 +120,10 @@ void Bucket::DbgMapValues(std::ostream& stream, std::uint16_t n, std::uint16_t f
                           const Records& records) const {
     WriteBoxes(stream, n, first, [&](std::uint32_t index) {
         const std::uint16_t offset = OffsetOf(records[index]);
-        switch (TypeAt(offset)) {
+        switch (TypeAt(*this, offset)) {
             case typeFree:
                 stream << "n=";
-                WriteLeft(stream, 6, LinkAt(offset));
+                WriteLeft(stream, 6, LinkAt(*this, offset));
                 break;
             case typeUsed:
                 stream << "d=";

@@ -6,6 +6,7 @@
 #include <ostream>
 
 #include "MemPool/Bucket.hpp"
+#include "diagnostics/reports/RecordHeaders.hpp"
 #include "diagnostics/reports/Table.hpp"
 #include "diagnostics/reports/Walks.hpp"
 #include "diagnostics/text/Messages.hpp"
@@ -27,7 +28,7 @@ void Bucket::DbgAllRecords(std::ostream& stream, std::uint32_t level) const {
     const auto totalRecs = static_cast<std::uint32_t>(TotalRecs());
     std::uint32_t rows = 0;
     ForEachRecord(*this, [&](std::uint32_t offset) {
-        const std::uint8_t type = TypeAt(offset);
+        const std::uint8_t type = TypeAt(*this, offset);
         stream << indent;
         WriteId(stream, ++rows, '0');
         stream << std::setw(4) << RecKindName(type) << " ";
@@ -43,7 +44,7 @@ void Bucket::DbgAllRecords(std::ostream& stream, std::uint32_t level) const {
 
 void Bucket::AddUsedRecords(SizeCounts& counts) const {
     ForEachRecord(*this, [&](std::uint32_t offset) {
-        if (TypeAt(offset) == typeUsed) { ++counts[DataSize()]; }
+        if (TypeAt(*this, offset) == typeUsed) { ++counts[DataSize()]; }
     });
 }
 

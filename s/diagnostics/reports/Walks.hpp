@@ -8,6 +8,7 @@
 
 #include "MemPool/Bucket.hpp"
 #include "MemPool/BucketMgr.hpp"
+#include "diagnostics/reports/RecordHeaders.hpp"
 
 namespace OBR::MemPool {
 
@@ -31,7 +32,7 @@ void ForEachBucket(const Group& group, Visit visit) {
 // one record, so that the first is not asked for.
 template <typename Visit>
 void ForEachRecord(const Bucket& bucket, Visit visit) {
-    std::uint32_t offset = Bucket::firstOffset;
+    std::uint32_t offset = firstOffset;
     do {
         visit(offset);
         offset += bucket.recSize;
@@ -49,9 +50,9 @@ public:
     explicit FreeListWalk(const Bucket& walked) : bucket(walked), offset(walked.freeHead) {}
 
     bool IsAtEnd() const { return offset == 0; }
-    bool IsOnRecord() const { return bucket.HasRecordAt(offset); }
+    bool IsOnRecord() const { return HasRecordAt(bucket, offset); }
     std::uint16_t Offset() const { return offset; }
-    std::uint16_t Link() const { return bucket.LinkAt(offset); }
+    std::uint16_t Link() const { return LinkAt(bucket, offset); }
     void Next() { offset = Link(); }
 
 private:
