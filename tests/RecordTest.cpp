@@ -51,7 +51,7 @@ TEST_F(RecordTest, EveryByteOfABucketIsAsDrawn) {
     for (const auto& row : rows) {
         SCOPED_TRACE(testing::Message() << row.bucketSize << " of " << row.dataSize);
         const std::uint32_t recSize = row.dataSize + 4;
-        Group group(nullptr, static_cast<std::uint16_t>(row.dataSize));
+        Group group(nullptr, row.dataSize, row.bucketSize, false);
         Bucket* const bucket = Bucket::Create(&group, row.bucketSize, row.dataSize);
         EXPECT_TRUE(HeapSpy::IsArray(bucket, row.size + 46));
         EXPECT_EQ(bucket->parent, &group);
@@ -72,15 +72,15 @@ TEST_F(RecordTest, EveryByteOfABucketIsAsDrawn) {
 
         std::vector<std::uint32_t> offsets;
         for (std::uint32_t offset = 2; offset < row.size; offset += recSize) {
-            EXPECT_EQ(bucket->IsEmpty(), offset == 2);
-            EXPECT_FALSE(bucket->IsFull());
+            EXPECT_EQ(bucket->numFree == bucket->TotalRecs(), offset == 2);
+            EXPECT_NE(bucket->numFree, 0);
             EXPECT_EQ(bucket->TakeRecord(), reinterpret_cast<char*>(bucket) + 50 + offset);
             Expect(expected, offset, 1, offset);
             offsets.push_back(offset);
         }
         EXPECT_TRUE(RecordsOf(bucket) == expected) << "taken";
         EXPECT_EQ(bucket->freeHead, 0);
-        EXPECT_TRUE(bucket->IsFull());
+        EXPECT_EQ(bucket->numFree, 0);
 
         std::shuffle(offsets.begin(), offsets.end(), random);
         std::uint32_t last = 0;
@@ -94,7 +94,7 @@ TEST_F(RecordTest, EveryByteOfABucketIsAsDrawn) {
             EXPECT_EQ(bucket->freeHead, offset);
         }
         EXPECT_TRUE(RecordsOf(bucket) == expected) << "given back";
-        EXPECT_TRUE(bucket->IsEmpty());
+        EXPECT_EQ(bucket->numFree, bucket->TotalRecs());
 
         std::array<std::uint8_t, 48> head = {};
         std::memcpy(&head[44], &bucket->freeHead, 4);

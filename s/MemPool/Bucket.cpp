@@ -1,4 +1,5 @@
-// How a bucket is made and how it ends.
+// The two ends of a bucket, the steps that the heap has a part in: it is made, with a header
+// written for each of its records, and it is destroyed.
 
 #include "MemPool/Bucket.hpp"
 
@@ -8,7 +9,7 @@ namespace OBR::MemPool {
 
 Bucket* Bucket::Create(Group* parent, std::uint32_t bucketSize, std::uint32_t recDataSize) {
     const std::uint32_t recSize = recDataSize + sizeof(RecHdr);
-    const std::uint32_t totalRecs = (bucketSize - firstOffset) / recSize;
+    const std::uint32_t totalRecs = RecsWithin(bucketSize, recSize);
     const std::uint32_t size = firstOffset + totalRecs * recSize;
 
     auto* const bucket = static_cast<Bucket*>(::operator new[](baseDistance + size));

@@ -42,6 +42,11 @@ public:
 
     Bucket() = delete;
 
+    // The records that a bucket of at most `bucketSize` bytes of offsets has.
+    static std::uint32_t RecsWithin(std::uint32_t bucketSize, std::uint32_t recSize) {
+        return (bucketSize - firstOffset) / recSize;
+    }
+
     // Makes a bucket of at most `bucketSize` (and 65535) bytes of offsets, all records FREE in the
     // order of their addresses, on no list. `bucketSize` must leave room for one record.
     static Bucket* Create(Group* parent, std::uint32_t bucketSize, std::uint32_t recDataSize);
@@ -57,12 +62,6 @@ public:
         return (std::int32_t{size} - std::int32_t{firstOffset}) / std::int32_t{recSize};
     }
     std::uint32_t DataSize() const { return recSize - std::uint32_t{sizeof(RecHdr)}; }
-    // The same question as numFree == TotalRecs(), without its division, in the 16 bits of `size`.
-    bool IsEmpty() const {
-        const std::uint32_t freeExtent = std::uint32_t{numFree} * recSize + firstOffset;
-        return static_cast<std::uint16_t>(freeExtent) == size;
-    }
-    bool IsFull() const { return numFree == 0; }
 
     // Addresses and offsets of records.
     char* RecsBase() { return reinterpret_cast<char*>(this) + baseDistance; }

@@ -54,6 +54,10 @@ void BucketMgr::RoundRecordSizes() {
     }
 }
 
+// With a dataAlignment of 2^k, a size from 1 on has d = (s + 1) * 2^k data bytes, where its step s
+// is (size - 1) >> k, and minRecordSize is m * 2^k. So the rule's (d + 4 - minRecordSize) / 2^k is
+// s + 1 + (4 >> k) - m, that is s less the skipped steps m - 1 - (4 >> k). It is below 0 just where
+// d + 4 is below minRecordSize, and there the rule gives 0.
 void BucketMgr::PrepareFastPath() {
     const bool isPowerOfTwo = (dataAlignment & (dataAlignment - 1)) == 0;
     const bool fits = minRecordSize <= std::numeric_limits<std::int16_t>::max();
@@ -62,8 +66,8 @@ void BucketMgr::PrepareFastPath() {
     }
 
     while (std::uint32_t{1} << alignmentShift < dataAlignment) { ++alignmentShift; }
-    const std::uint32_t headerSteps = 1 + (recHdrSize >> alignmentShift);
-    skippedSteps = static_cast<std::int16_t>((minRecordSize >> alignmentShift) - headerSteps);
+    const std::uint32_t minSteps = minRecordSize >> alignmentShift;
+    skippedSteps = static_cast<std::int16_t>(minSteps - 1 - (recHdrSize >> alignmentShift));
     const std::uint32_t largest = (maxRecordSize - recHdrSize) >> alignmentShift << alignmentShift;
     fastMax = static_cast<std::uint16_t>(largest);
 }
@@ -83,7 +87,7 @@ Group* BucketMgr::GroupFor(std::uint32_t recSize) {
                dataSize + dataAlignment + recHdrSize <= maxRecordSize) {
             dataSize += dataAlignment;
         }
-        groups[index] = new Group(this, static_cast<std::uint16_t>(dataSize));
+        groups[index] = new Group(this, dataSize, bucketSize, keepEmptyBuckets);
     }
     return groups[index];
 }

@@ -55,6 +55,7 @@ public:
 private:
     // The size-class rule for the fast path, worked out once, without its division and its cases:
     // the index for `size` is (size - 1) >> alignmentShift, less skippedSteps, but at least 0.
+    // PrepareFastPath derives it.
     std::uint16_t fastMax = 0;        // Sizes from 1 to this go that way. 0: none does.
     std::int16_t skippedSteps = 0;    // Steps of dataAlignment up to index 0. Can be below 0.
     std::uint8_t alignmentShift = 0;  // dataAlignment is 2 to the power of this.
@@ -73,7 +74,9 @@ public:
         if (OBR_UNLIKELY(below >= fastMax || Settings::trace)) { return AllocSlow(size); }
         const std::int32_t skipped = skippedSteps;
         const auto step = static_cast<std::int32_t>(below >> alignmentShift);
-        Group* const group = groups[static_cast<std::uint32_t>(std::max(step, skipped) - skipped)];
+        const auto index = static_cast<std::uint32_t>(std::max(step, skipped) - skipped);
+        assert(index == IndexOf(RoundUp(size, dataAlignment) + std::uint32_t{sizeof(RecHdr)}));
+        Group* const group = groups[index];
         if (OBR_UNLIKELY(group == nullptr)) { return AllocSlow(size); }
         return group->Alloc();
     }
@@ -108,6 +111,7 @@ public:
     std::uint32_t GetSize(const void* data) const;
 
     // Buckets, counted from 0 in the order of the groups' indices and of each group's list.
+    // GetBucket is part of the interface: nothing in the library calls it.
     std::uint32_t GetNumBuckets() const;
     const Bucket* GetBucket(std::uint32_t index) const;
 

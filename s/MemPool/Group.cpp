@@ -2,12 +2,10 @@
 
 #include "MemPool/Group.hpp"
 
-#include "MemPool/BucketMgr.hpp"
-
 namespace OBR::MemPool {
 
 OBR_NOINLINE void* Group::AllocFromNewBucket() {
-    Bucket* const bucket = Bucket::Create(this, parent->bucketSize, recDataSize);
+    Bucket* const bucket = Bucket::Create(this, bucketSize, recDataSize);
 
     ++numBuckets;
     bucket->next1 = head;
@@ -30,8 +28,8 @@ OBR_NOINLINE void* Group::UnlinkFull(void* data) {
     return data;
 }
 
-// A bucket with a free record enters in front. Its prev2 is null already: since it left the front,
-// or since it was made.
+// A bucket with a free record enters in front. Its prev2 is null already: a bucket that becomes
+// full leaves from the front, and a new one has no links.
 OBR_NOINLINE bool Group::LinkFree(Bucket* bucket) {
     ++numFreeBuckets;
     bucket->next2 = freeBuckets;
@@ -40,16 +38,11 @@ OBR_NOINLINE bool Group::LinkFree(Bucket* bucket) {
     return true;
 }
 
-// A bucket's last used record has come back.
-OBR_NOINLINE bool Group::FreeLastUsed(Bucket* bucket, bool wasFull) {
-    if (parent->keepEmptyBuckets) { return wasFull ? LinkFree(bucket) : true; }
-    Release(bucket, wasFull);
-    return true;
-}
+// A bucket's last used record has come back. If it is the only one, the bucket was full.
+OBR_NOINLINE bool Group::FreeLastUsed(Bucket* bucket) {
+    const bool wasFull = totalRecs == 1;
+    if (keepEmptyBuckets) { return wasFull ? LinkFree(bucket) : true; }
 
-// Takes an empty bucket out of its lists and ends it. One that was full a moment ago has not
-// returned to the free-bucket list.
-void Group::Release(Bucket* bucket, bool wasFull) {
     --numBuckets;
     (bucket->prev1 != nullptr ? bucket->prev1->next1 : head) = bucket->next1;
     (bucket->next1 != nullptr ? bucket->next1->prev1 : tail) = bucket->prev1;
@@ -60,6 +53,7 @@ void Group::Release(Bucket* bucket, bool wasFull) {
         if (bucket->next2 != nullptr) { bucket->next2->prev2 = bucket->prev2; }
     }
     Bucket::Destroy(bucket);
+    return true;
 }
 
 void Group::DestroyBuckets() {

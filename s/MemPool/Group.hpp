@@ -22,16 +22,25 @@ class BucketMgr;
 // front bucket's prev2 is null. freeBuckets is null exactly while numFreeBuckets is 0.
 class Group {
 public:
-    BucketMgr* parent;                 // The pool that owns the group.
+    BucketMgr* parent;                 // The pool that owns the group. Here it is only a name.
     Bucket* head = nullptr;            // Front of the list of all buckets.
-    Bucket* tail = nullptr;            // Back of that list. Nothing walks from it.
+    Bucket* tail = nullptr;            // Back of that list, part of the format: nothing reads it.
     Bucket* freeBuckets = nullptr;     // Front of the free-bucket list.
     std::uint32_t numBuckets = 0;      // Buckets on the list of all buckets.
     std::uint32_t numFreeBuckets = 0;  // Buckets on the free-bucket list.
     std::uint16_t recDataSize;         // Data bytes of every record.
+    const std::uint16_t bucketSize;    // The pool's, told once: a group asks for nothing above it.
+    const std::uint16_t totalRecs;     // Records of every bucket.
+    const bool keepEmptyBuckets;       // The pool's too: whether an empty bucket stays.
 
-    // Makes no bucket.
-    Group(BucketMgr* owner, std::uint16_t dataSize) : parent(owner), recDataSize(dataSize) {}
+    // Makes no bucket. `bucketBytes` must leave room for a record.
+    Group(BucketMgr* owner, std::uint32_t dataSize, std::uint32_t bucketBytes, bool keepsEmpty)
+        : parent(owner),
+          recDataSize(static_cast<std::uint16_t>(dataSize)),
+          bucketSize(static_cast<std::uint16_t>(bucketBytes)),
+          totalRecs(static_cast<std::uint16_t>(
+              Bucket::RecsWithin(bucketBytes, dataSize + std::uint32_t{sizeof(RecHdr)}))),
+          keepEmptyBuckets(keepsEmpty) {}
     Group(const Group&) = delete;
     Group& operator=(const Group&) = delete;
     ~Group() = default;
@@ -42,31 +51,29 @@ public:
         if (OBR_UNLIKELY(bucket == nullptr)) { return AllocFromNewBucket(); }
         void* const data = bucket->TakeRecord();
         CheckTouched(*bucket);
-        return OBR_UNLIKELY(bucket->IsFull()) ? UnlinkFull(data) : data;
+        return OBR_UNLIKELY(bucket->numFree == 0) ? UnlinkFull(data) : data;
     }
 
     // Gives back a used record of `bucket`. False, with nothing changed, for null data or another
     // group's bucket.
     bool Free(void* data, Bucket* bucket) {
         if (OBR_UNLIKELY(bucket->parent != this || data == nullptr)) { return false; }
-        const bool wasFull = bucket->IsFull();
         bucket->ReturnRecord(data);
         CheckTouched(*bucket);
-        if (OBR_UNLIKELY(bucket->IsEmpty())) { return FreeLastUsed(bucket, wasFull); }
-        return OBR_UNLIKELY(wasFull) ? LinkFree(bucket) : true;
+        if (OBR_UNLIKELY(bucket->numFree == totalRecs)) { return FreeLastUsed(bucket); }
+        return OBR_UNLIKELY(bucket->numFree == 1) ? LinkFree(bucket) : true;  // It was full.
     }
 
     // Releases all buckets, used or not.
     void DestroyBuckets();
 
 private:
-    // These end the fast paths above and return what their callers do.
+    // Slow paths. Each returns what its caller is to return, so that the call is the last thing
+    // that the fast path does: a jump, for which no register is saved and no frame made.
     void* AllocFromNewBucket();
     void* UnlinkFull(void* data);
     bool LinkFree(Bucket* bucket);
-    bool FreeLastUsed(Bucket* bucket, bool wasFull);
-
-    void Release(Bucket* bucket, bool wasFull);
+    bool FreeLastUsed(Bucket* bucket);
 };
 static_assert(sizeof(Group) == 48 && offsetof(Group, recDataSize) == 40,
               "Four pointers, two counts and the data size, in this order.");
