@@ -1,4 +1,4 @@
-# What an install consists of: the shared library with its links, its header, and the packages by
+# What an install consists of: the shared library with its links, its headers, and the packages by
 # which CMake (ObrMemPool) and pkg-config (ObrMemPool.pc) find them. An install may be moved: the
 # packages find the rest from where they lie themselves. The library depends on nothing that its
 # users would have to find, not even with a host layer, which it links privately.
@@ -6,7 +6,8 @@
 include(CMakePackageConfigHelpers)
 
 install(TARGETS MemPool EXPORT ObrMemPool)
-install(FILES ${PROJECT_SOURCE_DIR}/include/MemPool DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})
+install(FILES ${PROJECT_SOURCE_DIR}/include/MemPool ${PROJECT_SOURCE_DIR}/include/MemPoolHeap
+    DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})
 
 set(packageDir ${CMAKE_INSTALL_LIBDIR}/cmake/ObrMemPool)
 install(EXPORT ObrMemPool

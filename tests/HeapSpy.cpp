@@ -12,6 +12,7 @@ std::size_t lastRequest = 0;
 const void* lastRelease = nullptr;
 std::array<std::uint8_t, 48> releasedHead = {};
 std::size_t numLive = 0;
+std::size_t arrayBytes = 0;
 std::size_t numMisfits = 0;
 std::size_t refuseIn = 0;
 bool refusesForGood = false;
@@ -37,6 +38,7 @@ void* Request(std::size_t size, Form form) {
     if (header == nullptr) { throw std::bad_alloc(); }
     *header = {size, form};
     ++numLive;
+    if (form == Form::array) { arrayBytes += size; }
     return std::memset(header + 1, freshByte, size);
 }
 
@@ -48,6 +50,7 @@ void Release(void* start, Form form) {
         return;
     }
     --numLive;
+    if (form == Form::array) { arrayBytes -= header->size; }
     lastRelease = start;
     std::memcpy(releasedHead.data(), start, std::min(releasedHead.size(), header->size));
     std::memset(header, releasedByte, sizeof(Header) + header->size);

@@ -21,6 +21,7 @@ extern std::size_t lastRequest;                    // Its bytes, also if it was 
 extern const void* lastRelease;                    // The block's address,
 extern std::array<std::uint8_t, 48> releasedHead;  // and its first bytes when it was released.
 extern std::size_t numLive;                        // Blocks requested and not yet released.
+extern std::size_t arrayBytes;                     // Bytes of those in array form.
 extern std::size_t numMisfits;  // Releases in the wrong form, or of what is no living block.
 extern std::size_t refuseIn;    // 1: the next request is refused, and so on; 0: none is.
 extern bool refusesForGood;     // All requests behind that one are refused as well.
