@@ -5,14 +5,15 @@ cd "$(dirname "${BASH_SOURCE[0]}")/.."
 
 step() { printf '\n== %s\n' "$*"; }
 
-# build PRESET [TARGET...]: configures once and builds what has changed. The output is shown only if
-# that fails.
+# build PRESET [TARGET...]: configures, which finds what has been installed since, and builds what has
+# changed. The output is shown only if that fails. What the preset leaves open is added to `options`.
+options=()
 build() {
     local preset=$1 log
     shift
     step "Build preset $preset"
     log=$(mktemp)
-    if ! { [ -f "build/$preset/build.ninja" ] || cmake --preset "$preset"; } >"$log" 2>&1 ||
+    if ! cmake --preset "$preset" "${options[@]}" >"$log" 2>&1 ||
         ! cmake --build --preset "$preset" ${1:+--target "$@"} >>"$log" 2>&1; then
         cat "$log"
         echo "Building preset $preset failed." >&2

@@ -6,10 +6,10 @@ set -euo pipefail
 packages=()
 for job in "$@"; do
     case $job in
-        build) packages+=(g++ cmake ninja-build libcli11-dev libgmock-dev zlib1g-dev) ;;
-        test) packages+=(clang libclang-rt-14-dev binutils pkg-config) ;;
+        build) packages+=(g++ cmake ninja-build libcli11-dev) ;;
+        test) packages+=(libgmock-dev zlib1g-dev clang libclang-rt-14-dev binutils pkg-config) ;;
         lint) packages+=(git clang-format clang-tidy shellcheck) ;;
-        bench) packages+=(libbenchmark-dev libmimalloc2.0 libjemalloc2 libtcmalloc-minimal4
+        bench) packages+=(libbenchmark-dev zlib1g-dev libmimalloc2.0 libjemalloc2 libtcmalloc-minimal4
             libboost-dev gnuplot-nox python3) ;;
         *)
             echo "install-packages.sh: unknown job '$job'" >&2
