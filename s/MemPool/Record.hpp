@@ -54,6 +54,20 @@ constexpr std::uint8_t typeUsed = 1;
 constexpr std::uint8_t typeExt = 2;
 constexpr std::uint8_t typeUnknown = 0xFF;  // What reports take for a header that lies nowhere.
 
+// The name of a `type` in reports and messages.
+constexpr const char* RecKindName(std::uint8_t type) {
+    switch (type) {
+        case typeFree:
+            return "FREE";
+        case typeUsed:
+            return "USED";
+        case typeExt:
+            return "EXT";
+        default:
+            return "UNKN";
+    }
+}
+
 // A record's header. A record may start at any address, so that its header is copied like bytes,
 // low byte of the link first; a compiler makes one load or store of a copy. All four bytes go at
 // once, for speed: most records are freed or taken soon after they were taken or freed, and

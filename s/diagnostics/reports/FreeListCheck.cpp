@@ -5,7 +5,6 @@
 #include "diagnostics/reports/RecordHeaders.hpp"
 #include "diagnostics/reports/Walks.hpp"
 #include "diagnostics/text/Messages.hpp"
-#include "diagnostics/text/Text.hpp"
 
 namespace OBR::MemPool {
 

@@ -17,7 +17,6 @@
 #include "MemPool/Bucket.hpp"
 #include "diagnostics/reports/RecordHeaders.hpp"
 #include "diagnostics/reports/Walks.hpp"
-#include "diagnostics/text/Text.hpp"
 
 namespace OBR::MemPool {
 

@@ -43,11 +43,6 @@ std::string BareHex(const void* pointer) {
     return std::string(Address(pointer).Bare());
 }
 
-const char* RecKindName(std::uint8_t type) {
-    constexpr const char* names[] = {"FREE", "USED", "EXT"};
-    return type < 3 ? names[type] : "UNKN";
-}
-
 FixedText& FixedText::Add(std::string_view piece) {
     assert(length + piece.size() < sizeof text);
     length += piece.copy(text + length, sizeof text - 1 - length);

@@ -21,9 +21,6 @@ std::string PtrText(const void* pointer);
 // The 16 digits alone; 18 zeros for null, which has no "0x" to lose.
 std::string BareHex(const void* pointer);
 
-// The name of a record header's `type`: "FREE", "USED", "EXT", or "UNKN" for any other value.
-const char* RecKindName(std::uint8_t type);
-
 // A text of at most 127 characters that asks the heap for nothing. The callers keep to that length.
 class FixedText {
 public:
