@@ -15,7 +15,7 @@
 
 #include "Child.hpp"
 #include "HostLayer/HostEnv.hpp"
-#include "MemPool/Settings.hpp"
+#include "MemPool/EnvInit.hpp"
 
 using namespace OBR::MemPool;
 

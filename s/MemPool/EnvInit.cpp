@@ -1,4 +1,7 @@
-// The start-up of the settings: defaults, the environment, the banner, the final check.
+// Here alone stand the defaults of the settings, and for each environment variable the rule by
+// which its value counts.
+
+#include "MemPool/EnvInit.hpp"
 
 #include <cstdint>
 #include <cstdlib>
@@ -11,9 +14,6 @@
 namespace OBR::MemPool {
 
 namespace {
-
-constexpr std::int32_t minMinRecordSize = 4;
-constexpr std::int32_t maxMaxRecordSize = 0x7FFF;
 
 // The number that a variable starts with, 0 if with none; nothing if it is not set.
 std::optional<std::int32_t> Number(const char* name) {
@@ -45,11 +45,11 @@ void ReadEnvironment() {
     }
     if (const auto number = Number("NUV_OBR_MEMPOOL_MAX_RECORD_SIZE")) {
         const auto size = static_cast<std::uint32_t>(*number);
-        if (size <= maxMaxRecordSize) { Settings::maxRecordSize = size; }
+        if (size <= Settings::largestMaxRecordSize) { Settings::maxRecordSize = size; }
     }
     if (const auto number = Number("NUV_OBR_MEMPOOL_MIN_RECORD_SIZE")) {
         const auto size = static_cast<std::uint32_t>(*number);
-        if (size >= minMinRecordSize) { Settings::minRecordSize = size; }
+        if (size >= Settings::smallestMinRecordSize) { Settings::minRecordSize = size; }
     }
     if (const auto number = Number("NUV_OBR_MEMPOOL_DATA_ALIGNMENT")) {
         Settings::dataAlignment = static_cast<std::uint16_t>(*number > 0 ? *number : 1);

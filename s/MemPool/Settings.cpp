@@ -8,13 +8,14 @@ namespace OBR::MemPool {
 
 namespace Settings {
 
-// Until the start-up stores the defaults these hold the widest bounds; nothing reads them before.
+// The widest bounds. The start-up stores the defaults, which EnvInit.cpp tells, before anything
+// reads these, but leaves the trace alone.
 std::uint32_t bucketSize = 0xFFFF;
 std::uint16_t dataAlignment = 1;
-std::uint32_t maxRecordSize = 0x7FFF;
-std::uint32_t minRecordSize = 4;
-bool keepEmptyBuckets = false;
-bool off = false;
+std::uint32_t maxRecordSize = largestMaxRecordSize;
+std::uint32_t minRecordSize = smallestMinRecordSize;
+bool keepEmptyBuckets;
+bool off;
 bool trace = false;
 
 }  // namespace Settings
@@ -74,6 +75,7 @@ void NUV_OBR_MEMPOOL_TRACE(bool trace) {
     Settings::trace = trace;
 }
 
+// The text of another time. It stays what it is for those who know reports by it.
 const char* GetVersion() {
     return "$Id: MemPool,v 1.2.52.4 2009/08/10 21:28:15 qvw Exp $";
 }

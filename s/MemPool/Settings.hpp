@@ -13,6 +13,10 @@ namespace OBR::MemPool {
 
 namespace Settings {
 
+// The bounds of the two record sizes in the environment.
+constexpr std::uint32_t largestMaxRecordSize = 0x7FFF;
+constexpr std::uint32_t smallestMinRecordSize = 4;
+
 OBR_HIDDEN extern std::uint32_t bucketSize;     // Target size of a bucket.
 OBR_HIDDEN extern std::uint16_t dataAlignment;  // Data sizes become a multiple of it.
 OBR_HIDDEN extern std::uint32_t maxRecordSize;  // Largest record in a bucket, header included.
@@ -22,13 +26,6 @@ OBR_HIDDEN extern bool off;                     // Whether new pools pass reques
 OBR_HIDDEN extern bool trace;                   // Read at every event of every pool.
 
 }  // namespace Settings
-
-// Its construction is the start-up of the settings. It throws a text, const char*, if the record
-// sizes of the environment cannot work; the text outlives the unwinding.
-class EnvInit {
-public:
-    EnvInit();
-};
 
 }  // namespace OBR::MemPool
 

@@ -4,8 +4,8 @@
 
 #include <iostream>  // Ahead of the objects below: its streams work while they are constructed.
 
+#include "MemPool/EnvInit.hpp"
 #include "MemPool/MgrRegistry.hpp"
-#include "MemPool/Settings.hpp"
 
 namespace OBR::MemPool {
 
