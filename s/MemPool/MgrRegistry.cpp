@@ -22,7 +22,9 @@ void MgrRegistry::AddSharer(Mgr* handle) {
     }
 }
 
-// After the exit step the pools that matter are still those of the sharers.
+// The handle can be named by the pools that it has left. Each has its entry, but for the time
+// behind the exit step, when there are no entries: then a pool that anything can still reach is
+// that of one of its other handles, and those came to it by an assignment.
 void MgrRegistry::ForgetHandle(Mgr* handle) {
     const auto forget = [handle](BucketMgr* pool) {
         if (pool != nullptr && pool->mgr == handle) { pool->mgr = nullptr; }
@@ -39,9 +41,7 @@ namespace {
 template <typename Vector>
 void AppendHandles(Vector& mgrs) {
     mgrs.reserve(registry.All().size());
-    for (const auto& entry : registry.All()) {
-        if (Mgr* const handle = MgrRegistry::HandleOf(entry.second)) { mgrs.push_back(handle); }
-    }
+    registry.ForEachHandle([&mgrs](Mgr* handle) { mgrs.push_back(handle); });
 }
 
 }  // namespace

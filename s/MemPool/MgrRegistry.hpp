@@ -36,6 +36,15 @@ public:
     // The living handle that made `pool`, if there is a living pool behind it, else null.
     static Mgr* HandleOf(const BucketMgr* pool);
 
+    // The handles of all pools, but of those that have lost theirs, in the order of the pools'
+    // names: visit(handle).
+    template <typename Visit>
+    void ForEachHandle(Visit visit) const {
+        for (const auto& entry : pools) {
+            if (Mgr* const handle = HandleOf(entry.second)) { visit(handle); }
+        }
+    }
+
     // Sharers are the living handles that have been the left-hand side of an assignment. Only they
     // can share a pool with its maker, and only they can be the maker of a pool they have left.
     const std::vector<Mgr*>& Sharers() const { return sharers; }

@@ -1,7 +1,6 @@
 // The report of a pool, and the exported operations that print it for one pool or for all. A pool
 // keeps no statistics: the figures are gathered from its buckets first, then printed.
 
-#include <algorithm>
 #include <iomanip>
 #include <iostream>
 #include <new>
@@ -10,7 +9,6 @@
 
 #include "MemPool/BucketMgr.hpp"
 #include "MemPool/MgrRegistry.hpp"
-#include "diagnostics/reports/Table.hpp"
 #include "diagnostics/reports/Walks.hpp"
 #include "diagnostics/text/Text.hpp"
 
@@ -105,56 +103,31 @@ void BucketMgr::DbgReport(std::ostream& stream, std::uint32_t level, bool showBu
     }
 }
 
-// The bars are scaled so that the longest has 51 to 100 asterisks once it stands for 50 or more.
-void BucketMgr::DbgUsedData(std::ostream& stream, std::uint32_t level,
-                            const SizeCounts& usedDataFreq) const {
-    const Histogram histogram{7, 9, ' '};
-    const std::string indent = Indent(level);
-    stream << std::endl;
-    stream << Indent(level + 1) << "USED DATA FREQ DIST HISTOGRAM (" << usedDataFreq.size() << ")"
-           << std::endl;
-    histogram.WriteHead(stream, indent);
-
-    std::uint32_t largest = 0;
-    for (const auto& entry : usedDataFreq) { largest = std::max(largest, entry.second); }
-    const std::uint32_t scale = std::max(largest / 50, std::uint32_t{1});
-
-    std::uint32_t id = 0;
-    for (const auto& [size, frequency] : usedDataFreq) {
-        histogram.WriteRow(stream, indent, ++id, size, frequency, frequency / scale + 1);
-        stream << std::endl;
-    }
-}
-
 namespace {
 
 // A failed write stays silent, unless the host has asked its stream to tell. But memory that is
 // exhausted while the stream's buffer grows ends the report as it does elsewhere, by its exception:
 // the stream would swallow it and leave half a number.
 void Print(const BucketMgr& pool, bool detailed) {
-    std::ostream& stream = std::cout;
-    const std::ios::iostate told = stream.exceptions();
-    if (!stream.bad()) { stream.exceptions(told | std::ios::badbit); }
-    const auto restore = [&] {
-        if ((told & std::ios::badbit) == 0) { stream.exceptions(told); }
+    const std::ios::iostate told = std::cout.exceptions();
+    const bool tellsAll = (told & std::ios::badbit) != 0;
+    if (!std::cout.bad()) { std::cout.exceptions(told | std::ios::badbit); }
+    const auto restore = [=] {
+        if (!tellsAll) { std::cout.exceptions(told); }
     };
     try {
-        pool.DbgReport(stream, 0, detailed, detailed, detailed);
+        pool.DbgReport(std::cout, 0, detailed, detailed, detailed);
     } catch (const std::bad_alloc&) {
         restore();
         throw;
     } catch (...) {
-        if ((told & std::ios::badbit) != 0) { throw; }
+        if (tellsAll) { throw; }
     }
     restore();
 }
 
 void PrintAll(bool detailed) {
-    for (const auto& entry : registry.All()) {
-        if (const Mgr* const handle = MgrRegistry::HandleOf(entry.second)) {
-            Print(*handle->GetBucketMgr(), detailed);
-        }
-    }
+    registry.ForEachHandle([=](const Mgr* handle) { Print(*handle->GetBucketMgr(), detailed); });
 }
 
 }  // namespace

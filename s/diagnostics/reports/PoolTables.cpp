@@ -1,8 +1,8 @@
-// The three tables of a pool: its buckets and their fill, the free-bucket list of each group, and
-// its heap records. An address is two characters wider than its column and moves the rest of its
-// row to the right.
+// The four tables of a pool: the histogram of its blocks in use, its buckets and their fill, the
+// free-bucket list of each group, and its heap records. An address is two characters wider than its
+// column.
 
-#include <iomanip>
+#include <algorithm>
 #include <ostream>
 
 #include "MemPool/BucketMgr.hpp"
@@ -12,73 +12,64 @@
 
 namespace OBR::MemPool {
 
+// The bars are scaled so that the longest has 51 to 100 asterisks once it stands for 50 or more.
+void BucketMgr::DbgUsedData(std::ostream& stream, std::uint32_t level,
+                            const SizeCounts& usedDataFreq) const {
+    std::uint32_t largest = 0;
+    for (const auto& entry : usedDataFreq) { largest = std::max(largest, entry.second); }
+    const std::uint32_t scale = std::max(largest / 50, std::uint32_t{1});
+
+    stream << std::endl;
+    stream << Indent(level + 1) << "USED DATA FREQ DIST HISTOGRAM (" << usedDataFreq.size() << ")"
+           << std::endl;
+    constexpr Column columns[] = {{"Id", 5}, {"Size", 7}, {"Freq", 9}, {"Magnitude", 50}};
+    const Table table(stream, level, columns, "");
+    std::uint32_t id = 0;
+    for (const auto& [size, frequency] : usedDataFreq) {
+        table.WriteRow(++id, size, frequency, Bar{frequency / scale + 1});
+    }
+}
+
 void BucketMgr::DbgBuckets(std::ostream& stream, std::uint32_t level) const {
-    const std::string indent = Indent(level + 2);
     stream << std::endl;
     stream << Indent(level + 1) << "BUCKETS (" << GetNumBuckets() << ")" << std::endl;
-    WriteTableHead(stream, indent,
-                   {{"Id", 5},
-                    {"Group", 5},
-                    {"Used", 5},
-                    {"Free", 5},
-                    {"Total", 5},
-                    {"% Used", 8},
-                    {"Rec Size", 8},
-                    {"Addr", 16}});
-
+    constexpr Column columns[] = {{"Id", 5},    {"Group", 5},  {"Used", 5},     {"Free", 5},
+                                  {"Total", 5}, {"% Used", 8}, {"Rec Size", 8}, {"Addr", 16}};
+    const Table table(stream, level + 2, columns);
     std::uint32_t id = 0;
     ForEachGroup(*this, [&](std::uint32_t index, const Group& group) {
         ForEachBucket(group, [&](const Bucket& bucket) {
             const auto totalRecs = static_cast<std::uint32_t>(bucket.TotalRecs());
             const std::uint32_t used = totalRecs - bucket.numFree;
-            const double percentage = totalRecs == 0 ? 0.0 : used * 100.0 / totalRecs;
-            stream << indent;
-            WriteId(stream, ++id, ' ');
-            stream << std::setw(5) << index << " ";
-            stream << std::setw(5) << used << " ";
-            stream << std::setw(5) << bucket.numFree << " ";
-            stream << std::setw(5) << totalRecs << " ";
-            stream << std::fixed << std::setprecision(3) << std::setw(7) << percentage << "% ";
-            stream << std::setw(8) << bucket.recSize << " ";
-            stream << std::setw(16) << PtrText(&bucket) << " " << std::endl;
+            const Percentage percentage{totalRecs == 0 ? 0.0 : used * 100.0 / totalRecs};
+            table.WriteRow(++id, index, used, bucket.numFree, totalRecs, percentage, bucket.recSize,
+                           PtrText(&bucket));
         });
     });
 }
 
+// The first bucket of a group has the group's own values in its row.
 void BucketMgr::DbgFreeBuckets(std::ostream& stream, std::uint32_t level, std::uint32_t freeBucks,
                                std::uint32_t freeBucksM) const {
-    const std::string indent = Indent(level + 2);
     stream << std::endl;
     stream << Indent(level + 1) << "FREE BUCKETS (" << freeBucks << "," << freeBucksM << ")"
            << std::endl;
-    WriteTableHead(
-        stream, indent,
-        {{"Id", 5}, {"Group", 5}, {"Size", 5}, {"Count", 5}, {"Off", 5}, {"Buckets", 16}});
-
+    constexpr Column columns[] = {{"Id", 5},    {"Group", 5}, {"Size", 5},
+                                  {"Count", 5}, {"Off", 5},   {"Buckets", 16}};
+    const Table table(stream, level + 2, columns, "");
     std::uint32_t id = 0;
     ForEachGroup(*this, [&](std::uint32_t index, const Group& group) {
-        if (group.freeBuckets == nullptr) { return; }
         std::uint32_t count = 0;
         for (const Bucket* bucket = group.freeBuckets; bucket != nullptr; bucket = bucket->next2) {
             ++count;
         }
-
         std::uint32_t position = 0;
         for (const Bucket* bucket = group.freeBuckets; bucket != nullptr; bucket = bucket->next2) {
-            stream << indent;
             if (position == 0) {
-                WriteId(stream, ++id, ' ');
-                stream << std::setw(5) << index << " ";
-                stream << std::setw(5) << bucket->DataSize() << " ";
-                stream << std::setw(5) << count << " ";
+                table.WriteRow(++id, index, bucket->DataSize(), count, position, PtrText(bucket));
             } else {
-                for (int column = 0; column < 4; ++column) {
-                    stream << std::setw(5) << " "
-                           << " ";
-                }
+                table.WriteRow("", "", "", "", position, PtrText(bucket));
             }
-            stream << std::setw(5) << position << " ";
-            stream << std::setw(16) << PtrText(bucket) << std::endl;
             ++position;
         }
     });
@@ -86,24 +77,15 @@ void BucketMgr::DbgFreeBuckets(std::ostream& stream, std::uint32_t level, std::u
 }
 
 void BucketMgr::DbgExtRecs(std::ostream& stream, std::uint32_t level) const {
-    const std::string indent = Indent(level + 2);
     stream << std::endl;
     stream << Indent(level + 1) << "EXT RECS (" << numExtRecs << ")" << std::endl;
-    WriteTableHead(
-        stream, indent,
-        {{"Id", 5}, {"Length", 7}, {"Data Ptr", 16}, {"Heap Ptr", 16}, {"Next", 16}, {"Prev", 16}});
-
+    constexpr Column columns[] = {{"Id", 5},        {"Length", 7}, {"Data Ptr", 16},
+                                  {"Heap Ptr", 16}, {"Next", 16},  {"Prev", 16}};
+    const Table table(stream, level + 2, columns);
     std::uint32_t id = 0;
     for (const ExtRec* extRec = extRecs; extRec != nullptr; extRec = extRec->next) {
-        stream << indent;
-        WriteId(stream, ++id, ' ');
-        stream << std::setw(7) << extRec->length << " ";
-        for (const void* address :
-             {extRec->Data(), static_cast<const void*>(extRec),
-              static_cast<const void*>(extRec->next), static_cast<const void*>(extRec->prev)}) {
-            stream << std::setw(16) << PtrText(address) << " ";
-        }
-        stream << std::endl;
+        table.WriteRow(++id, extRec->length, PtrText(extRec->Data()), PtrText(extRec),
+                       PtrText(extRec->next), PtrText(extRec->prev));
     }
     stream << std::endl;
 }

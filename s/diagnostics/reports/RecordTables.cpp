@@ -2,7 +2,6 @@
 // free list from the head on.
 
 #include <algorithm>
-#include <iomanip>
 #include <ostream>
 
 #include "MemPool/Bucket.hpp"
@@ -15,28 +14,16 @@
 namespace OBR::MemPool {
 
 void Bucket::DbgAllRecords(std::ostream& stream, std::uint32_t level) const {
-    const std::string indent = Indent(level);
-    WriteTableHead(stream, indent,
-                   {{"Id", 5},
-                    {"Type", 4},
-                    {"Offset", 6},
-                    {"Size", 5},
-                    {"End", 5},
-                    {"DSize", 5},
-                    {"Address", 18}});
-
+    constexpr Column columns[] = {{"Id", 5, '0'}, {"Type", 4},  {"Offset", 6},  {"Size", 5},
+                                  {"End", 5},     {"DSize", 5}, {"Address", 18}};
+    const Table table(stream, level, columns);
     const auto totalRecs = static_cast<std::uint32_t>(TotalRecs());
     std::uint32_t rows = 0;
     ForEachRecord(*this, [&](std::uint32_t offset) {
         const std::uint8_t type = TypeAt(*this, offset);
-        stream << indent;
-        WriteId(stream, ++rows, '0');
-        stream << std::setw(4) << RecKindName(type) << " ";
-        stream << std::setw(6) << offset << " ";
-        stream << std::setw(5) << recSize << " ";
-        stream << std::setw(5) << offset + recSize << " ";
-        stream << std::setw(5) << (type == typeUsed ? DataSize() : 0) << " ";
-        stream << std::setw(18) << PtrText(RecordAt(offset)) << " " << std::endl;
+        const std::uint32_t dataSize = type == typeUsed ? DataSize() : 0;
+        table.WriteRow(++rows, RecKindName(type), offset, recSize, offset + recSize, dataSize,
+                       PtrText(RecordAt(offset)));
         if (rows > totalRecs) { Messages::TooManyRows(rows, totalRecs); }
     });
     if (rows < totalRecs) { Messages::TooFewRows(rows, totalRecs); }
@@ -48,40 +35,32 @@ void Bucket::AddUsedRecords(SizeCounts& counts) const {
     });
 }
 
-// One asterisk a record, and a "+" where there are more than the column holds.
+// One asterisk a record, as many as the column holds.
 void Bucket::DbgUsedHistogram(std::ostream& stream, std::uint32_t level) const {
     constexpr std::uint32_t maxBar = 50;
-    const Histogram histogram{5, 5, '0'};
-    const std::string indent = Indent(level);
     SizeCounts counts;
     AddUsedRecords(counts);
 
-    histogram.WriteHead(stream, indent);
+    constexpr Column columns[] = {{"Id", 5, '0'}, {"Size", 5}, {"Freq", 5}, {"Magnitude", maxBar}};
+    const Table table(stream, level, columns, "");
     std::uint32_t id = 0;
     for (const auto& [dataSize, frequency] : counts) {
-        histogram.WriteRow(stream, indent, ++id, dataSize, frequency, std::min(frequency, maxBar));
-        stream << (frequency > maxBar ? "+" : "") << std::endl;
+        const Bar bar{std::min(frequency, maxBar), frequency > maxBar};
+        table.WriteRow(++id, dataSize, frequency, bar);
     }
 }
 
 void Bucket::DbgFreeList(std::ostream& stream, std::uint32_t level) const {
-    const std::string indent = Indent(level);
-    WriteTableHead(
-        stream, indent,
-        {{"Id", 5}, {"Offset", 6}, {"Next", 5}, {"Size", 5}, {"Address", 18}, {"Next Addr", 18}});
-
+    constexpr Column columns[] = {{"Id", 5, '0'}, {"Offset", 6},   {"Next", 5},
+                                  {"Size", 5},    {"Address", 18}, {"Next Addr", 18}};
+    const Table table(stream, level, columns);
     const auto totalRecs = static_cast<std::uint32_t>(TotalRecs());
     std::uint32_t rowsBefore = 0;
     for (FreeListWalk walk(*this); walk.IsOnRecord(); walk.Next()) {
         const std::uint16_t link = walk.Link();
-        stream << indent;
-        WriteId(stream, rowsBefore + 1, '0');
-        stream << std::setw(6) << walk.Offset() << " ";
-        stream << std::setw(5) << link << " ";
-        stream << std::setw(5) << recSize << " ";
-        stream << std::setw(18) << PtrText(RecordAt(walk.Offset())) << " ";
-        stream << std::setw(18) << PtrText(link != 0 ? RecordAt(link) : nullptr) << " "
-               << std::endl;
+        table.WriteRow(rowsBefore + 1, walk.Offset(), link, recSize,
+                       PtrText(RecordAt(walk.Offset())),
+                       PtrText(link != 0 ? RecordAt(link) : nullptr));
         if (rowsBefore > totalRecs) {
             Messages::TooManyFreeRows(rowsBefore, totalRecs);
             break;

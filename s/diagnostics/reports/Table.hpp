@@ -1,39 +1,93 @@
-// The form that all tables of the reports share, and the part that the two histograms share. What
-// is set on the stream here stays set: right-justified, with a blank as fill.
+// A table of a report: one list of columns gives the headings, the rule below them and the rows.
+// What is set on the stream here stays set: right-justified, with a blank as fill.
 
 #ifndef OBR_DIAGNOSTICS_TABLE_HPP
 #define OBR_DIAGNOSTICS_TABLE_HPP
 
+#include <cstddef>
 #include <cstdint>
-#include <initializer_list>
-#include <iosfwd>
+#include <iomanip>
+#include <ostream>
 #include <string>
+
+#include "diagnostics/text/Text.hpp"
 
 namespace OBR::MemPool {
 
+// A value that is wider than its column is written whole and moves the rest of its row.
 struct Column {
     const char* heading;
     int width;
+    char fill = ' ';  // Ahead of a row's value.
 };
 
-// The line of headings and the rule below it. A blank follows each column, the last one too.
-void WriteTableHead(std::ostream& stream, const std::string& indent,
-                    std::initializer_list<Column> columns);
+// Values that are not written as they are.
+struct Percentage {
+    double value;
+};
+struct Bar {
+    std::uint32_t length;
+    bool isCut = false;  // It stands for more than its length.
+};
 
-// A row's running number, filled on the left, and the blank behind it.
-void WriteId(std::ostream& stream, std::uint32_t id, char fill);
+template <std::size_t numColumns>
+class Table {
+public:
+    using Columns = Column[numColumns];
 
-// A histogram of data sizes: running number, size, frequency, and a bar of asterisks.
-struct Histogram {
-    int sizeWidth;
-    int freqWidth;
-    char idFill;
+    // Writes the headings. Behind a row's last value stands `atEnd`.
+    Table(std::ostream& output, std::uint32_t level, const Columns& list, const char* atEnd = " ")
+        : stream(output), indent(Indent(level)), columns(list), rowEnd(atEnd) {
+        stream << std::left << indent;
+        for (const Column& column : columns) {
+            stream << std::setw(column.width) << column.heading << " ";
+        }
+        stream << std::endl;
 
-    void WriteHead(std::ostream& stream, const std::string& indent) const;
+        stream << std::right << std::setfill('=') << indent;
+        for (const Column& column : columns) {
+            stream << std::setw(column.width) << "="
+                   << " ";
+        }
+        stream << std::setfill(' ') << std::endl;
+    }
 
-    // Leaves the line open behind the bar.
-    void WriteRow(std::ostream& stream, const std::string& indent, std::uint32_t id,
-                  std::uint32_t size, std::uint32_t frequency, std::uint32_t bar) const;
+    // Writes a row: a value for each column.
+    template <typename... Values>
+    void WriteRow(const Values&... values) const {
+        static_assert(sizeof...(Values) == numColumns,
+                      "A value has a column, and a column a value.");
+        const Column* column = columns;
+        const char* separator = indent.c_str();
+        const auto write = [&](const auto& value) {
+            stream << separator << std::setfill(column->fill);
+            Write(column->width, value);
+            stream << std::setfill(' ');
+            separator = " ";
+            ++column;
+        };
+        (write(values), ...);
+        stream << rowEnd << std::endl;
+    }
+
+private:
+    template <typename Value>
+    void Write(int width, const Value& value) const {
+        stream << std::setw(width) << value;
+    }
+    void Write(int width, const Percentage& percentage) const {
+        stream << std::fixed << std::setprecision(3) << std::setw(width - 1) << percentage.value
+               << "%";
+    }
+    void Write(int, const Bar& bar) const {
+        stream << std::setfill('*') << std::setw(static_cast<int>(bar.length)) << "*"
+               << (bar.isCut ? "+" : "");
+    }
+
+    std::ostream& stream;
+    const std::string indent;
+    const Columns& columns;
+    const char* const rowEnd;
 };
 
 }  // namespace OBR::MemPool
