@@ -20,7 +20,6 @@
 #include <cstdint>
 #include <cstdlib>
 #include <functional>
-#include <iostream>
 #include <memory>
 #include <memory_resource>
 #include <numeric>
@@ -36,6 +35,7 @@
 #define HAS_BOOST
 #endif
 
+#include "RunSubject.hpp"
 #include "trace/OpenTrace.hpp"
 #include "trace/Resolver.hpp"
 
@@ -263,18 +263,6 @@ void ManyPools(benchmark::State& state) {
     SetOperations(state, names.size());
 }
 
-// Makes the heap as long as that of a host with other data, some of them at its end. Otherwise the
-// C library hands the memory that a round has freed back to the system and asks for it again in the
-// next, and that is what a row would measure.
-void LengthenHeap() {
-    constexpr std::size_t size = 65536;
-    Blocks blocks(3000);
-    for (void*& block : blocks) { block = std::malloc(size); }
-    static void* const end = std::malloc(size);
-    benchmark::DoNotOptimize(end);
-    std::for_each(blocks.begin(), blocks.end(), std::free);
-}
-
 // The names of the rows, in the order of the tables.
 
 using Row = std::function<void(benchmark::State&)>;
@@ -355,21 +343,6 @@ bool RegisterRows(const std::string& subject) {
 }  // namespace
 
 int main(int argc, char** argv) {
-    const std::string option = "--subject=";
-    const std::string first = argc > 1 ? argv[1] : "";
-    if (first.compare(0, option.size(), option) != 0 ||
-        !RegisterRows(first.substr(option.size()))) {
-        std::cerr << "usage: PoolBench --subject=pool|pool-keep|pool-64k|heap|boost|pmr "
-                     "[benchmark options]"
-                  << std::endl;
-        return 2;
-    }
-    argv[1] = argv[0];
-    --argc;
-    ++argv;
-    benchmark::Initialize(&argc, argv);
-    if (benchmark::ReportUnrecognizedArguments(argc, argv)) { return 2; }
-    LengthenHeap();
-    benchmark::RunSpecifiedBenchmarks();
-    return 0;
+    return RunSubject(argc, argv, "PoolBench --subject=pool|pool-keep|pool-64k|heap|boost|pmr",
+                      RegisterRows);
 }

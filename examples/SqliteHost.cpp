@@ -1,0 +1,162 @@
+// Runs an SQL file in an SQLite database whose every block comes from a heap of pools: SQLite takes
+// a host's memory calls through sqlite3_config. With --heap it keeps those of its own, which are
+// the C library's malloc, for comparison.
+//
+// Rows come to standard output as the sqlite3 program prints them: a line a row, its values with
+// "|" between. The first error ends the run.
+
+#include <MemPoolHeap>
+
+#include <sys/resource.h>
+
+#include <algorithm>
+#include <chrono>
+#include <cstdio>
+#include <exception>
+#include <fstream>
+#include <iostream>
+#include <iterator>
+#include <memory>
+#include <string>
+
+#include <sqlite3.h>
+#include <CLI/CLI.hpp>
+
+namespace {
+
+using OBR::MemPool::Heap;
+using OBR::MemPool::HeapSettings;
+
+// Two kinds of blocks: the many small ones of the parser and of prepared statements, which come and
+// go together, so that classes often run empty and buckets are kept; and the page cache, whose
+// pages are 4096 bytes with some 200 of its own. Records of up to 4400 bytes take those in as well,
+// 14 of them to a bucket of 65535.
+HeapSettings Settings(bool on) {
+    return HeapSettings().On(on).BucketSize(65535).MaxRecordSize(4400).KeepEmptyBuckets(true);
+}
+
+// SQLite hands no context to these calls: there is one memory for the process.
+Heap* memory = nullptr;
+
+sqlite3_mem_methods Methods() {
+    sqlite3_mem_methods methods{};
+    methods.xMalloc = [](int size) { return memory->Malloc(static_cast<std::size_t>(size)); };
+    methods.xFree = [](void* block) { memory->Free(block); };
+    methods.xRealloc = [](void* block, int size) {
+        return memory->Realloc(block, static_cast<std::size_t>(size));
+    };
+    methods.xSize = [](void* block) { return static_cast<int>(memory->UsableSize(block)); };
+    methods.xRoundup = [](int size) { return (size + 7) & ~7; };
+    methods.xInit = [](void*) { return SQLITE_OK; };
+    methods.xShutdown = [](void*) {};
+    return methods;
+}
+
+struct Options {
+    std::string database = ":memory:";
+    std::string file;
+    bool useMalloc = false;
+    bool off = false;
+    bool report = false;
+};
+
+bool Fail(sqlite3* database, const std::string& file, const std::string& sql,
+          const char* position) {
+    const char* const text = database != nullptr ? sqlite3_errmsg(database) : "out of memory";
+    auto line = 1 + std::count(sql.data(), position, '\n');
+    for (; *position == '\n' || *position == ' '; ++position) { line += *position == '\n'; }
+    std::cerr << "SqliteHost: " << file << ":" << line << ": " << text << "\n";
+    return false;
+}
+
+void PrintRow(sqlite3_stmt* statement) {
+    for (int column = 0; column < sqlite3_column_count(statement); ++column) {
+        const auto* const text = sqlite3_column_text(statement, column);
+        if (column > 0) { std::fputc('|', stdout); }
+        if (text != nullptr) { std::fputs(reinterpret_cast<const char*>(text), stdout); }
+    }
+    std::fputc('\n', stdout);
+}
+
+bool RunSql(sqlite3* database, const std::string& file, const std::string& sql) {
+    for (const char* position = sql.c_str(); *position != '\0';) {
+        sqlite3_stmt* statement = nullptr;
+        const char* rest = nullptr;
+        if (sqlite3_prepare_v2(database, position, -1, &statement, &rest) != SQLITE_OK) {
+            return Fail(database, file, sql, position);
+        }
+        while (sqlite3_step(statement) == SQLITE_ROW) { PrintRow(statement); }
+        // What step says of an error, finalize says again; of no statement, nothing.
+        if (sqlite3_finalize(statement) != SQLITE_OK) {
+            return Fail(database, file, sql, position);
+        }
+        position = rest;
+    }
+    return true;
+}
+
+double Seconds() {
+    const auto now = std::chrono::steady_clock::now().time_since_epoch();
+    return std::chrono::duration<double>(now).count();
+}
+
+bool Run(const Options& options) {
+    std::ifstream input(options.file);
+    const std::string sql(std::istreambuf_iterator<char>(input), {});
+    if (!input) {
+        std::cerr << "SqliteHost: cannot read " << options.file << "\n";
+        return false;
+    }
+
+    const double begin = Seconds();
+    sqlite3* database = nullptr;
+    bool success = sqlite3_open(options.database.c_str(), &database) == SQLITE_OK
+                       ? RunSql(database, options.file, sql)
+                       : Fail(database, options.database, sql, sql.c_str());
+    if (options.report && memory != nullptr) {
+        std::fflush(stdout);
+        memory->GetMgr().Dbg();
+    }
+    sqlite3_close(database);
+    const double run = Seconds() - begin;
+
+    rusage usage{};
+    getrusage(RUSAGE_SELF, &usage);
+    std::fprintf(stderr, "%s: run %.3f s, peak %.1f MB\n", options.file.c_str(), run,
+                 static_cast<double>(usage.ru_maxrss) / 1000);
+    return success;
+}
+
+int Main(int argc, char** argv) {
+    Options options;
+    CLI::App app("Runs an SQL file with SQLite's memory in a pool.", "SqliteHost");
+    app.add_option("FILE", options.file, "SQL statements")->required();
+    app.add_option("--database", options.database, "The database file")->capture_default_str();
+    app.add_flag("--heap", options.useMalloc, "The C library's malloc in place of pools");
+    app.add_flag("--off", options.off, "Pools off: each block by itself, for a memory checker");
+    app.add_flag("--report", options.report, "Print the pool at the end");
+    CLI11_PARSE(app, argc, argv);
+
+    std::unique_ptr<Heap> heap;
+    sqlite3_config(SQLITE_CONFIG_MEMSTATUS, 0);  // Its own books would be a second set.
+    if (!options.useMalloc) {
+        heap = std::make_unique<Heap>("sqlite", Settings(!options.off));
+        memory = heap.get();
+        const sqlite3_mem_methods methods = Methods();
+        sqlite3_config(SQLITE_CONFIG_MALLOC, &methods);
+    }
+    const bool success = Run(options);
+    sqlite3_shutdown();
+    return success ? 0 : 1;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    try {
+        return Main(argc, argv);
+    } catch (const std::exception& error) {
+        std::fprintf(stderr, "SqliteHost: %s\n", error.what());
+        return 1;
+    }
+}

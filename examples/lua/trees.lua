@@ -1,0 +1,23 @@
+-- Binary trees, many small and short-lived beside a large one that stays, as a compiler has them.
+local depth = math.floor(15 + math.log(tonumber(os.getenv("SCALE") or 1), 2))
+
+local function build(level)
+    if level == 0 then return {} end
+    return {build(level - 1), build(level - 1)}
+end
+
+local function count(tree)
+    if not tree[1] then return 1 end
+    return 1 + count(tree[1]) + count(tree[2])
+end
+
+local stays = build(depth)
+for level = 4, depth, 4 do
+    local rounds = 1 << (depth - level + 3)
+    local nodes = 0
+    for _ = 1, rounds do
+        nodes = nodes + count(build(level))
+    end
+    print(("%d trees of depth %d: %d nodes"):format(rounds, level, nodes))
+end
+print("the one that stays: " .. count(stays) .. " nodes")
