@@ -1,23 +1,30 @@
 #include "mempool/Print.hpp"
 
 #include <cstddef>
-#include <cstdint>
+#include <cstdlib>
+#include <string>
 
 namespace Tool {
 
-void PrintBadLines(std::ostream& out, const std::string& path, const Replay::Recording& recording) {
-    std::uint64_t total = 0;
-    for (const std::uint64_t number : recording.numFaults) { total += number; }
-    out << "   Bad lines: " << total << '\n';
+void PrintBadLines(std::ostream& out, const Trace::StepReader& reader) {
+    const Trace::BadLines& bad = reader.Bad();
+    out << "   Bad lines: " << bad.Total() << '\n';
     for (std::size_t fault = 0; fault < Trace::faultNames.size(); ++fault) {
-        if (recording.numFaults[fault] == 0) { continue; }
-        out << "      " << recording.numFaults[fault] << " x " << Trace::faultNames[fault] << '\n';
+        if (bad.numFaults[fault] == 0) { continue; }
+        out << "      " << bad.numFaults[fault] << " x " << Trace::faultNames[fault] << '\n';
     }
-    for (const Replay::BadLine& line : recording.badLines) {
-        out << "   " << path << ':' << line.number << ": "
+    for (const Trace::BadLine& line : bad.first) {
+        out << "   " << reader.Name() << ':' << line.number << ": "
             << Trace::faultNames[static_cast<std::size_t>(line.fault)] << '\n';
     }
-    if (total > recording.badLines.size()) { out << "   and more\n"; }
+    if (bad.Total() > bad.first.size()) { out << "   and more\n"; }
+}
+
+int WarnOfBrokenTrace(const Trace::StepReader& reader) {
+    const std::string warning = reader.Warning();
+    if (warning.empty()) { return EXIT_SUCCESS; }
+    std::cerr << "mempool: " << warning << '\n';
+    return EXIT_FAILURE;
 }
 
 }  // namespace Tool

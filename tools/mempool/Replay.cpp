@@ -17,8 +17,9 @@
 #include "mempool/Progress.hpp"
 #include "mempool/Settings.hpp"
 #include "replay/Measure.hpp"
+#include "replay/PoolSettings.hpp"
 #include "replay/Recording.hpp"
-#include "trace/OpenTrace.hpp"
+#include "trace/StepReader.hpp"
 
 namespace Tool {
 
@@ -46,6 +47,7 @@ bad lines     Left out of the replay. The library's own trace does not show Mgr:
 )";
 
 struct Options {
+    Replay::PoolSettings settings = Replay::PoolSettings::OfProcess();
     std::vector<std::string> paths;
     unsigned int rounds = 11;
     bool dbg = false;
@@ -74,16 +76,16 @@ void WriteCompared(const char* label, const Replay::Compared<Value>& figures) {
     }
 }
 
-void Compare(const std::string& path, const Options& options) {
-    const Progress progress(path);
-    const auto source = Trace::OpenTrace(path);
+// Returns the exit status.
+int Compare(const std::string& path, const Options& options) {
+    Trace::StepReader reader(path);
+    const Progress progress(reader.Name());
     const Replay::Recording recording = Replay::ReadRecording(
-        *source, [&](auto position) { progress.Show("line " + std::to_string(position)); });
+        reader, [&](auto position) { progress.Show("line " + std::to_string(position)); });
     progress.Clear();
-    if (!source->Problem().empty()) { throw std::runtime_error(path + ": " + source->Problem()); }
 
-    std::cout << path << '\n';
-    PrintBadLines(std::cout, path, recording);
+    std::cout << reader.Name() << '\n';
+    PrintBadLines(std::cout, reader);
     const auto held = Replay::BytesHeld(recording, [&] {
         if (options.dbg) { OBR::MemPool::Dbg(); }
     });
@@ -98,21 +100,23 @@ void Compare(const std::string& path, const Options& options) {
     WriteSame("blocks never freed", recording.numNeverFreed);
     WriteCompared("bytes held at the peak", held);
     std::cout << std::flush;
-    if (recording.steps.empty()) { return; }
+    const int status = WarnOfBrokenTrace(reader);
+    if (recording.steps.empty()) { return status; }
     const auto times = Replay::NanosecondsPerEvent(recording, options.rounds, [&](auto round) {
         progress.Show("round " + std::to_string(round) + " of " + std::to_string(options.rounds));
     });
     progress.Clear();
     WriteCompared("ns an event", times);
+    std::cout << std::flush;
+    return status;
 }
 
 int CompareAll(const Options& options) {
-    OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);
-    OBR::MemPool::NUV_OBR_MEMPOOL_TRACE(false);
+    ApplySettings(options.settings);
     int status = EXIT_SUCCESS;
     for (const std::string& path : options.paths) {
         try {
-            Compare(path, options);
+            if (Compare(path, options) != EXIT_SUCCESS) { status = EXIT_FAILURE; }
         } catch (const std::bad_alloc&) {
             std::cerr << "mempool: " << path << ": out of memory\n";
             status = EXIT_FAILURE;
@@ -130,10 +134,12 @@ void AddReplay(Program& program) {
     CLI::App& replay = *program.commandLine.add_subcommand("replay", description);
     replay.footer(notes);
     const auto options = std::make_shared<Options>();
-    replay.add_option("TRACE", options->paths, "Files to replay, one after the other")
+    replay
+        .add_option("TRACE", options->paths,
+                    "Files to replay, one after the other; - is standard input")
         ->required()
         ->type_name("");
-    AddSettings(replay);
+    AddSettings(replay, options->settings);
     replay.add_option("--rounds", options->rounds, "Timed replays a side")
         ->type_name("N")
         ->check(CLI::Range(1, 1000000))

@@ -1,4 +1,4 @@
-// The clock of all measurements.
+// The clock of all measurements. It stands in a file of its own so that a test can link another.
 
 #ifndef OBR_TOOLS_REPLAY_CLOCK_HPP
 #define OBR_TOOLS_REPLAY_CLOCK_HPP

@@ -2,8 +2,6 @@
 
 #include "replay/Measure.hpp"
 
-#include <time.h>
-
 #include <algorithm>
 #include <cstddef>
 #include <utility>
@@ -36,12 +34,6 @@ double TimePerEvent(const Recording& recording) {
 }
 
 }  // namespace
-
-double ProcessorNanoseconds() {
-    timespec now;
-    clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &now);
-    return 1e9 * static_cast<double>(now.tv_sec) + static_cast<double>(now.tv_nsec);
-}
 
 double Median(std::vector<double> values) {
     const auto middle = values.begin() + static_cast<std::ptrdiff_t>(values.size() / 2);

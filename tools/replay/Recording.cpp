@@ -2,7 +2,6 @@
 
 #include "replay/Recording.hpp"
 
-#include <optional>
 #include <tuple>
 #include <utility>
 
@@ -12,23 +11,16 @@ namespace {
 
 class Recorder {
 public:
-    void Add(const Trace::Event& event, std::uint64_t position) {
-        Trace::Step step = {};
-        if (const auto fault = resolver.Resolve(event, step)) {
-            AddBadLine({position, *fault});
-            return;
-        }
+    // Adds a step behind which `blocks` stands.
+    void Add(Trace::Step step, const Trace::Resolver& blocks) {
         switch (step.kind) {
-            case Trace::Kind::Info:
-                recording.facts[std::string(event.key)] = event.text;
-                return;
             case Trace::Kind::Named:
                 return;
             case Trace::Kind::Cleared:
-                recording.numCleared += Drop(step);
+                recording.numCleared += Drop(step, blocks.Dropped());
                 break;
             case Trace::Kind::Destroyed:
-                recording.numNeverFreed += Drop(step);
+                recording.numNeverFreed += Drop(step, blocks.Dropped());
                 break;
             case Trace::Kind::Freed:
                 Forget(step.block);
@@ -40,25 +32,19 @@ public:
         if (step.kind == Trace::Kind::Allocated) { Count(step.block); }
     }
 
-    Recording Finish() {
-        while (resolver.EndPool()) { recording.numNeverFreed += resolver.Dropped().size(); }
-        recording.pools = resolver.Pools();
-        recording.numBlocks = resolver.NumBlocks();
+    Recording Finish(Trace::Resolver& blocks) {
+        while (blocks.EndPool()) { recording.numNeverFreed += blocks.Dropped().size(); }
+        recording.pools = blocks.Pools();
+        recording.numBlocks = blocks.NumBlocks();
         return std::move(recording);
     }
 
 private:
-    void AddBadLine(BadLine line) {
-        constexpr std::size_t maxShown = 5;
-        ++recording.numFaults[static_cast<std::size_t>(line.fault)];
-        if (recording.badLines.size() < maxShown) { recording.badLines.push_back(line); }
-    }
-
     // Keeps the blocks that go with the step and returns their number.
-    std::uint32_t Drop(Trace::Step& step) {
+    std::uint32_t Drop(Trace::Step& step, const std::vector<Trace::Block>& dropped) {
         step.block.index = static_cast<std::uint32_t>(recording.dropped.size());
-        step.block.size = static_cast<std::uint32_t>(resolver.Dropped().size());
-        for (const Trace::Block& block : resolver.Dropped()) {
+        step.block.size = static_cast<std::uint32_t>(dropped.size());
+        for (const Trace::Block& block : dropped) {
             recording.dropped.push_back(block.index);
             Forget(block);
         }
@@ -81,23 +67,22 @@ private:
     }
 
     Recording recording;
-    Trace::Resolver resolver;
     std::uint64_t liveBytes = 0;
     std::uint64_t liveBlocks = 0;
 };
 
 }  // namespace
 
-Recording ReadRecording(Trace::EventSource& source,
+Recording ReadRecording(Trace::StepReader& reader,
                         const std::function<void(std::uint64_t position)>& atEvent) {
     constexpr std::uint64_t interval = 100000;
     Recorder recorder;
-    Trace::Event event;
-    for (std::uint64_t number = 1; source.Next(event); ++number) {
-        recorder.Add(event, source.Position());
-        if (number % interval == 0) { atEvent(source.Position()); }
+    Trace::Step step = {};
+    for (std::uint64_t number = 1; reader.Next(step); ++number) {
+        recorder.Add(step, reader.Blocks());
+        if (number % interval == 0) { atEvent(reader.Position()); }
     }
-    return recorder.Finish();
+    return recorder.Finish(reader.Blocks());
 }
 
 }  // namespace Replay

@@ -3,27 +3,19 @@
 #ifndef OBR_TOOLS_REPLAY_RECORDING_HPP
 #define OBR_TOOLS_REPLAY_RECORDING_HPP
 
-#include <array>
 #include <cstddef>
 #include <cstdint>
 #include <functional>
-#include <map>
-#include <string>
 #include <vector>
 
-#include "trace/Event.hpp"
 #include "trace/Resolver.hpp"
+#include "trace/StepReader.hpp"
 
 namespace Replay {
 
-struct BadLine {
-    std::uint64_t number;
-    Trace::Fault fault;
-};
-
 struct Recording {
-    // All events but names and facts. In place of a block, that of a pool cleared or destroyed has
-    // the range of its blocks in `dropped`: where it begins, and how many they are.
+    // All steps but names. In place of a block, that of a pool cleared or destroyed has the range
+    // of its blocks in `dropped`: where it begins, and how many they are.
     std::vector<Trace::Step> steps;
     std::vector<std::uint32_t> dropped;  // Indices of blocks.
     std::vector<Trace::Pool> pools;      // Each pool ever created.
@@ -36,14 +28,10 @@ struct Recording {
     std::size_t peakSteps = 0;  // Steps up to and including it.
     std::uint64_t peakBytes = 0;
     std::uint64_t peakBlocks = 0;
-
-    std::array<std::uint64_t, Trace::faultNames.size()> numFaults = {};
-    std::vector<BadLine> badLines;             // The first few.
-    std::map<std::string, std::string> facts;  // What Info events tell.
 };
 
 // Reads to the end. `atEvent` is called with the position now and then.
-Recording ReadRecording(Trace::EventSource& source,
+Recording ReadRecording(Trace::StepReader& reader,
                         const std::function<void(std::uint64_t position)>& atEvent);
 
 }  // namespace Replay

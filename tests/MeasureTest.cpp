@@ -1,0 +1,78 @@
+// The measurements of a replay from within: on a clock of the test's own, which goes on by 1, 2, 3
+// and so on nanoseconds from one look to the next, and with a count of the heap.
+
+#include "replay/Measure.hpp"
+
+#include <malloc.h>
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+#include <MemPool>
+
+#include "TraceLines.hpp"
+#include "replay/Clock.hpp"
+#include "replay/HeapCount.hpp"
+#include "replay/Recording.hpp"
+
+double Replay::ProcessorNanoseconds() {
+    static double now = 0;
+    static double step = 0;
+    return now += ++step;
+}
+
+namespace {
+
+Replay::Recording Record(const std::string& shorthand) {
+    OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);
+    Trace::StepReader reader(ReadLines(Lines(shorthand)), "lines");
+    return Replay::ReadRecording(reader, [](auto) {});
+}
+
+// What the allocator makes of a request.
+std::int64_t Usable(std::size_t size) {
+    void* const block = ::operator new(size);
+    const auto usable = static_cast<std::int64_t>(malloc_usable_size(block));
+    ::operator delete(block);
+    return usable;
+}
+
+TEST(Recording, FindsTheFirstOfThePeaksWithTheMostBlocks) {
+    const Replay::Recording recording = Record(
+        "@c:P\n@n:P:caller\n@a:P:X:64\n@x:P\n@a:P:X:24\n@a:P:Y:40\n@f:P:Y:\n@a:P:Y:40\n@x:P\n"
+        "@c:Q\n@a:Q:X:64\n@d:Q\n@a:P:X:1\n");
+    EXPECT_EQ(recording.peakSteps, 5U);
+    EXPECT_EQ(recording.peakBytes, 64U);
+    EXPECT_EQ(recording.peakBlocks, 2U);
+    EXPECT_EQ(recording.numCleared, 3U);
+    EXPECT_EQ(recording.numNeverFreed, 2U);
+    EXPECT_EQ(recording.steps.size(), 12U);
+}
+
+// The pools are clocked twice a round, the heap twice more for what it frees at the end of a pool.
+TEST(Measure, ChargesEachSideWithTheTimeOfItsEvents) {
+    const Replay::Recording recording = Record("@c:P\n@a:P:X:8\n@x:P\n@a:P:X:8\n@d:P\n");
+    std::vector<unsigned int> rounds;
+    const auto times =
+        Replay::NanosecondsPerEvent(recording, 3, [&](unsigned int n) { rounds.push_back(n); });
+    EXPECT_EQ(rounds, (std::vector<unsigned int>{1, 2, 3}));
+    // Pool: 2, 12, 14. Heap: 4 + 6, 8 + 10, 16 + 18. It is first in the second round.
+    EXPECT_DOUBLE_EQ(times.pool, 12. / 5);
+    EXPECT_DOUBLE_EQ(times.heap, 18. / 5);
+}
+
+TEST(Measure, CountsWhatIsHeldAndGivesAllOfItBack) {
+    const Replay::Recording recording =
+        Record("@c:P\n@a:P:X:5000\n@x:P\n@c:Q\n@a:Q:X:6000\n@d:Q\n@a:P:X:6000\n@a:P:Y:1025\n");
+    const auto held = Replay::BytesHeld(recording, [] {});
+    EXPECT_EQ(held.heap, Usable(6000) + Usable(1025)) << "In place of the bytes asked for.";
+    EXPECT_NEAR(static_cast<double>(held.pool), 6000 + 1025 + 2 * 24 + 249 * 8 + 400, 400);
+
+    HeapCount::Start();
+    Replay::NanosecondsPerEvent(recording, 2, [](auto) {});
+    EXPECT_EQ(HeapCount::Stop(), 0);
+}
+
+}  // namespace
