@@ -3,9 +3,10 @@
 
 usage: bench-report.py RESULTS OUTPUT
 
-RESULTS holds NUMBER.SUBJECT.ROUND.json (Google Benchmark's, by the number of the row) and "resident"
-(subject, size, bytes a block and, for the pool, bytes held). The figures for the picture go back
-there, as ratios.dat.
+RESULTS holds NUMBER.SUBJECT.ROUND.json (Google Benchmark's, by the number of the row), the same of
+the layer in a folder of its own, "clients" (round, work, mode and what the client tells of its
+time), and "resident" (subject, size, bytes a block and, for the pool, bytes held). The figures for
+the pictures go back there, as ratios.dat and growth.dat.
 """
 
 import json
@@ -21,6 +22,10 @@ POOLS = ["pool", "pool-keep", "pool-64k"]
 PEERS = ["glibc", "mimalloc", "jemalloc", "tcmalloc", "boost", "pmr"]
 MALLOCS = ["glibc", "mimalloc", "jemalloc", "tcmalloc"]
 TRACES = ["trace lua", "trace jq", "trace sqlite"]
+LAYERED = ["layer", "raw", "glibc", "mimalloc", "jemalloc", "tcmalloc", "pmr"]
+TREE_ROW = "tree of 262k nodes, dropped whole"
+NODE_ROWS = ["list of 100k, built and cleared", "map, 10k live, insert or erase"]
+IN_GROWTH = ["raw", "glibc", "mimalloc", "jemalloc", "pmr"]
 IN_PICTURE = ["mimalloc", "jemalloc", "tcmalloc", "pmr"]
 
 
@@ -74,6 +79,12 @@ class Measured:
             return None
         return statistics.median(own[number] / other[number] for number in own)
 
+    def spread(self, row):
+        """The quartiles of the ratio of pools to the heap."""
+        own, other = (self.times[name][row] for name in ("pools", "heap"))
+        quartiles = statistics.quantiles((own[key] / other[key] for key in own), n=4)
+        return f"{quartiles[0]:.2f} to {quartiles[2]:.2f}"
+
     def mean(self, rows, peer, subject="pool"):
         values = [self.of(row, peer, subject) for row in rows]
         return None if None in values else geometric_mean(values)
@@ -111,6 +122,62 @@ def goals(measured, rows, resident):
          resident["pool"][size] / min(resident[peer][size] for peer in MALLOCS if peer in resident))
         for size in (20, 40, 100, 200, 900)
     ]
+
+
+def read_clients(results):
+    """Seconds by round, as times[mode][work], and the works in their order."""
+    times = {}
+    for line in (results / "clients").read_text().splitlines():
+        round_number, work, mode, figures = line.split("\t")
+        seconds = sum(float(figure) for figure in re.findall(r"([0-9.]+) s", figures))
+        times.setdefault(mode[2:], {}).setdefault(work, {})[round_number] = seconds
+    return times
+
+
+def layer_goals(layer, clients):
+    """Like goals(): what hosts build on the pools."""
+    def client(name):
+        return next((clients.of(work, "heap", "pools") for work in clients.times["pools"]
+                     if name in work), None)
+
+    def worst(peer):
+        return max(layer.of(row, peer, "layer") for row in NODE_ROWS)
+
+    return [
+        ("Lua, objects / malloc", 0.6, client("objects")),
+        ("Lua, trees / malloc", 0.6, client("trees")),
+        ("Lua, strings / malloc", 0.8, client("strings")),
+        ("SQLite / malloc", 1.0, client("Sqlite")),
+        ("tree of nodes, dropped whole / glibc", 0.45, layer.of(TREE_ROW, "glibc", "layer")),
+        ("worst node container on Resource / pmr", 0.9, worst("pmr")),
+        ("the same / bare Mgr", 1.1, worst("raw")),
+    ]
+
+
+def layer_tables(layer, rows, clients):
+    subjects = [name for name in LAYERED if name in layer.times]
+    yield from table(["work, ns"] + subjects,
+                     ([row] + [number(layer.time(row, name), 1) for name in subjects]
+                      for row in rows))
+    yield "The clients, seconds, and the ratio within a round:"
+    yield ""
+    yield from table(["work", "pools", "malloc", "ratio", "spread"],
+                     (["`" + work + "`", number(clients.time(work, "pools"), 3),
+                       number(clients.time(work, "heap"), 3),
+                       number(clients.of(work, "heap", "pools"))] + [clients.spread(work)]
+                      for work in clients.times["pools"]))
+
+
+def write_growth(results, layer, rows):
+    """A block for each subject: blocks, ns an operation, ms to drop them."""
+    numbers = [int(row.split()[1]) for row in rows if row.startswith("live ")]
+    with (results / "growth.dat").open("w") as data:
+        for subject in IN_GROWTH:
+            for blocks in numbers:
+                live, drop = (layer.time(f"{what} {blocks}", subject) for what in ("live", "drop"))
+                if live is not None and drop is not None:
+                    data.write(f"{blocks} {live} {drop * blocks / 1e6}\n")
+            data.write("\n\n")
 
 
 def machine():
@@ -164,6 +231,9 @@ def main():
     measured = Measured(times)
     peers = [peer for peer in PEERS if peer in times]
     timed = [row for row in rows if any(row in times[peer] for peer in peers)]
+    layer_times, layer_rows = read_times(results / "layer")
+    layer, clients = Measured(layer_times), Measured(read_clients(results))
+    write_growth(results, layer, layer_rows)
     text = ["# Performance", "",
             "Written by `scripts/bench.sh`, which anybody can repeat. " + machine(), "",
             "![Time of an operation beside glibc](performance.svg)", "",
@@ -193,7 +263,13 @@ def main():
     text += table(["ratio", "goal", "measured", ""],
                   ([what, number(goal), number(ratio),
                     "" if ratio is None else "met" if ratio <= goal else "missed"]
-                   for what, goal, ratio in goals(measured, rows, resident)))
+                   for what, goal, ratio in
+                   goals(measured, rows, resident) + layer_goals(layer, clients)))
+    text += ["## The layer and its clients", "",
+             "layer is a `Heap` of `MemPoolHeap`, raw the bare `Mgr` with the same settings. The clients",
+             "are those of `examples/`, each beside malloc in the same program.", ""]
+    text += layer_tables(layer, layer_rows, clients)
+    text += ["![Cost with growing work](growth.svg)", ""]
     text += ["## Resident bytes a live block", ""]
     text += resident_tables(resident, held)
     output.write_text("\n".join(text).rstrip() + "\n")

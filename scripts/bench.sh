@@ -2,7 +2,7 @@
 # Measures the pool beside its peers and writes docs/performance.md and docs/performance.svg.
 # Every subject does a row right behind the others, so that what the machine does meanwhile meets all
 # of them; the report takes medians over the rounds. --quick: fewer and shorter rounds, for a first
-# look.
+# look, and no work on more than a million blocks.
 # shellcheck source=scripts/build.sh
 source "$(dirname "$0")/build.sh"
 
@@ -19,7 +19,16 @@ esac
 step "Packages"
 scripts/install-packages.sh build
 scripts/install-packages.sh bench || echo "What is missing of these is left out."
-build bench PoolBench Resident
+build bench PoolBench LayerBench Resident Ast
+hosts=(Ast)
+for host in LuaHost SqliteHost; do
+    if cmake --build --preset bench --target help | grep -q "^$host:"; then
+        build bench "$host"
+        hosts+=("$host")
+    else
+        echo "$host is left out: its library is not installed."
+    fi
+done
 
 results=$(mktemp -d)
 trap 'rm -rf "$results"' EXIT
@@ -73,6 +82,53 @@ for ((round = 1; round <= rounds; ++round)); do
     done
 done
 
+# The layer and what stands on it: rows of containers, and of growing work.
+layered=(layer raw "${peers[@]/boost}")
+read -r -a layered <<<"${layered[*]}"
+mkdir "$results/layer"
+mapfile -t rows < <(build/bench/bench/LayerBench --subject=raw --benchmark_list_tests)
+for ((round = 1; round <= rounds; ++round)); do
+    step "Layer, round $round of $rounds"
+    layered=("${layered[@]:1}" "${layered[0]}")
+    for number in "${!rows[@]}"; do
+        row=${rows[number]}
+        case $row in
+            live* | drop*)
+                # How cost grows is one long look.
+                [ "$round" -eq 1 ] || continue
+                [ "$seconds" = 0.1 ] || [[ $row != *0000000/* ]] || continue
+                ;;
+        esac
+        for subject in "${layered[@]}"; do
+            name=$subject
+            [ -z "${preload[$subject]+set}" ] || name=heap
+            printf -v output '%s/layer/%02d.%s.%d.json' "$results" "$number" "$subject" "$round"
+            LD_PRELOAD=${preload[$subject]:-} build/bench/bench/LayerBench --subject="$name" \
+                --benchmark_filter="^$row\$" --benchmark_min_time="$seconds" \
+                --benchmark_out_format=json --benchmark_out="$output" >/dev/null 2>"$results/log" ||
+                { cat "$results/log" >&2 && exit 1; }
+        done
+    done
+done
+
+# The clients, each with pools and with the C library's malloc: the seconds that it tells of itself.
+works=("Ast --definitions 50000")
+if [[ " ${hosts[*]} " == *" LuaHost "* ]]; then
+    for script in objects trees strings; do works+=("LuaHost examples/lua/$script.lua"); done
+fi
+if [[ " ${hosts[*]} " == *" SqliteHost "* ]]; then works+=("SqliteHost examples/sql/orders.sql"); fi
+for ((round = 1; round <= 2 * rounds; ++round)); do
+    step "Clients, round $round of $((2 * rounds))"
+    for work in "${works[@]}"; do
+        read -r host arguments <<<"$work"
+        # shellcheck disable=SC2086  # The arguments are words.
+        for mode in "" --heap; do
+            figures=$(build/bench/examples/"$host" $mode $arguments 2>&1 >/dev/null)
+            echo "$round	$work	${mode:---pools}	${figures##*: }" >>"$results/clients"
+        done
+    done
+done
+
 step "Resident bytes a block"
 for subject in pool "${peers[@]}"; do
     name=$subject
@@ -87,4 +143,5 @@ step "Report"
 mkdir -p docs
 python3 scripts/bench-report.py "$results" docs/performance.md
 gnuplot -e "data='$results/ratios.dat'; output='docs/performance.svg'" scripts/bench-plot.gp
-echo "docs/performance.md and docs/performance.svg are written."
+gnuplot -e "data='$results/growth.dat'; output='docs/growth.svg'" scripts/bench-growth.gp
+echo "docs/performance.md, docs/performance.svg and docs/growth.svg are written."
