@@ -1,21 +1,32 @@
-# What an install consists of: the shared library with its links, its headers, and the packages by
-# which CMake (ObrMemPool) and pkg-config (ObrMemPool.pc) find them. An install may be moved: the
-# packages find the rest from where they lie themselves. The library depends on nothing that its
-# users would have to find, not even with a host layer, which it links privately.
+# What an install consists of: the shared library with its links, the archive, the headers, and the
+# packages by which CMake (ObrMemPool) and pkg-config (ObrMemPool.pc) find them. An install may be
+# moved: the packages find the rest from where they lie themselves. The library depends on nothing
+# that its users would have to find, not even with a host layer, which it links privately; only the
+# archive leaves such a layer to them.
 
 include(CMakePackageConfigHelpers)
 
-install(TARGETS MemPool EXPORT ObrMemPool)
+set(libraries MemPool)
+if(TARGET MemPoolStatic)
+    list(APPEND libraries MemPoolStatic)
+endif()
+install(TARGETS ${libraries} EXPORT ObrMemPool)
 install(FILES ${PROJECT_SOURCE_DIR}/include/MemPool ${PROJECT_SOURCE_DIR}/include/MemPoolHeap
     DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})
 
 set(packageDir ${CMAKE_INSTALL_LIBDIR}/cmake/ObrMemPool)
 install(EXPORT ObrMemPool
     NAMESPACE MemPool::
-    FILE ObrMemPoolConfig.cmake
+    FILE ObrMemPoolTargets.cmake
     DESTINATION ${packageDir})
+configure_package_config_file(${CMAKE_CURRENT_LIST_DIR}/ObrMemPoolConfig.cmake.in
+    ObrMemPoolConfig.cmake
+    INSTALL_DESTINATION ${packageDir}
+    NO_SET_AND_CHECK_MACRO)
 write_basic_package_version_file(ObrMemPoolConfigVersion.cmake COMPATIBILITY SameMajorVersion)
-install(FILES ${CMAKE_CURRENT_BINARY_DIR}/ObrMemPoolConfigVersion.cmake
+install(FILES
+    ${CMAKE_CURRENT_BINARY_DIR}/ObrMemPoolConfig.cmake
+    ${CMAKE_CURRENT_BINARY_DIR}/ObrMemPoolConfigVersion.cmake
     DESTINATION ${packageDir})
 
 # A folder below the prefix is told from the prefix, one elsewhere by its whole path.

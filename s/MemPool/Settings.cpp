@@ -1,24 +1,10 @@
-// The values of the settings and the exported accessors, which store what they are given.
+// The exported accessors of the settings, which store what they are given.
 
 #include "MemPool/Settings.hpp"
 
 #include <MemPool>
 
 namespace OBR::MemPool {
-
-namespace Settings {
-
-// The widest bounds. The start-up stores the defaults, which EnvInit.cpp tells, before anything
-// reads these, but leaves the trace alone.
-std::uint32_t bucketSize = 0xFFFF;
-std::uint16_t dataAlignment = 1;
-std::uint32_t maxRecordSize = largestMaxRecordSize;
-std::uint32_t minRecordSize = smallestMinRecordSize;
-bool keepEmptyBuckets;
-bool off;
-bool trace = false;
-
-}  // namespace Settings
 
 unsigned int NUV_OBR_MEMPOOL_BUCKET_SIZE() {
     return Settings::bucketSize;

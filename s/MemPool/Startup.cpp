@@ -1,24 +1,53 @@
-// What happens when the library is loaded and unloaded, in this order: the registry is constructed
-// empty, its exit step stands ready, the settings start up (which may throw). On the way out the
-// exit step releases the registry's own nodes and nothing else.
+// The data of the process, which all pools share, and what happens to it when the library is loaded
+// and unloaded, in this order: the registry is constructed empty, its exit step stands ready, the
+// settings start up (which may throw). On the way out the exit step releases the registry's own
+// nodes and nothing else.
+//
+// A program can hold the library as an archive. No static of the host's is constructed ahead of
+// these objects then, and since the data is defined here, each operation of the library brings this
+// file into the program.
 
-#include <iostream>  // Ahead of the objects below: its streams work while they are constructed.
+#include <ios>
 
 #include "MemPool/EnvInit.hpp"
 #include "MemPool/MgrRegistry.hpp"
+#include "MemPool/Settings.hpp"
+
+// Ahead of all objects of the program that name no priority of their own.
+#define OBR_FIRST __attribute__((init_priority(101)))
 
 namespace OBR::MemPool {
 
-MgrRegistry registry;
+namespace Settings {
+
+// The widest bounds. The start-up stores the defaults, which EnvInit.cpp tells, before anything
+// reads these, but leaves the trace alone.
+std::uint32_t bucketSize = 0xFFFF;
+std::uint16_t dataAlignment = 1;
+std::uint32_t maxRecordSize = largestMaxRecordSize;
+std::uint32_t minRecordSize = smallestMinRecordSize;
+bool keepEmptyBuckets;
+bool off;
+bool trace = false;
+
+}  // namespace Settings
+
+namespace {
+
+OBR_FIRST const std::ios_base::Init streams;  // The start-up writes.
+
+}  // namespace
+
+OBR_FIRST MgrRegistry registry;
 
 namespace {
 
 struct ExitStep {
     ~ExitStep() { registry.ReleaseNodes(); }
 };
-const ExitStep exitStep;
+OBR_FIRST const ExitStep exitStep;
 
-const EnvInit envInit;
+OBR_FIRST const EnvInit envInit;
 
 }  // namespace
 
