@@ -83,14 +83,18 @@ TEST(Load, APoolAliveAtUnloadIsLeftAloneInSilence) {
                 MatchesRegex(builtOwn + built + destroyed + "unloaded\nexit\n"));
 }
 
-// The third handle has left its own pool, which nothing destroys, for the second one's.
+// The third handle has left its own pool, which nothing destroys, for the first one's, and the
+// first handle has moved on to the second one's. What looks like a handle where the first one stood
+// is nobody's.
 TEST(Load, PoolsOutliveTheExitStep) {
     const auto run = [] {
         LoadBehind([] {
             plugin->showPools("first");
             plugin->destroy(&first);
-            plugin->destroy(&second);
+            first = third;
             plugin->destroy(&third);
+            std::puts(first.handle != nullptr ? "left alone" : "touched");
+            plugin->destroy(&second);
             plugin->build(&third, "first");
             plugin->showPools("first");
             plugin->destroy(&third);
@@ -98,7 +102,8 @@ TEST(Load, PoolsOutliveTheExitStep) {
         });
         plugin->build(&second, "second");
         plugin->build(&third, "third");
-        plugin->share(&third, &second);
+        plugin->share(&third, &first);
+        plugin->share(&first, &second);
         plugin->showPools("first");
         std::exit(0);
     };
@@ -106,7 +111,7 @@ TEST(Load, PoolsOutliveTheExitStep) {
     EXPECT_EXIT(run(), ExitedWithCode(0),
                 MatchesRegex(builtOwn + built + built + built +
                              "4 pools, 4 and 4 handles, with 'first'\n" + destroyed +  //
-                             none + destroyed + destroyed + built +                    //
+                             none + destroyed + destroyed + "left alone\n" + built +   //
                              "1 pools, 1 and 1 handles, with 'first'\n" + destroyed + none));
 }
 

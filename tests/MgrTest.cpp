@@ -140,6 +140,8 @@ TEST_F(MgrTest, ARefusedPoolLeavesNothingButAGapInTheNumbers) {
 
     EXPECT_TRUE(HeapSpy::FailsAt(0, [&] { *mgr = other; }));
     EXPECT_NE(mgr->GetBucketMgr(), other.GetBucketMgr());
+    const Mgr& same = other;
+    EXPECT_FALSE(HeapSpy::FailsAt(0, [&] { other = same; }));
     EXPECT_TRUE(registry.Sharers().empty());
 }
 
@@ -183,12 +185,7 @@ public:
             if (pool.maker == &*at.handle) { pool.maker = nullptr; }
         }
         at.handle.reset();
-        if (at.pool == nullptr) { return; }
-        Pool* const ended = at.pool;
-        ended->address = nullptr;
-        for (Place& other : places) {
-            if (other.pool == ended) { other.pool = nullptr; }
-        }
+        at.pool->address = nullptr;
     }
 
     void Check() const {
@@ -209,8 +206,7 @@ public:
         EXPECT_EQ(All(), expected);
         EXPECT_LE(registry.Sharers().size(), numPlaces);
         for (const Place& at : places) {
-            if (!at.handle) { continue; }
-            EXPECT_EQ(at.handle->GetBucketMgr(), at.pool == nullptr ? nullptr : at.pool->address);
+            if (at.handle) { EXPECT_EQ(at.handle->GetBucketMgr(), at.pool->address); }
         }
     }
 

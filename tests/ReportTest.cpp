@@ -14,7 +14,6 @@
 #include <iostream>
 #include <iterator>
 #include <limits>
-#include <locale>
 #include <map>
 #include <memory>
 #include <sstream>
@@ -29,6 +28,7 @@
 #include "MemPool/BucketMgr.hpp"
 #include "MemPool/MgrRegistry.hpp"
 #include "Output.hpp"
+#include "diagnostics/reports/Walks.hpp"
 #include "diagnostics/text/Messages.hpp"
 #include "diagnostics/text/Text.hpp"
 
@@ -55,13 +55,12 @@ using Blocks = std::vector<std::pair<const void*, std::size_t>>;  // Addresses a
 // All memory of a pool but its table of groups.
 void AddBlocks(Blocks& blocks, const BucketMgr& pool) {
     blocks.push_back({&pool, sizeof pool});
-    for (std::uint32_t index = 0; index < pool.numGroups; ++index) {
-        if (pool.groups[index] == nullptr) { continue; }
-        blocks.push_back({pool.groups[index], sizeof(Group)});
-        for (const Bucket* at = pool.groups[index]->head; at != nullptr; at = at->next1) {
-            blocks.push_back({at, Bucket::baseDistance + at->size});
-        }
-    }
+    ForEachGroup(pool, [&](std::uint32_t, const Group& group) {
+        blocks.push_back({&group, sizeof group});
+        ForEachBucket(group, [&](const Bucket& bucket) {
+            blocks.push_back({&bucket, Bucket::baseDistance + bucket.size});
+        });
+    });
     for (const ExtRec* extRec = pool.extRecs; extRec != nullptr; extRec = extRec->next) {
         blocks.push_back({extRec, sizeof *extRec + extRec->length});
     }
@@ -142,15 +141,9 @@ TEST_F(Report, OfAPool) {
     // A group that lost its buckets still shows its data size.
     Mgr lost("lost");
     void* const only = lost.Alloc(20);
-    void* const first = lost.Alloc(8);
+    lost.Alloc(8);
     lost.Free(only);
     text += Plain(lost);
-
-    // A bucket without a record size.
-    Bucket& bucket = *lost.GetBucketMgr()->FindBucket(first);
-    const std::uint16_t recSize = std::exchange(bucket.recSize, std::uint16_t{0});
-    text += Plain(lost);
-    bucket.recSize = recSize;
 
     // Several groups; full, partly used and empty buckets; heap records.
     Use(100, 96, true);
@@ -180,6 +173,9 @@ TEST_F(Report, HoldsEveryLineInItsPlace) {
     Mgr demo("demo");
     Alloc(demo, 10, 3);
     demo.Alloc(2000);
+    Use(50, 40);  // From now on the settings of the process are others than the pool's.
+    Settings::minRecordSize = Settings::dataAlignment = 16;
+    Settings::off = true;
     std::string text = Plain(demo);
 
     Use(4010, 1000, true);
@@ -204,31 +200,18 @@ TEST_F(Report, ShowsItsSectionsOneByOne) {
     Use(50, 40);
     Mgr pool("sections");
     pool.Alloc(12);
+    const char* const expected[] = {"", "B", "", "BR", "", "BF", "", "BRF"};
     for (const unsigned int flags : {0U, 1U, 2U, 3U, 4U, 5U, 6U, 7U}) {
-        const bool showBuckets = (flags & 1U) != 0;
-        const bool showRecords = (flags & 2U) != 0;
-        const bool showFreeList = (flags & 4U) != 0;
         const std::string text = Printed([&] {
-            pool.GetBucketMgr()->DbgReport(std::cout, 0, showBuckets, showRecords, showFreeList);
+            pool.GetBucketMgr()->DbgReport(std::cout, 0, (flags & 1U) != 0, (flags & 2U) != 0,
+                                           (flags & 4U) != 0);
         });
-        const auto shows = [&](const char* part) { return text.find(part) != std::string::npos; };
-        EXPECT_EQ(shows("   MemPool::Bucket #001\n"), showBuckets);
-        EXPECT_EQ(shows(" #001 ALL RECORDS ("), showBuckets && showRecords);
-        EXPECT_EQ(shows(" #001 FREE LIST ("), showBuckets && showFreeList);
-    }
-}
-
-TEST_F(Report, ShowsThePoolsOwnSettings) {
-    Use(70000, 998);
-    Settings::minRecordSize = 9;
-    const Mgr pool("settings");
-    Use(50, 40);
-    Settings::dataAlignment = 8;
-    const std::string text = Plain(pool);
-    for (const char* line :
-         {"Bucket Size :            65535\n", "Min Rec Sz  :               12\n",
-          "Max Rec Sz  :              996\n", "Data Align  :                4\n"}) {
-        EXPECT_NE(text.find(line), std::string::npos) << line;
+        std::string shown;
+        for (const char* part :
+             {"B   MemPool::Bucket #001\n", "R #001 ALL RECORDS (", "F #001 FREE LIST ("}) {
+            if (text.find(part + 1) != std::string::npos) { shown += part[0]; }
+        }
+        EXPECT_EQ(shown, expected[flags]);
     }
 }
 
@@ -246,48 +229,18 @@ TEST_F(Report, WritesNumbersWiderThanTheirColumnsWhole) {
     text += Plain(pool);
     bucket.recSize = 16;
     ExpectText("wide", text);
-
-    SizeCounts many;
-    for (std::uint32_t size = 1; size <= 100000; ++size) { many[size] = 1; }
-    const std::string rows = Printed([&] { pool.GetBucketMgr()->DbgUsedData(std::cout, 0, many); });
-    EXPECT_EQ(rows.substr(rows.rfind('\n', rows.size() - 2)), "\n100000  100000         1 **\n");
 }
 
-// A handle that was assigned to shows the pool that it has now, under each pool that it made; a
-// pool that has lost its handle is not shown.
 TEST_F(Report, OfAllPoolsIsInTheOrderOfTheirNames) {
     EXPECT_EQ(Printed(Dbg), "");
     Use(50, 40);
     Mgr a("a");
-    Mgr unnamed("");
+    const Mgr unnamed("");
     const Mgr capital("Z");
     Alloc(a, 12, 1);
-    const auto library = [&] {
-        Blocks blocks;
-        for (const auto& entry : registry.All()) { AddBlocks(blocks, *entry.second); }
-        return Stable(Printed(Dbg) + Printed(DbgDetailed), blocks);
-    };
-
-    auto assigned = std::make_unique<Mgr>("orphan");
-    BucketMgr* const orphan = assigned->GetBucketMgr();
-    *assigned = unnamed;
-    const std::string text = library();
-    assigned.reset();
-    ExpectText("library", text + library());
-
-    // Nor is a pool whose handle has moved on to one that is gone.
-    const std::string before = library();
-    Mgr stranded("stranded");
-    BucketMgr* const left = stranded.GetBucketMgr();
-    {
-        const Mgr gone("gone");
-        stranded = gone;
-    }
-    EXPECT_EQ(library(), before);
-    for (BucketMgr* const pool : {orphan, left}) {
-        registry.Erase(pool->name);
-        delete pool;
-    }
+    Blocks blocks;
+    for (const auto& entry : registry.All()) { AddBlocks(blocks, *entry.second); }
+    ExpectText("library", Stable(Printed(Dbg) + Printed(DbgDetailed), blocks));
 }
 
 TEST_F(Report, DrawsBarsByTheirFrequency) {
@@ -314,18 +267,7 @@ TEST_F(Report, DrawsTheRecordsOfABucketAsAMap) {
         pool.Free(blocks.back());
         return Printed([&] { bucket->DbgRecordMap(std::cout); });
     };
-    const std::string text = map(1, 0) + map(7, 7) + map(8, 4) + map(9, 0) + map(16, 9);
-
-    // Row labels of four and of five columns.
-    Use(65535, 8);
-    Settings::dataAlignment = 1;
-    Settings::minRecordSize = 5;
-    Mgr pool("longest");
-    pool.Alloc(1);
-    std::string longest =
-        Printed([&] { pool.GetBucketMgr()->GetBucket(0)->DbgRecordMap(std::cout); });
-    longest.erase(longest.find("\n10008 |") + 1);
-    ExpectText("maps", text + longest.substr(longest.find("\n9992 |") + 1));
+    ExpectText("maps", map(1, 0) + map(7, 7) + map(8, 4) + map(9, 0) + map(16, 9));
 }
 
 // What the host has set counts until a report sets it, and what a report sets stays. The numbers
@@ -339,7 +281,6 @@ TEST_F(Report, TakesTheStreamAsItIsWhereItSetsNothing) {
     const std::function<void()> reports[] = {
         [&] { pool.Dbg(); },
         [&] { bucket.DbgBucket(std::cout, 1, 0, true, true); },
-        [&] { bucket.DbgRecordMap(std::cout); },
     };
     std::string text;
     for (const auto& report : reports) {
@@ -397,10 +338,8 @@ const struct {
     {"a link to a used record", [](Bucket& bucket) { bucket.RecordAt(34)->Format(2); }, used},
     {"a link behind the end", [](Bucket& bucket) { bucket.RecordAt(34)->Format(50); }, unknown},
     {"a link between records", [](Bucket& bucket) { bucket.RecordAt(34)->Format(19); }, unknown},
-    {"a link ahead of them", [](Bucket& bucket) { bucket.RecordAt(34)->Format(1); }, unknown},
     {"a head behind the end", [](Bucket& bucket) { bucket.freeHead = 65522; }, unknown},
     {"a list cut short", [](Bucket& bucket) { bucket.freeHead = 0; }, ""},
-    {"a head between records", [](Bucket& bucket) { bucket.freeHead = 17; }, unknown},
     {"a head a whole record ahead of them",
      [](Bucket& bucket) {
          bucket.size = 47;
@@ -479,24 +418,18 @@ TEST_F(Report, ABuildWithChecksLooksAtEachBucketTouched) {
             Mgr pool("checked");
             void* const block = Alloc(pool, 12, 2)[0];
             pool.GetBucketMgr()->FindBucket(block)->RecordAt(2 + 3 * 16)->type = 7;
-            if (frees) { pool.Free(block); }
-            if (!frees) { pool.Alloc(12); }
+            frees ? void(pool.Free(block)) : void(pool.Alloc(12));
             std::_Exit(0);
         };
         EXPECT_EXIT(run(), ExitedWithCode(fault.empty() ? 0 : 1), Eq(fault));
     }
 }
 
-TEST(ReportText, HasOneFormForAddressesAndKinds) {
-    const std::locale before = std::locale::global(groupingLocale);
-    EXPECT_EQ(PtrText(reinterpret_cast<void*>(0x123456789)), "0x0000000123456789");
-    std::locale::global(before);
-    EXPECT_EQ(BareHex(reinterpret_cast<void*>(0xABCDEF)), "0000000000abcdef");
+TEST(ReportText, HasOneFormForAddresses) {
+    const auto* const address = reinterpret_cast<const void*>(0x123456789ABCDEF0);
+    EXPECT_EQ(PtrText(address), "0x123456789abcdef0");
+    EXPECT_EQ(BareHex(address), "123456789abcdef0");
     EXPECT_EQ(BareHex(nullptr), "000000000000000000");
-    const char* const kinds[] = {"FREE", "USED", "EXT", "UNKN"};
-    for (const int type : {0, 1, 2, 3}) {
-        EXPECT_STREQ(RecKindName(static_cast<std::uint8_t>(type)), kinds[type]);
-    }
 }
 
 }  // namespace

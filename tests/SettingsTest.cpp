@@ -4,6 +4,8 @@
 
 #include <MemPool>
 #include <csignal>
+#include <cstdio>
+#include <fstream>
 #include <iostream>
 #include <map>
 #include <new>
@@ -16,6 +18,7 @@
 #include "Child.hpp"
 #include "HostLayer/HostEnv.hpp"
 #include "MemPool/EnvInit.hpp"
+#include "Output.hpp"
 
 using namespace OBR::MemPool;
 
@@ -59,70 +62,83 @@ constexpr const char* keepEmptyBuckets = "NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS";
 constexpr const char* info = "NUV_OBR_MEMPOOL_INFO";
 
 // `values` are those of the lines from the bucket size on.
-std::string Banner(const std::vector<std::string>& values) {
-    std::vector<std::string> lines = {
-        std::string(48, '='),
-        "NUV_OBR_MEMPOOL_INFO",
-        std::string(48, '='),
-        "Version            : $Id: MemPool,v 1.2.52.4 2009/08/10 21:28:15 qvw Exp $",
-        "Bucket Size        : " + values[0],
-        "Data Alignment     : " + values[1],
-        "Keep Empty Buckets : " + values[2],
-        "Max Record Size    : " + values[3],
-        "Min Record Size    : " + values[4],
-        "Trace              : " + values[5],
-        "Use Heap           : " + values[6],
-    };
-    std::string text;
-    int number = 3259;
-    for (const std::string& line : lines) {
-        text += "INFO:../s/MemPool: " + std::to_string(number++) + ": # " + line + "\n";
-    }
+template <typename... Values>
+std::string Banner(Values... values) {
+    char text[1000];
+    std::snprintf(text, sizeof text,
+                  R"(INFO:../s/MemPool: 3259: # ================================================
+INFO:../s/MemPool: 3260: # NUV_OBR_MEMPOOL_INFO
+INFO:../s/MemPool: 3261: # ================================================
+INFO:../s/MemPool: 3262: # Version            : $Id: MemPool,v 1.2.52.4 2009/08/10 21:28:15 qvw Exp $
+INFO:../s/MemPool: 3263: # Bucket Size        : %d
+INFO:../s/MemPool: 3264: # Data Alignment     : %d
+INFO:../s/MemPool: 3265: # Keep Empty Buckets : %d
+INFO:../s/MemPool: 3266: # Max Record Size    : %d
+INFO:../s/MemPool: 3267: # Min Record Size    : %d
+INFO:../s/MemPool: 3268: # Trace              : %d
+INFO:../s/MemPool: 3269: # Use Heap           : %d
+)",
+                  values...);
     return text;
 }
+
+// The variables in the README's table, and their defaults, 0 where one is told in words.
+struct Readme {
+    std::vector<std::string> variables;
+    std::map<std::string, unsigned int> defaults;
+
+    Readme() {
+        std::ifstream file(README);
+        for (std::string line; std::getline(file, line);) {
+            char name[64] = "NUV_";
+            unsigned int byDefault = 0;
+            if (std::sscanf(line.c_str(), "| `NUV_%50[^`]` | %u", name + 4, &byDefault) < 1) {
+                continue;
+            }
+            variables.push_back(name);
+            defaults[name] = byDefault;
+        }
+    }
+};
 
 // Starts the settings up once more, under these values. Returns what stands on standard output and
 // the settings that are other than at their defaults, or the refusal.
 std::string StartUp(const Values& values) {
     Environment() = values;
     Asked().clear();
-    NUV_OBR_MEMPOOL_TRACE(false);
-    std::ostringstream text, errors;
-    std::streambuf* const output = std::cout.rdbuf(text.rdbuf());
+    Output output;
+    std::ostringstream errors;
     std::streambuf* const errorOutput = std::cerr.rdbuf(errors.rdbuf());
+    const std::locale locale = std::locale::global(groupingLocale);
+    std::cout << std::boolalpha;
     const char* refusal = nullptr;
     try {
         EnvInit();
     } catch (const char* thrown) { refusal = thrown; }
-    std::cout.rdbuf(output);
+    std::locale::global(locale);
     std::cerr.rdbuf(errorOutput);
     EXPECT_EQ(errors.str(), refusal == nullptr ? "" : refusal + std::string("\n"));
-    if (refusal != nullptr) { return text.str() + refusal; }
+    std::string text = output.Take();
+    if (refusal != nullptr) { return text + refusal; }
 
-    const auto show = [&text](const char* name, unsigned int value, unsigned int byDefault) {
-        if (value != byDefault) { text << " " << name << "=" << value; }
+    static Readme readme;
+    const auto show = [&text](const char* key, unsigned int value, const char* variable) {
+        if (value == readme.defaults[variable]) { return; }
+        text += std::string(" ") + key + "=" + std::to_string(value);
     };
-    show("on", NUV_OBR_MEMPOOL_ON(), 0);
-    show("trace", NUV_OBR_MEMPOOL_TRACE(), 0);
-    show("bucket", NUV_OBR_MEMPOOL_BUCKET_SIZE(), 4010);
-    show("max", NUV_OBR_MEMPOOL_MAX_RECORD_SIZE(), 1000);
-    show("min", NUV_OBR_MEMPOOL_MIN_RECORD_SIZE(), 8);
-    show("alignment", NUV_OBR_MEMPOOL_DATA_ALIGNMENT(), 4);
-    show("keep", NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS(), 0);
-    return text.str();
+    show("on", NUV_OBR_MEMPOOL_ON(), on);
+    show("trace", NUV_OBR_MEMPOOL_TRACE(), trace);
+    show("bucket", NUV_OBR_MEMPOOL_BUCKET_SIZE(), bucketSize);
+    show("max", NUV_OBR_MEMPOOL_MAX_RECORD_SIZE(), maxRecordSize);
+    show("min", NUV_OBR_MEMPOOL_MIN_RECORD_SIZE(), minRecordSize);
+    show("alignment", NUV_OBR_MEMPOOL_DATA_ALIGNMENT(), dataAlignment);
+    show("keep", NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS(), keepEmptyBuckets);
+    return text;
 }
 
 // At load, and with the second variable only asked for where the first one leaves the pools off.
-TEST(Settings, TheStartUpFindsTheRegistryReadyAndAsksInOrder) {
-    std::vector<std::string> order = {on,
-                                      shortOn,
-                                      trace,
-                                      bucketSize,
-                                      maxRecordSize,
-                                      minRecordSize,
-                                      dataAlignment,
-                                      keepEmptyBuckets,
-                                      info};
+TEST(Settings, TheStartUpFindsTheRegistryReadyAndAsksAsTheReadmeTells) {
+    std::vector<std::string> order = Readme().variables;
     EXPECT_EQ(Asked(), order);
     EXPECT_EQ(GetNumMgrs(), 1u);
     EXPECT_EQ(GetMgr("early"), earlyPool);
@@ -132,11 +148,14 @@ TEST(Settings, TheStartUpFindsTheRegistryReadyAndAsksInOrder) {
     EXPECT_EQ(Asked(), order);
 }
 
-const std::string refusal =
-    "EXCEPTION:../s/MemPool:3337: MIN_RECORD_SIZE >= MAX_RECORD_SIZE (1000>=1000)";
+const auto defaults = Banner(4010, 4, 0, 1000, 8, 0, 1);
 
+std::string Refusal(const std::string& sizes) {
+    return "EXCEPTION:../s/MemPool:3337: MIN_RECORD_SIZE >= MAX_RECORD_SIZE (" + sizes + ")";
+}
+
+// Each row finds what the one before has left, and what is not stored anew would show.
 TEST(Settings, EachEnvironmentLeavesItsSettings) {
-    const auto defaults = Banner({"4010", "4", "0", "1000", "8", "0", "1"});
     const struct {
         Values environment;
         std::string expected;
@@ -145,14 +164,13 @@ TEST(Settings, EachEnvironmentLeavesItsSettings) {
         {{{on, "0"}, {shortOn, "1"}}, " on=1"},
         {{{on, "-1"}, {shortOn, "-1"}}, ""},
         {{{on, "yes"}}, ""},
-        {{{trace, "1"}}, " trace=1"},
-        {{{trace, "-1"}}, ""},
         {{{bucketSize, "-1"}}, ""},
         {{{bucketSize, "0"}}, " bucket=0"},
         {{{bucketSize, ""}}, " bucket=0"},
         {{{bucketSize, " +8000 bytes"}}, " bucket=8000"},
         {{{maxRecordSize, "32767"}}, " max=32767"},
         {{{maxRecordSize, "32768"}}, ""},
+        {{{maxRecordSize, "010"}}, " max=10"},
         {{{maxRecordSize, "-1"}}, ""},
         {{{minRecordSize, "4"}}, " min=4"},
         {{{minRecordSize, "3"}}, ""},
@@ -161,57 +179,49 @@ TEST(Settings, EachEnvironmentLeavesItsSettings) {
         {{{dataAlignment, "0"}}, " alignment=1"},
         {{{dataAlignment, "-3"}}, " alignment=1"},
         {{{dataAlignment, "65536"}}, " alignment=0"},
-        {{{keepEmptyBuckets, "1"}}, " keep=1"},
         {{{keepEmptyBuckets, "-1"}}, ""},
+        {{{keepEmptyBuckets, "0"}}, ""},
+        {{{keepEmptyBuckets, "1"}}, " keep=1"},
         {{{info, "-1"}}, ""},
-        {{{info, "0"}}, defaults},
         {{{info, "please"}}, defaults},
-        {{{minRecordSize, "1000"}, {info, "1"}},
-         Banner({"4010", "4", "0", "1000", "1000", "0", "1"}) + refusal},
-        {{{minRecordSize, "-1"}},
-         "EXCEPTION:../s/MemPool:3337: MIN_RECORD_SIZE >= MAX_RECORD_SIZE (4294967295>=1000)"},
+        {{{minRecordSize, "1000"}, {info, "0"}},
+         Banner(4010, 4, 0, 1000, 1000, 0, 1) + Refusal("1000>=1000")},
+        {{{minRecordSize, "-1"}}, Refusal("4294967295>=1000")},
+        {{{maxRecordSize, "3"}}, Refusal("8>=3")},
+        {{{maxRecordSize, "0"}}, Refusal("8>=0")},
+        {{{trace, "-1"}}, ""},
+        {{{trace, "1"}}, " trace=1"},
+        {{{trace, "0"}}, " trace=1"},  // The one setting that no start-up switches off.
     };
     for (const auto& row : rows) { EXPECT_EQ(StartUp(row.environment), row.expected); }
-}
-
-TEST(Settings, TheStartUpStoresEveryDefaultButTheTrace) {
-    StartUp({{on, "1"},
-             {keepEmptyBuckets, "1"},
-             {bucketSize, "9"},
-             {minRecordSize, "7"},
-             {maxRecordSize, "99"},
-             {dataAlignment, "8"}});
-    EXPECT_EQ(StartUp({}), "");
-    NUV_OBR_MEMPOOL_TRACE(true);
-    Environment() = {{trace, "0"}};
-    EnvInit();
-    EXPECT_TRUE(NUV_OBR_MEMPOOL_TRACE());
     NUV_OBR_MEMPOOL_TRACE(false);
 }
 
 // Standard output works at that time, though the host itself does not make it ready.
 TEST(Settings, TheLoadShowsTheBannerAheadOfTheHost) {
-    EXPECT_EXIT(Child::Run(Child::Captured::out,
-                           {{info, "1"},
-                            {on, "1"},
-                            {trace, "1"},
-                            {bucketSize, "70000"},
-                            {maxRecordSize, "1500"},
-                            {minRecordSize, "20"},
-                            {dataAlignment, "16"},
-                            {keepEmptyBuckets, "1"}},
-                           HOST),
+    const auto load = [](const Child::Environment& environment) {
+        Child::Run(Child::Captured::out, environment, HOST);
+    };
+    EXPECT_EXIT(load({{info, ""}}), testing::ExitedWithCode(0), testing::Eq(defaults + "off\n"));
+    EXPECT_EXIT(load({{info, "1"},
+                      {on, "1"},
+                      {trace, "1"},
+                      {bucketSize, "70000"},
+                      {maxRecordSize, "1500"},
+                      {minRecordSize, "20"},
+                      {dataAlignment, "16"},
+                      {keepEmptyBuckets, "1"}}),
                 testing::ExitedWithCode(0),
-                testing::Eq(Banner({"70000", "16", "1", "1500", "20", "1", "0"}) + "on\n"));
+                testing::Eq(Banner(70000, 16, 1, 1500, 20, 1, 0) + "on\n"));
 }
 
 // The host's own code never runs. The last line is that of the standard library about an exception
 // that nothing catches.
 TEST(Settings, RecordSizesThatCannotWorkEndTheLoad) {
-    EXPECT_EXIT(
-        Child::Run(Child::Captured::both, {{minRecordSize, "1000"}}, HOST),
-        testing::KilledBySignal(SIGABRT),
-        testing::Eq(refusal + "\nterminate called after throwing an instance of 'char const*'\n"));
+    EXPECT_EXIT(Child::Run(Child::Captured::both, {{minRecordSize, "1000"}}, HOST),
+                testing::KilledBySignal(SIGABRT),
+                testing::Eq(Refusal("1000>=1000") +
+                            "\nterminate called after throwing an instance of 'char const*'\n"));
 }
 
 TEST(Settings, AccessorsStoreWhatTheyAreGiven) {

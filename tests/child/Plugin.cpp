@@ -23,7 +23,7 @@ void Build(void* place, const char* name) {
 }
 
 void Share(void* left, const void* right) {
-    abandoned = static_cast<Mgr*>(left)->GetBucketMgr();
+    if (abandoned == nullptr) { abandoned = static_cast<Mgr*>(left)->GetBucketMgr(); }
     *static_cast<Mgr*>(left) = *static_cast<const Mgr*>(right);
 }
 
