@@ -1,25 +1,16 @@
-// A Heap from within, on a heap that is watched: blocks, the calls of C, figures and settings.
+// A Heap on a heap below that is watched: its blocks, the calls of C, its figures and its settings.
 
 #include <MemPoolHeap>
 
-#include <fcntl.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <algorithm>
-#include <cstdint>
 #include <cstring>
-#include <iterator>
-#include <map>
-#include <memory>
+#include <optional>
 #include <random>
 #include <sstream>
-#include <string>
 #include <tuple>
 
-#include <gtest/gtest.h>
-
-#include "HeapSpy.hpp"
 #include "PoolFixture.hpp"
 
 namespace OBR::MemPool {
@@ -30,127 +21,103 @@ struct WalkSettings {
     std::uint32_t bucketSize;
     std::uint16_t alignment;
     std::uint32_t maximum, minimum;
-    bool keepEmptyBuckets;
-    bool on;
+    bool keepEmptyBuckets, on;
 };
 
 // The walk's heap has the settings of the process. Live blocks are filled as far as they may be.
 class HeapWalkTest : public PoolFixture, public testing::WithParamInterface<WalkSettings> {
 protected:
     struct Block {
-        std::size_t size, alignment, usable;
+        std::uint32_t size, alignment;
+        std::size_t usable;
         std::uint8_t fill;
     };
     using Live = std::map<std::uint8_t*, Block>;
 
     std::uint32_t Below(std::size_t n) { return static_cast<std::uint32_t>(random() % n); }
-    std::size_t Size() {
-        const std::size_t sizes[] = {Below(40), Below(GetParam().maximum + 20),
-                                     Below(3 * GetParam().maximum)};
-        return sizes[Below(3)];
-    }
 
-    // Runs `request` for a block that replaces `old`, if given. It may be refused, and then gives
-    // null, or throws if it is C++'s, and changes nothing.
+    // Runs `request`, for a block that takes the place of `old` if that is one.
     template <typename Request>
-    void Take(std::size_t size, std::size_t alignment, Live::iterator old, Request request) {
-        const Block before = old == live.end() ? Block{} : old->second;
-        HeapSpy::refuseIn = Below(6) == 0 ? 1 + Below(2) : 0;
-        const std::size_t armed = HeapSpy::refuseIn;
-        auto* const data = static_cast<std::uint8_t*>(request());
-        const bool refused = armed != 0 && HeapSpy::refuseIn == 0;
-        HeapSpy::refuseIn = 0;
-        ASSERT_EQ(data == nullptr, refused);
-        if (refused) { return; }
+    void Take(std::uint32_t size, std::uint32_t alignment, Live::iterator old, Request request) {
+        std::uint8_t* data = nullptr;
+        const auto take = [&] {
+            data = static_cast<std::uint8_t*>(request());
+            if (data == nullptr) { throw std::bad_alloc(); }
+        };
+        if (HeapSpy::FailsAt(Below(6) == 0 ? Below(2) : SIZE_MAX - 1, take)) { return; }
+        Block block{size, alignment, heap->UsableSize(data), static_cast<std::uint8_t>(Below(256))};
         if (old != live.end()) {
-            EXPECT_EQ(data == old->first, size <= before.usable);
-            const std::size_t kept = std::min(size, before.usable);
-            EXPECT_EQ(std::count(data, data + kept, before.fill), kept);
-            if (data == old->first) { size = std::max(size, before.size); }
+            const Block& was = old->second;
+            const auto kept = std::min<std::size_t>(size, was.usable);
+            EXPECT_EQ(std::count(data, data + kept, was.fill), kept);
+            EXPECT_EQ(data == old->first, size <= was.usable);
+            if (data == old->first) {
+                std::tie(block.size, block.alignment) = std::tie(was.size, was.alignment);
+            }
             live.erase(old);
         }
-        const Block block{size, alignment, heap->UsableSize(data),
-                          static_cast<std::uint8_t>(Below(256))};
         ASSERT_GE(block.usable, size);
         std::memset(data, block.fill, block.usable);
         ASSERT_TRUE(live.emplace(data, block).second);
     }
 
-    void Give(bool forC) {
-        if (live.empty()) { return; }
-        const auto entry = std::next(live.begin(), Below(live.size()));
-        const auto [data, block] = *entry;
-        EXPECT_EQ(std::count(data, data + block.usable, block.fill), block.usable);
-        if (forC) {
-            EXPECT_TRUE(heap->Free(data));
-        } else {
-            heap->Deallocate(data, block.size, block.alignment);
-        }
-        live.erase(entry);
-    }
-
     void Step() {
-        const std::size_t event = Below(100);
-        const std::size_t size = Size();
-        if (event < 20) {
+        const std::uint32_t bounds[] = {40, GetParam().maximum + 20, 3 * GetParam().maximum};
+        const std::uint32_t size = Below(bounds[Below(3)]);
+        const std::uint32_t alignment = 1u << Below(13);
+        const auto one = std::next(live.begin(), live.empty() ? 0 : Below(live.size()));
+        const std::uint32_t event = Below(100);
+        if (event == 0) {
+            heap->FreeAll();
+            live.clear();
+        } else if (event < 20) {
             Take(size, 8, live.end(), [&] { return heap->Malloc(size); });
         } else if (event < 40) {
-            const std::size_t alignment = std::size_t{1} << Below(13);
-            Take(size, alignment, live.end(), [&]() -> void* {
-                try {
-                    return heap->Allocate(size, alignment);
-                } catch (const std::bad_alloc&) { return nullptr; }
-            });
+            Take(size, alignment, live.end(), [&] { return heap->Allocate(size, alignment); });
         } else if (event < 50) {
             Take(size * 3, 8, live.end(), [&] {
                 auto* const data = static_cast<std::uint8_t*>(heap->Calloc(3, size));
-                if (data != nullptr) { EXPECT_EQ(std::count(data, data + size * 3, 0), size * 3); }
+                EXPECT_TRUE(data == nullptr || std::count(data, data + size * 3, 0) == 3L * size);
                 return data;
             });
-        } else if (event < 70 && !live.empty() && size != 0) {
-            const auto old = std::next(live.begin(), Below(live.size()));
-            const std::size_t alignment = size <= old->second.usable ? old->second.alignment : 8;
-            Take(size, alignment, old, [&] { return heap->Realloc(old->first, size); });
-        } else if (event < 99) {
-            Give(event % 2 == 0);
-        } else {
-            heap->FreeAll();
-            live.clear();
+        } else if (event < 70 && size != 0 && one != live.end()) {
+            Take(size, 8, one, [&] { return heap->Realloc(one->first, size); });
+        } else if (event >= 70 && one != live.end()) {
+            const auto [data, block] = *one;
+            live.erase(one);
+            EXPECT_EQ(std::count(data, data + block.usable, block.fill), block.usable);
+            EXPECT_TRUE(heap->Free(data));
         }
     }
 
-    // The heap's figures are those of the blocks and of what was asked of the heap below. Each
-    // block lies where it should, in data of the pool's if it has records.
+    // The figures are those of the blocks and of what was asked of the heap below. In a heap that
+    // is on, each block is the end of data of the pool's, which are no more than it takes.
     void Check(std::size_t arrayBytesIfNew) {
-        std::size_t sizes = 0;
-        for (const auto& [data, block] : live) {
-            sizes += std::max<std::size_t>(block.size, 1);
-            EXPECT_EQ(reinterpret_cast<std::uintptr_t>(data) % block.alignment, 0u);
-            EXPECT_EQ(heap->UsableSize(data), block.usable);
+        const BucketMgr& pool = *heap->GetMgr().GetBucketMgr();
+        const Blocks data = CheckInvariants(pool);
+        ASSERT_EQ(data.size(), pool.enabled ? live.size() : 0);
+        std::size_t bytes = 0;
+        auto at = data.begin();
+        for (const auto& [start, block] : live) {
+            EXPECT_EQ(reinterpret_cast<std::uintptr_t>(start) % block.alignment, 0);
+            EXPECT_EQ(heap->UsableSize(start), block.usable);
+            bytes += pool.enabled ? at->second : std::max(block.size, 1u);
+            if (!pool.enabled) { continue; }
+            EXPECT_TRUE(at->first <= start && start + block.usable == at->first + at->second);
+            const std::uint32_t most =
+                block.alignment < 8 ? block.size : RoundUp(block.size, 8) + block.alignment - 4;
+            EXPECT_LE(at++->second, std::max(RoundUp(most, pool.dataAlignment),
+                                             pool.minRecordSize + pool.dataAlignment));
         }
         const HeapStats stats = heap->GetStats();
-        EXPECT_EQ(stats.bytesHeld, HeapSpy::arrayBytes - arrayBytesIfNew);
         EXPECT_EQ(stats.usedRecords + stats.heapRecords, live.size());
-        const Blocks blocks = CheckInvariants(*heap->GetMgr().GetBucketMgr());
-        if (!GetParam().on) {
-            EXPECT_EQ(stats.bytesUsed, sizes);
-            return;
-        }
-        ASSERT_EQ(blocks.size(), live.size());
-        std::size_t bytes = 0;
-        auto block = blocks.begin();
-        for (const auto& [data, is] : live) {
-            EXPECT_LE(block->first, data);
-            EXPECT_EQ(data + is.usable, block->first + block->second);
-            bytes += block->second;
-            ++block;
-        }
         EXPECT_EQ(stats.bytesUsed, bytes);
+        EXPECT_EQ(stats.bytesHeld, HeapSpy::arrayBytes - arrayBytesIfNew);
     }
 
     std::mt19937 random{4};
+    std::optional<Heap> heap;
     Live live;
-    std::unique_ptr<Heap> heap;
 };
 
 }  // namespace
@@ -159,7 +126,7 @@ TEST_P(HeapWalkTest, KeepsEveryBlock) {
     const WalkSettings& is = GetParam();
     Use(is.bucketSize, is.alignment, is.maximum, is.minimum, is.keepEmptyBuckets);
     Settings::off = !is.on;
-    heap = std::make_unique<Heap>();
+    heap.emplace();
     const std::size_t arrayBytesIfNew = HeapSpy::arrayBytes;
     for (int step = 0; step < 1500 && !HasFailure(); ++step) {
         SCOPED_TRACE(step);
@@ -167,6 +134,7 @@ TEST_P(HeapWalkTest, KeepsEveryBlock) {
         Check(arrayBytesIfNew);
     }
     heap.reset();
+    EXPECT_LT(HeapSpy::arrayBytes, arrayBytesIfNew);
 }
 
 INSTANTIATE_TEST_SUITE_P(Settings, HeapWalkTest,
@@ -175,7 +143,168 @@ INSTANTIATE_TEST_SUITE_P(Settings, HeapWalkTest,
                                          WalkSettings{203, 1, 101, 7, true, true},
                                          WalkSettings{300, 3, 90, 40, false, true},
                                          WalkSettings{500, 12, 490, 5, true, true},
-                                         WalkSettings{24, 4, 20, 20, false, true},
-                                         WalkSettings{4010, 16, 19, 4, false, true}));
+                                         WalkSettings{24, 4, 20, 20, false, true}));
+
+namespace {
+
+class HeapTest : public PoolFixture {};
+
+std::size_t NumBlocks(const Heap& heap) {
+    return heap.GetStats().usedRecords + heap.GetStats().heapRecords;
+}
+
+auto AllSettings() {
+    return std::tuple(Settings::bucketSize, Settings::dataAlignment, Settings::maxRecordSize,
+                      Settings::minRecordSize, Settings::keepEmptyBuckets, Settings::off);
+}
+
+// What a heap of that name and these settings is refused for; "" if it is not. The settings of the
+// process are not touched.
+std::string Refusal(const char* name, const HeapSettings& settings = HeapSettings()) {
+    const auto before = AllSettings();
+    std::string refusal;
+    try {
+        const Heap heap(name, settings);
+        EXPECT_EQ(AllSettings(), before);
+    } catch (const std::invalid_argument& error) { refusal = error.what(); }
+    EXPECT_EQ(AllSettings(), before);
+    return refusal;
+}
+
+}  // namespace
+
+TEST_F(HeapTest, CountsWhatTheReportCounts) {
+    Use(200, 4, 100, 8, true);
+    Heap heap;
+    for (std::size_t size = 0; size < 120; ++size) {
+        void* const block = heap.Malloc(size);
+        if (size % 3 == 0 || size < 9) { heap.Free(block); }
+    }
+    std::ostringstream report;
+    std::streambuf* const nowhere = std::cout.rdbuf(report.rdbuf());
+    heap.GetMgr().Dbg();
+    std::cout.rdbuf(nowhere);
+    const HeapStats stats = heap.GetStats();
+    const std::pair<std::string, std::size_t> lines[] = {
+        {"Num Buckets : ", stats.buckets},     {"   Empty    : ", stats.emptyBuckets},
+        {"   Full     : ", stats.fullBuckets}, {"Used Recs   : ", stats.usedRecords},
+        {"Free Recs   : ", stats.freeRecords}, {"Ext Recs    : ", stats.heapRecords}};
+    for (const auto& [label, figure] : lines) {
+        const std::size_t number = report.str().find(label) + label.size();
+        EXPECT_EQ(std::stoul(report.str().substr(number)), figure) << label;
+        EXPECT_NE(figure, 0) << label;
+    }
+}
+
+// What GetStats knows of a pool's memory is what that memory is.
+TEST_F(HeapTest, KnowsTheMemoryOfAPool) {
+    using namespace detail;
+    Mgr mgr;
+    mgr.Alloc(5000);
+    const BucketMgr& pool = *mgr.GetBucketMgr();
+    EXPECT_EQ(ReadAt<Group**>(&pool, format::poolGroups), pool.groups);
+    EXPECT_EQ(ReadAt<std::uint32_t>(&pool, format::poolNumGroups), pool.numGroups);
+    EXPECT_EQ(ReadAt<void*>(&pool, format::poolExtRecs), pool.extRecs);
+    static_assert(format::groupHead == offsetof(Group, head) &&
+                  format::bucketNext == offsetof(Bucket, next1) &&
+                  format::bucketSize == offsetof(Bucket, size) &&
+                  format::bucketRecSize == offsetof(Bucket, recSize) &&
+                  format::bucketNumFree == offsetof(Bucket, numFree) &&
+                  format::extRecNext == offsetof(ExtRec, next) &&
+                  format::extRecLength == offsetof(ExtRec, length) &&
+                  format::sizeOfBucketHead == Bucket::baseDistance &&
+                  format::sizeOfExtRec == sizeof(ExtRec) &&
+                  format::sizeOfRecHdr == sizeof(RecHdr) && format::firstRecord == firstOffset);
+}
+
+TEST_F(HeapTest, RefusesWhatIsTooMuch) {
+    constexpr std::size_t most = std::numeric_limits<std::size_t>::max();
+    for (const bool off : {false, true}) {
+        Settings::off = off;
+        Heap heap;
+        HeapSpy::lastRequest = 0;
+        for (const std::size_t size : {Heap::MaxSize() + 1, std::size_t{1} << 32, most - 6, most}) {
+            EXPECT_EQ(heap.Malloc(size), nullptr);
+            EXPECT_EQ(heap.Calloc(size / 2 + 1, 2), nullptr);
+            EXPECT_THROW(heap.Allocate(size, 4), std::bad_alloc);
+            EXPECT_THROW(Allocator<int>(heap).allocate(size / 4 + 1), std::bad_alloc);
+        }
+        for (const std::size_t alignment : {0u, 3u, 12u, 8192u}) {
+            EXPECT_THROW(heap.Allocate(1, alignment), std::bad_alloc);
+        }
+        EXPECT_EQ(HeapSpy::lastRequest, 0);
+        EXPECT_TRUE(HeapSpy::FailsAt(0, [&] { heap.Allocate(Heap::MaxSize(), 4096); }));
+    }
+}
+
+TEST_F(HeapTest, PassesOverNullAndForeignPointers) {
+    std::uint64_t words[20] = {};
+    for (const bool off : {false, true}) {
+        Settings::off = off;
+        Heap heap;
+        Heap other;
+        void* const block = heap.Malloc(10);
+        void* const null = nullptr;
+        for (void* const foreign : {null, static_cast<void*>(&words[15]), other.Malloc(10)}) {
+            EXPECT_FALSE(heap.Free(foreign));
+            EXPECT_EQ(heap.UsableSize(foreign), 0);
+            EXPECT_EQ(heap.Realloc(foreign, 5) == nullptr, foreign != nullptr);
+        }
+        EXPECT_EQ(NumBlocks(heap), 2);
+        EXPECT_EQ(NumBlocks(other), 1);
+        EXPECT_EQ(heap.Realloc(block, 0), nullptr);
+        EXPECT_EQ(NumBlocks(heap), 1);
+        EXPECT_NE(heap.Realloc(nullptr, 0), heap.Malloc(0));
+        if (!off) { EXPECT_FALSE(heap.Free(block)) << "freed twice"; }
+    }
+}
+
+// Sizes at the ends of what their fields hold: a heap is refused where the process would end.
+TEST_F(HeapTest, IsRefusedWhereNoPoolCanBeMade) {
+    std::mt19937 random(5);
+    const auto oneOf = [&random](std::initializer_list<std::uint32_t> values) {
+        return values.begin()[random() % values.size()];
+    };
+    for (int round = 0; round < 150 && !HasFailure(); ++round) {
+        Use(oneOf({0, 3, 4, 12, 100, 104, 4010, 65535, 65536}),
+            static_cast<std::uint16_t>(oneOf({0, 1, 3, 4, 5, 8, 12, 100, 65531, 65532})),
+            oneOf({0, 3, 4, 8, 96, 100, 1000, 65531, 65532, 0xFFFFFFFB, 0xFFFFFFFF}),
+            oneOf({0, 4, 8, 96, 97, 100, 0xFFFFFFFC, 0xFFFFFFFD, 0xFFFFFFFF}));
+        if (Refusal(nullptr).empty()) { continue; }
+        Settings::dataAlignment = static_cast<std::uint16_t>(RoundUp(Settings::dataAlignment, 4));
+        const pid_t child = fork();
+        if (child == 0) {
+            std::atexit([] { _exit(1); });  // A sanitizer has nothing to look for.
+            _exit(Mgr().IsEnabled() ? 0 : 2);
+        }
+        int status = 0;
+        waitpid(child, &status, 0);
+        EXPECT_EQ(WEXITSTATUS(status), 1) << testing::PrintToString(AllSettings());
+    }
+    Use(4010, 4, 1000, 8);
+    EXPECT_NE(Refusal(nullptr, HeapSettings().DataAlignment(65536)), "");
+    EXPECT_NE(Refusal(nullptr, HeapSettings().MinRecordSize(std::size_t{1} << 32)), "");
+}
+
+TEST_F(HeapTest, HasTheSettingsSaidAndElseThoseOfTheProcess) {
+    Use(300, 5, 90, 6, true);
+    Settings::off = true;
+    const auto settings = [](const Heap& heap) {
+        const BucketMgr& pool = *heap.GetMgr().GetBucketMgr();
+        return std::tuple(pool.bucketSize, pool.dataAlignment, pool.maxRecordSize,
+                          pool.minRecordSize, pool.keepEmptyBuckets, !pool.enabled);
+    };
+    EXPECT_EQ(settings(Heap()), std::tuple(300, 8, 88, 8, true, true));
+    const auto before = AllSettings();
+    std::optional<Heap> heap;
+    const HeapSettings said = HeapSettings().On(true).BucketSize(1 << 20).MaxRecordSize(50);
+    const auto build = [&] {
+        heap.emplace("own",
+                     HeapSettings(said).MinRecordSize(9).DataAlignment(4).KeepEmptyBuckets(false));
+    };
+    for (std::size_t n = 0; HeapSpy::FailsAt(n, build); ++n) { EXPECT_EQ(AllSettings(), before); }
+    EXPECT_EQ(settings(*heap), std::tuple(65535, 4, 48, 12, false, false));
+    EXPECT_EQ(Refusal("own", said), "OBR::MemPool::Heap: there is a pool named 'own' already");
+}
 
 }  // namespace OBR::MemPool
