@@ -1,21 +1,25 @@
 // Counts the words of texts, as a first real host of the pools. Each text has a pool named after
 // its file, in which every line and every distinct word is a block of its own: short ones become
 // records of buckets, long ones heap records. All texts live together until they are reported, and
-// then each is dropped with one Clear.
+// then each is dropped: with one Clear, or with pools off block by block. How long that took and
+// how much memory it needed is the last line.
 
 #include <MemPool>
 
+#include <sys/resource.h>
+
 #include <algorithm>
 #include <cerrno>
-#include <chrono>
 #include <cstddef>
+#include <cstdlib>
 #include <cstring>
+#include <ctime>
 #include <deque>
 #include <exception>
-#include <filesystem>
 #include <fstream>
 #include <iomanip>
 #include <iostream>
+#include <new>
 #include <stdexcept>
 #include <string>
 #include <string_view>
@@ -24,6 +28,8 @@
 #include <vector>
 
 #include <CLI/CLI.hpp>
+
+#include "Progress.hpp"
 
 namespace {
 
@@ -42,6 +48,8 @@ char ToSmall(char letter) {
     return letter >= 'A' && letter <= 'Z' ? static_cast<char>(letter - 'A' + 'a') : letter;
 }
 
+// What a host keeps of a text: it finds its lines and its words again, whichever memory they are
+// in.
 class Text {
 public:
     using WordCount = std::pair<std::string_view, std::size_t>;
@@ -51,16 +59,17 @@ public:
     Text& operator=(const Text&) = delete;
     ~Text() { Drop(); }
 
-    void Read(std::istream& input) {
+    void Read(std::istream& input, Progress& progress) {
         std::string line;
         while (std::getline(input, line)) {
             if (line.size() > maxBlock) {
-                throw std::runtime_error("line " + std::to_string(numLines + 1) + " has " +
+                throw std::runtime_error("line " + std::to_string(lines.size() + 1) + " has " +
                                          std::to_string(line.size()) +
                                          " bytes, and a block at most " + std::to_string(maxBlock));
             }
-            CountWords(Keep(line));
-            ++numLines;
+            lines.push_back(Keep(line));
+            CountWords(lines.back());
+            progress.Add(line.size() + 1);
         }
         if (input.bad()) { throw std::runtime_error(std::strerror(errno)); }
     }
@@ -80,29 +89,30 @@ public:
 
     // A disabled pool keeps no books: its Clear frees nothing, and each block goes back by itself.
     void Drop() {
-        counts.clear();
         if (pool.IsEnabled()) {
             pool.Clear();
         } else {
-            for (void* const block : blocks) { pool.Free(block); }
-            blocks.clear();
+            for (const std::string_view line : lines) { Free(line); }
+            for (const auto& [kept, count] : counts) { Free(kept); }
         }
+        counts.clear();
+        lines.clear();
     }
 
     const Mgr& Pool() const { return pool; }
-    std::size_t NumLines() const { return numLines; }
+    std::size_t NumLines() const { return lines.size(); }
     std::size_t NumWords() const { return counts.size(); }
-    std::size_t NumBlocks() const { return numBlocks; }
+    std::size_t NumBlocks() const { return NumLines() + NumWords(); }
     std::size_t NumBytes() const { return numBytes; }
 
 private:
     std::string_view Keep(std::string_view bytes) {
         void* const block = pool.Alloc(static_cast<unsigned int>(bytes.size()));
-        if (!pool.IsEnabled()) { blocks.push_back(block); }
-        ++numBlocks;
         numBytes += bytes.size();
         return {static_cast<char*>(std::memcpy(block, bytes.data(), bytes.size())), bytes.size()};
     }
+
+    void Free(std::string_view kept) { pool.Free(const_cast<char*>(kept.data())); }
 
     void CountWords(std::string_view line) {
         for (std::size_t at = 0; at < line.size(); ++at) {
@@ -121,11 +131,9 @@ private:
     }
 
     Mgr pool;
-    std::unordered_map<std::string_view, std::size_t> counts;  // The words are blocks of the pool.
-    std::vector<void*> blocks;                                 // Only for a disabled pool.
-    std::string word;                                          // The word being read.
-    std::size_t numLines = 0;
-    std::size_t numBlocks = 0;
+    std::deque<std::string_view> lines;  // The bytes of lines and words are blocks of the pool.
+    std::unordered_map<std::string_view, std::size_t> counts;
+    std::string word;  // The word being read.
     std::size_t numBytes = 0;
 };
 
@@ -139,28 +147,31 @@ std::string PoolName(const std::string& file) {
     return name;
 }
 
-void ReadFile(Text& text, const std::string& file) {
+void ReadFile(Text& text, const std::string& file, Progress& progress) {
     if (file == "-") {
-        text.Read(std::cin);
+        text.Read(std::cin, progress);
         return;
     }
-    if (std::filesystem::is_directory(file)) { throw std::runtime_error("is a directory"); }
     std::ifstream input(file, std::ios::binary);
     if (!input) { throw std::runtime_error(std::strerror(errno)); }
-    text.Read(input);
+    text.Read(input, progress);
 }
 
-// Returns whether the file could be read. One that could not leaves no text.
-bool AddText(std::deque<Text>& texts, const std::string& file) {
-    Text& text = texts.emplace_back(PoolName(file));
-    try {
-        ReadFile(text, file);
-        return true;
-    } catch (const std::exception& error) {
-        texts.pop_back();
-        std::cerr << "WordPools: " << file << ": " << error.what() << std::endl;
+// Returns whether the file could be read. One that could not leaves no text, and the next ones have
+// their turn.
+bool AddText(std::deque<Text>& texts, const std::string& file, Progress& progress) {
+    const auto refuse = [&, numBefore = texts.size()](const char* reason) {
+        if (texts.size() > numBefore) { texts.pop_back(); }
+        progress.Clear();
+        std::cerr << "WordPools: " << file << ": " << reason << std::endl;
         return false;
-    }
+    };
+    try {
+        ReadFile(texts.emplace_back(PoolName(file)), file, progress);
+        return true;
+    } catch (const std::bad_alloc&) {
+        return refuse(std::strerror(ENOMEM));
+    } catch (const std::exception& error) { return refuse(error.what()); }
 }
 
 void PrintWords(const Text& text, std::size_t top) {
@@ -187,55 +198,106 @@ void PrintPools(const std::deque<Text>& texts) {
     std::cout << '\n';
 }
 
+// Processor time, so that neither others on the machine nor a slow input count.
 template <typename Work>
 double Seconds(Work work) {
-    const auto start = std::chrono::steady_clock::now();
+    const std::clock_t start = std::clock();
     work();
-    return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+    return static_cast<double>(std::clock() - start) / CLOCKS_PER_SEC;
 }
 
-int Run(int argc, char** argv) {
-    CLI::App app{
-        "Counts the words of texts, with every line and distinct word in a pool named after its "
-        "file.\nA word is a run of letters, digits and bytes above 127; capitals count as small "
-        "letters."};
+// The largest part of this process that was ever in memory, in KiB, as the system counts it.
+long PeakResident() {
+    rusage usage = {};
+    getrusage(RUSAGE_SELF, &usage);
+    return usage.ru_maxrss;
+}
+
+struct Options {
     std::vector<std::string> files;
     std::size_t top = 10;
     bool heap = false;
+    bool report = false;
     bool detailed = false;
-    app.add_option("FILE", files, "Texts to read; - is the standard input")->required();
-    app.add_option("--top", top, "How many of the most frequent words to print")
-        ->check(CLI::Range(0, 1000000))
-        ->capture_default_str();
-    app.add_flag("--heap", heap, "Turn the pools off: every block comes from the heap");
-    app.add_flag("--detailed", detailed, "Report every bucket and every record of the pools");
-    CLI11_PARSE(app, argc, argv);
+    bool figures = false;
+};
 
-    OBR::MemPool::NUV_OBR_MEMPOOL_ON(!heap);
-    std::ios::sync_with_stdio(false);
-
-    std::deque<Text> texts;  // A deque: a handle stays at its address.
-    bool allRead = true;
-    const double keeping = Seconds([&] {
-        for (const std::string& file : files) { allRead = AddText(texts, file) && allRead; }
-    });
-
-    for (const Text& text : texts) { PrintWords(text, top); }
+void PrintTexts(const std::deque<Text>& texts, const Options& options) {
+    for (const Text& text : texts) { PrintWords(text, options.top); }
     PrintPools(texts);
-    if (detailed) {
+    if (options.detailed) {
         OBR::MemPool::DbgDetailed();
-    } else {
+    } else if (options.report) {
         OBR::MemPool::Dbg();
     }
+}
 
+// Returns whether all went well.
+bool CountAll(const Options& options) {
+    OBR::MemPool::NUV_OBR_MEMPOOL_ON(!options.heap);
+    std::deque<Text> texts;  // A deque: a handle stays at its address.
+    bool allRead = true;
+    Progress progress;
+    const double reading = Seconds([&] {
+        for (const std::string& file : options.files) {
+            allRead = AddText(texts, file, progress) && allRead;
+        }
+    });
+    progress.Clear();
+
+    if (!options.figures) { PrintTexts(texts, options); }
     const double dropping = Seconds([&] {
         for (Text& text : texts) { text.Drop(); }
     });
-    std::cout << std::fixed << std::setprecision(3) << "pools " << (heap ? "off" : "on") << ": "
-              << keeping << " s to read and keep, " << dropping << " s to drop, "
-              << keeping + dropping << " s elapsed" << std::endl;
+    std::cout << std::fixed;
+    if (options.figures) {
+        std::cout << std::setprecision(6) << reading << ' ' << dropping << ' ' << PeakResident();
+    } else {
+        std::cout << std::setprecision(3) << "pools " << (options.heap ? "off" : "on") << ": "
+                  << reading << " s to read and keep, " << dropping << " s to drop, "
+                  << PeakResident() << " KiB resident at the peak";
+    }
+    std::cout << std::endl;
     if (!std::cout) { std::cerr << "WordPools: cannot write the output" << std::endl; }
-    return allRead && std::cout ? 0 : 1;
+    return allRead && std::cout;
+}
+
+constexpr const char* description =
+    R"(Counts the words of texts, with every line and distinct word in a pool named after its file.
+A word is a run of letters, digits and bytes above 127; capitals count as small letters.
+
+The last line tells how long it took to read the texts and to drop them again, in processor time,
+and the largest part of the program that was in memory.
+
+A text that cannot be read is told on the standard error stream, and the others are counted all the
+same; the exit status is then 1.)";
+
+int Run(int argc, char** argv) {
+    CLI::App app(description, "WordPools");
+    Options options;
+    app.add_option("FILE", options.files, "Texts to read; - is the standard input")
+        ->required()
+        ->type_name("");
+    auto* const top =
+        app.add_option("--top", options.top, "How many of the most frequent words to print")
+            ->check(CLI::Range(0, 1000000))
+            ->type_name("N")
+            ->capture_default_str();
+    app.add_flag("--heap", options.heap, "Turn the pools off: every block comes from the heap");
+    auto* const report =
+        app.add_flag("--report", options.report, "Report the pools with all their buckets");
+    auto* const detailed =
+        app.add_flag("--detailed", options.detailed, "Report every record of the pools, too");
+    app.add_flag("--figures", options.figures,
+                 "Print nothing but seconds to read, seconds to drop and KiB at the peak")
+        ->excludes(top, report, detailed);
+    try {
+        app.parse(argc, argv);
+    } catch (const CLI::ParseError& error) {
+        return app.exit(error) == 0 ? EXIT_SUCCESS : EXIT_FAILURE;
+    }
+    std::ios::sync_with_stdio(false);
+    return CountAll(options) ? EXIT_SUCCESS : EXIT_FAILURE;
 }
 
 }  // namespace
@@ -245,6 +307,6 @@ int main(int argc, char** argv) {
         return Run(argc, argv);
     } catch (const std::exception& error) {
         std::cerr << "WordPools: " << error.what() << std::endl;
-        return 1;
+        return EXIT_FAILURE;
     }
 }

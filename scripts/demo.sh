@@ -1,28 +1,100 @@
 #!/usr/bin/env bash
-# Builds the library and runs its first host, WordPools, on real texts: the files given, or some
-# that every Debian has. Then the same without pools, for the time that it takes.
+# Builds the library and shows what its first host, WordPools, gains from it. With pools on and off,
+# in turns, WordPools counts the words of the files given, or of a text that is made of those on
+# this machine; in the end both stand side by side.
+#
+# DEMO_MEGABYTES (100) is the size of the text, DEMO_ROUNDS (5) how often each side runs, DEMO_FOLDER
+# (build/demo) where the text and the report go, DEMO_PROGRAM a WordPools that is built already.
+if [[ ${1:-} == -h || ${1:-} == --help ]]; then
+    echo "usage: scripts/demo.sh [FILE...]   (- is the standard input)"
+    exit
+fi
 # shellcheck source=scripts/build.sh
 source "$(dirname "$0")/build.sh"
 
-files=("$@")
-if [ ${#files[@]} -eq 0 ]; then
-    files=(/usr/share/common-licenses/{GPL-3,LGPL-2.1,Apache-2.0} README.md)
-else
-    # The build starts elsewhere: keep the names that the user gave.
-    for index in "${!files[@]}"; do
-        case ${files[index]} in
-            - | /*) ;;
-            *) files[index]=$OLDPWD/${files[index]} ;;
-        esac
+megabytes=${DEMO_MEGABYTES:-100} rounds=${DEMO_ROUNDS:-5} folder=${DEMO_FOLDER:-build/demo}
+mkdir -p "$folder"
+scratch=$(mktemp -d "$folder/scratch.XXXXXX")
+trap 'rm -rf "$scratch"' EXIT
+text=$folder/text report=$folder/report.txt
+
+progress() { [ ! -t 2 ] || printf '\r\033[K%s' "$*" >&2; }
+
+# The small texts under /usr, in an order that is random but the same each time.
+texts() {
+    find /usr/share /usr/include /usr/lib -type f -size -1025k ! -name '*.gz' -print0 |
+        LC_ALL=C sort --zero-terminated |
+        shuf --zero-terminated --random-source=<(seq inf) |
+        xargs --null grep --files-with-matches --binary-files=without-match --null '' |
+        xargs --null cat
+}
+
+# Writes $text, as often over as it takes, unless it is there from the last time.
+make_text() {
+    local wanted=$((megabytes * 1000000))
+    if [ "$(stat --format=%s "$text" 2>/dev/null)" = "$wanted" ]; then return; fi
+    step "A text of $megabytes MB, from those under /usr/share, /usr/include and /usr/lib"
+    : >"$scratch/once"
+    { texts 2>/dev/null || true; } | head --bytes="$wanted" >"$scratch/once" &
+    while kill -0 $! 2>/dev/null; do
+        progress "$(($(stat --format=%s "$scratch/once") / 1000000)) MB written"
+        sleep 0.2
     done
+    progress
+    wait $!
+    if [ ! -s "$scratch/once" ]; then echo "There is no text under /usr." >&2 && exit 1; fi
+    while cat "$scratch/once"; do :; done 2>/dev/null | head --bytes="$wanted" >"$scratch/text"
+    mv "$scratch/text" "$text"
+    echo "It stays in $text for the next time."
+}
+
+# What cannot be read is told and left out; what can be read only once is copied.
+status=0 files=()
+for file in "$@"; do
+    case $file in
+        - | /*) ;;
+        *) file=$OLDPWD/$file ;;
+    esac
+    if [ "$file" = - ] || [ -p "$file" ]; then
+        copy="$scratch/input ${#files[@]}"
+        cat -- "$file" >"$copy"
+        file=$copy
+    fi
+    if head --bytes=1 "$file" >/dev/null; then files+=("$file"); else status=1; fi
+done
+if [ $# -gt 0 ] && [ ${#files[@]} -eq 0 ]; then exit 1; fi
+
+program=${DEMO_PROGRAM:-}
+if [ -z "$program" ]; then
+    step "Packages"
+    scripts/install-packages.sh build
+    build release WordPools
+    program=build/release/examples/WordPools
+fi
+if [ $# -eq 0 ]; then
+    make_text
+    files=("$text")
 fi
 
-step "Packages"
-scripts/install-packages.sh build
-build release WordPools
-step "WordPools with pools"
-build/release/examples/WordPools "${files[@]}"
-if [[ " ${files[*]} " != *" - "* ]]; then
-    step "WordPools without pools"
-    build/release/examples/WordPools --heap "${files[@]}" | tail -n 1
-fi
+# This also brings the files into the memory of the system, before any clock runs.
+step "The report of the pools, from its start; $report has all of it"
+"$program" --report "${files[@]}" >"$report"
+head -n 40 "$report"
+
+step "Processor time and memory, pools on and off in turns"
+turn=(on off)
+for ((round = 1; round <= rounds; ++round)); do
+    for pools in "${turn[@]}"; do
+        option=()
+        [ "$pools" = on ] || option=(--heap)
+        figures=$("$program" --figures "${option[@]}" "${files[@]}")
+        echo "$pools $figures" >>"$scratch/figures"
+        read -r reading dropping _ <<<"$figures"
+        echo "Round $round of $rounds, pools $pools: $reading s to read, $dropping s to drop" >&2
+    done
+    turn=("${turn[1]}" "${turn[0]}")
+done
+
+step "Medians of $rounds rounds; about the same is what the runs do not agree on"
+awk -f scripts/demo-table.awk "$scratch/figures"
+exit $status

@@ -1,0 +1,42 @@
+// How much an example has read, on one line of a terminal that is written over and over. Nothing is
+// shown in a file or a pipe.
+
+#ifndef OBR_EXAMPLES_PROGRESS_HPP
+#define OBR_EXAMPLES_PROGRESS_HPP
+
+#include <unistd.h>
+
+#include <cstddef>
+#include <iostream>
+
+class Progress {
+public:
+    Progress() = default;
+    Progress(const Progress&) = delete;
+    Progress& operator=(const Progress&) = delete;
+    ~Progress() { Clear(); }
+
+    void Add(std::size_t bytes) {
+        const std::size_t shown = numBytes / megabyte;
+        numBytes += bytes;
+        if (!isTerminal || numBytes / megabyte == shown) { return; }
+        Clear();
+        std::cerr << numBytes / megabyte << " MB read" << std::flush;
+        isShown = true;
+    }
+
+    // Makes room for what is written next.
+    void Clear() {
+        if (isShown) { std::cerr << "\r\033[K" << std::flush; }
+        isShown = false;
+    }
+
+private:
+    static constexpr std::size_t megabyte = 1000000;
+
+    const bool isTerminal = isatty(STDERR_FILENO) != 0;
+    std::size_t numBytes = 0;
+    bool isShown = false;
+};
+
+#endif

@@ -1,0 +1,145 @@
+// WordPools and the demo as their users run them: commands in a folder of made texts, each with its
+// output, its standard error and its exit status, against expected/wordpools.txt. Times and memory
+// are no fixed figures: they are held against bounds. OBR_MEMPOOL_APPROVE makes the test write the
+// text anew.
+
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <sstream>
+#include <string>
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include "Child.hpp"
+
+using testing::ContainsRegex;
+using testing::HasSubstr;
+using testing::Not;
+
+namespace {
+
+std::string Content(const std::string& path) {
+    std::ifstream file(path, std::ios::binary);
+    return {std::istreambuf_iterator<char>(file), {}};
+}
+
+class WordPools : public testing::Test {
+protected:
+    const std::string folder = testing::TempDir() + "WordPools." + std::to_string(getpid()) + "/";
+
+    WordPools() {
+        Child::SetEnvironment({});
+        setenv("SCRIPTS", SOURCES "/scripts", 1);
+        setenv("PATH", (WORD_POOLS_FOLDER ":" + std::string(std::getenv("PATH"))).c_str(), 1);
+        std::filesystem::create_directory(folder);
+        // Ties, capitals, the neighbours of letters and digits, and UTF-8 down to its lowest byte.
+        Write("mixed",
+              "Zebra zebra ZEBRA apple Apple\r\n@A[ `Z{ /0:9; q\x7fr\n\nit's a 3.14 b\u00c0 "
+              "\u00dcber \u00fcber\na" +
+                  std::string(1500, '-') + "no_last newline");
+        Write("empty", "");
+        std::string lines;
+        for (int line = 0; line < 2500; ++line) { lines += std::string(999, '=') + '\n'; }
+        Write("large", lines);
+        Write("odd.runs",
+              "on 1.4 .0004 3200\noff 1.5 .0010 2048\noff 1.3 .003 2048\n"
+              "on 1.2 .0003 3072\non 1.1 .0005 3000\noff 1.6 .002 2100\n");
+        Write("even.runs", "on 25 0 1024\non 15 0 1024\noff 9 0 1024\noff 11 0 1025\n");
+    }
+    ~WordPools() override { std::filesystem::remove_all(folder); }
+
+    void Write(const std::string& name, const std::string& content) const {
+        std::ofstream(folder + name, std::ios::binary) << content;
+    }
+
+    // The text with times, memory and addresses as #.
+    std::string Masked(const std::string& text) const {
+        Write("text", text);
+        Run("sed -i -E 's/[0-9.]+ (s to|KiB)/# \\1/g; s/0x[0-9a-f]{16}/#/g' text");
+        return Content(folder + "text");
+    }
+
+    // The command, all that it writes, and its exit status if that is not 0.
+    std::string Run(const std::string& command) const {
+        const std::string all = "cd " + folder + " && { " + command + "; } >out 2>err";
+        const int status = std::system(all.c_str());
+        std::string text = "$ " + command + "\n" + Content(folder + "out");
+        const std::string errors = Content(folder + "err");
+        if (!errors.empty()) { text += "--- standard error\n" + errors; }
+        return text + (status == 0 ? "" : "--- exit " + std::to_string(WEXITSTATUS(status)) + "\n");
+    }
+};
+
+TEST_F(WordPools, CountsWordsAndTellsWhatItCannotRead) {
+    std::string text;
+    for (const char* command :
+         {"WordPools missing . /proc/self/mem mixed empty",
+          "WordPools --heap --top 20 missing mixed empty . nowhere",
+          "WordPools --top 0 - mixed - mixed mixed <mixed", "WordPools - <.", "WordPools",
+          "WordPools --top -1 mixed", "WordPools --figures --report mixed",
+          "WordPools mixed >/dev/full", "awk -f $SCRIPTS/demo-table.awk odd.runs",
+          "awk -f $SCRIPTS/demo-table.awk even.runs"}) {
+        text += Run(command);
+    }
+    text = Masked(text);
+    const std::string path = SOURCES "/tests/expected/wordpools.txt";
+    if (std::getenv("OBR_MEMPOOL_APPROVE") != nullptr) { std::ofstream(path) << text; }
+    EXPECT_EQ(text, Content(path));
+}
+
+// The README shows the report of a text that every Debian has.
+TEST_F(WordPools, ReportsAsMuchAsItIsAskedFor) {
+    const std::string command = "WordPools /usr/share/common-licenses/BSD ";
+    const std::string readme = Content(SOURCES "/README.md");
+    const std::size_t start = readme.find("\nMemPool::Mgr ");
+    const std::string sample = readme.substr(start, readme.find("```", start) - start);
+    EXPECT_THAT(Masked(Run(command + "--report")), HasSubstr(Masked(sample)));
+    EXPECT_NE(Run(command + "--detailed").find("ALL RECORDS (501)"), std::string::npos);
+}
+
+TEST_F(WordPools, MeasuresItself) {
+    EXPECT_THAT(Run("WordPools --figures large"), Not(HasSubstr("standard error")));
+    std::istringstream figures(Content(folder + "out"));
+    double reading = 0;
+    double dropping = 0;
+    double peak = 0;
+    std::string rest;
+    figures >> reading >> dropping >> peak;
+    EXPECT_FALSE(figures >> rest) << rest;
+    EXPECT_TRUE(dropping < reading && reading < 60 && 2500 < peak && peak < 1e6) << figures.str();
+    EXPECT_THAT(Run("script -qec 'WordPools --figures large' /dev/null"),
+                ContainsRegex("\n1 MB read\r\x1b\\[K2 MB read\r\x1b\\[K[0-9. ]+\r\n$"));
+}
+
+TEST_F(WordPools, AreShownByTheDemo) {
+    Write("spy", "#!/bin/sh\necho $1 $2 >>${0%spy}spied\nexec WordPools \"$@\"\n");
+    const std::string demo =
+        "chmod +x spy && DEMO_PROGRAM=$PWD/spy DEMO_FOLDER=$PWD/demo "
+        "DEMO_ROUNDS=1 DEMO_MEGABYTES=1 $SCRIPTS/demo.sh";
+    const std::string table =
+        "\n +pools on +pools off +ratio\n"
+        "time to read and keep( +[0-9.]+ m?s){2} +[0-9.]+\n"
+        "time to drop( +[0-9.]+ [um]?s){2} +[0-9.-]+\n"
+        "peak memory, resident( +[0-9.]+ MiB){2} +[0-9.]+\n\n"
+        "Pools [a-z ]+ here: [^\n]+\\.\n--- standard error\n";
+    EXPECT_THAT(Run(demo), ContainsRegex(table + "Round 1 of 1, pools on: .*[0-9] s to drop\n$"));
+    EXPECT_EQ(std::filesystem::file_size(folder + "demo/text"), 1000000U);
+    EXPECT_THAT(Content(folder + "spied"),
+                ContainsRegex("^--report .*/text\n--figures .*/text\n--figures --heap\n$"));
+
+    const std::string text = Run(demo + " nowhere mixed - <large");
+    EXPECT_THAT(text, ContainsRegex(table + ".*nowhere.*\n--- exit 1\n$"));
+    const std::string report = Content(folder + "demo/report.txt");
+    EXPECT_THAT(report, HasSubstr("\nMemPool::Mgr " + folder + "mixed\n"));
+    std::size_t end = 0;
+    for (int line = 0; line < 40; ++line) { end = report.find('\n', end) + 1; }
+    EXPECT_THAT(text, HasSubstr("\n" + report.substr(0, end) + "\n== "));
+}
+
+}  // namespace
