@@ -1,0 +1,30 @@
+# gdb's commands and printers, which it loads by itself with the library: it looks for the library's
+# real file name and "-gdb.py" beside the library and, in the folders that it is set up for, under
+# the library's whole path. What it finds there is a link to the script, which has its package
+# beside it. gdb trusts what its own set-up names: for Debian's gdb that is below
+# /usr/share/gdb/auto-load. So the link of an install under /usr stands there, and every other one
+# beside the library, where gdb itself says what to add to one's ~/.gdbinit.
+
+set(gdbDir ${PROJECT_SOURCE_DIR}/tools/gdb)
+set(gdbLinkName $<TARGET_FILE_NAME:MemPool>-gdb.py)
+if(MEMPOOL_IS_SHARED)
+    add_custom_command(TARGET MemPool POST_BUILD
+        COMMAND ${CMAKE_COMMAND} -E create_symlink
+            ${gdbDir}/autoload.py $<TARGET_FILE_DIR:MemPool>/${gdbLinkName})
+endif()
+
+if(OBR_MEMPOOL_INSTALL)
+    set(installedGdbDir ${CMAKE_INSTALL_DATADIR}/ObrMemPool/gdb)
+    install(FILES ${gdbDir}/autoload.py DESTINATION ${installedGdbDir})
+    install(DIRECTORY ${gdbDir}/obrmempool DESTINATION ${installedGdbDir}
+        FILES_MATCHING PATTERN *.py PATTERN __pycache__ EXCLUDE)
+endif()
+if(OBR_MEMPOOL_INSTALL AND MEMPOOL_IS_SHARED)
+    # The prefix is known when it is installed. A folder that is given by its whole path stays.
+    install(CODE "
+        set(prefix \"\${CMAKE_INSTALL_PREFIX}\")
+        set(script \"${installedGdbDir}/autoload.py\")
+        set(linkDir \"${CMAKE_INSTALL_LIBDIR}\")
+        set(linkName \"${gdbLinkName}\")
+        include(\"${CMAKE_CURRENT_LIST_DIR}/InstallGdbLink.cmake\")")
+endif()

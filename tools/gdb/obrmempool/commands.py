@@ -1,0 +1,117 @@
+"""The commands: what is typed, and where each is told in full. Importing this defines them."""
+
+import gdb
+
+from . import layout, pools, report
+from .memory import Fault
+
+
+def write(lines):
+    """Writes what gdb's character set can hold; the rest is told by its code."""
+    text = "".join(lines)
+    try:
+        gdb.write(text)
+    except UnicodeEncodeError:
+        gdb.write(text.encode("ascii", "backslashreplace").decode("ascii"))
+
+
+def pool_named(words):
+    """The pool whose name consists of these words."""
+    name = " ".join(words)
+    found, fault = pools.all_pools()
+    for pool in found:
+        if pool.title == name:
+            return pool
+    if fault is not None:
+        raise gdb.GdbError(f"No pool {name} is found, but not all are known: {fault}")
+    raise gdb.GdbError(f"There is no pool {name}. \"info mempools\" lists them.")
+
+
+class PoolCommand(gdb.Command):
+    """A command whose first argument is the name of a pool."""
+
+    def complete(self, text, word):
+        try:
+            names = [pool.title for pool in pools.all_pools()[0]]
+        except gdb.GdbError:
+            return []
+        return [name for name in names if name.startswith(word)]
+
+
+class InfoMempools(gdb.Command):
+    """List the memory pools of libObrMemPool.
+Usage: info mempools
+
+Blocks and bytes are those in use, as the pool's records hold them; held are the bytes that buckets
+and heap records have from the heap. The blocks of a pool that is not enabled are the heap's own and
+are not counted."""
+
+    def __init__(self):
+        super().__init__("info mempools", gdb.COMMAND_STATUS)
+
+    def invoke(self, text, from_tty):
+        if text:
+            raise gdb.GdbError("Usage: info mempools")
+        found, fault = pools.all_pools()
+        if not found and fault is None:
+            write("No pools.\n")
+            return
+        write(f"{'Blocks':>10} {'Bytes':>14} {'Buckets':>8} {'Held':>14}  Enabled  "
+              f"{'Pool':18}  Name\n")
+        for pool in found:
+            write(self.row(pool) + f"  {pool.address:#018x}  {pool.title}\n")
+        if fault is not None:
+            write(f"Not all pools are known: {fault}\n")
+
+    @staticmethod
+    def row(pool):
+        try:
+            buckets = list(pool.buckets())
+            ext_recs = pool.ext_rec_list
+            enabled = "yes" if pool.enabled else "no"
+        except Fault:
+            return f"{'damaged':>57}"
+        used = sum(bucket.used_recs for bucket in buckets)
+        used_bytes = sum(bucket.used_recs * bucket.data_size for bucket in buckets)
+        ext_bytes = sum(ext_rec.length for ext_rec in ext_recs)
+        held = (sum(bucket.end - bucket.address for bucket in buckets)
+                + ext_bytes + layout.EXT_REC.size * len(ext_recs))
+        return (f"{used + len(ext_recs):10} {used_bytes + ext_bytes:14} {len(buckets):8} "
+                f"{held:14}  {enabled:7}")
+
+
+class Mempool(gdb.Command):
+    """Look into the memory pools of libObrMemPool, in a program or a core, without running any code."""
+
+    def __init__(self):
+        super().__init__("mempool", gdb.COMMAND_DATA, prefix=True)
+
+
+class MempoolReport(PoolCommand):
+    """Print the report of a pool, as its Dbg does.
+Usage: mempool report NAME [detailed]
+
+With "detailed" as its DbgDetailed does: every bucket and record. Quote a name that ends in "detailed"
+or has quotes or several blanks in a row."""
+
+    def __init__(self):
+        super().__init__("mempool report", gdb.COMMAND_DATA)
+
+    def invoke(self, text, from_tty):
+        words = gdb.string_to_argv(text)
+        if not words:
+            raise gdb.GdbError("Usage: mempool report NAME [detailed]")
+        detailed = len(words) > 1 and words[-1] == "detailed"
+        pool = pool_named(words[:-1] if detailed else words)
+        pieces = []
+        try:
+            for piece in report.report(pool, detailed):
+                pieces.append(piece)
+        except Fault as fault:
+            raise gdb.GdbError(f"The report of {pool.title} ends: {fault}") from None
+        finally:
+            write(pieces)
+
+
+for command in (InfoMempools, Mempool, MempoolReport):
+    command()

@@ -1,0 +1,72 @@
+"""The bytes of the program that gdb looks at, live or a core, and where its registry lies.
+
+Nothing here runs a single instruction of the program. What cannot be read is a Fault, which names
+the address; so is all that the other files find to be damaged.
+"""
+
+import gdb
+
+from . import layout
+
+
+class Fault(Exception):
+    """Something is not as it should be, at an address. The text begins with the thing that is hit."""
+
+    def __init__(self, text, address):
+        super().__init__(text)
+        self.address = address
+
+
+def read(address, length, what):
+    """The `length` bytes of `what` at `address`."""
+    try:
+        return bytes(gdb.selected_inferior().read_memory(address, length))
+    except (gdb.error, OverflowError):
+        pointer = address % 2**64
+        raise Fault(f"{what} at {pointer:#018x}: cannot be read", pointer) from None
+
+
+def read_row(form, address, what):
+    return form.parse(read(address, form.size, what))
+
+
+def read_string(data, what):
+    """The bytes of a std::string of which `data` are the 32 of the object."""
+    string = layout.STRING.parse(data)
+    if string.length > 2**20:
+        raise Fault(f"{what}: a length of {string.length} bytes", string.text)
+    text = read(string.text, string.length + 1, what)
+    if text[-1] != 0:
+        raise Fault(f"{what}: no end behind its {string.length} bytes", string.text)
+    return text[:-1]
+
+
+def name_text(name):
+    """A pool's name as it can be shown: what is no UTF-8, and what gdb cannot write, by its code."""
+    return name.decode("utf-8", "backslashreplace").replace("\0", "\\x00")
+
+
+def registry_addresses():
+    """Where the registries lie: one in each copy of the library that the program has.
+
+    The name is looked for as the linker knows it, which needs no debug information and does not
+    depend on the language of the code that gdb stands in. A copy beyond the first is found by its
+    debug information only.
+    """
+    if not gdb.selected_inferior().threads():
+        raise gdb.GdbError("There is no program: run one, attach to one or load a core.")
+    addresses = []
+    try:
+        with gdb.with_parameter("language", "c"):
+            addresses.append(int(gdb.parse_and_eval("(long) &_ZN3OBR7MemPool8registryE")))
+    except gdb.error:
+        pass
+    for objfile in gdb.objfiles():
+        symbol = objfile.lookup_global_symbol("OBR::MemPool::registry")
+        if symbol is not None:
+            addresses.append(int(symbol.value().address))
+    if not addresses:
+        raise gdb.GdbError(
+            "The pools are not found: the program has no libObrMemPool loaded, or that has neither\n"
+            "debug information nor a symbol table. Use one that is not stripped, or load its symbols.")
+    return list(dict.fromkeys(address % 2**64 for address in addresses))
