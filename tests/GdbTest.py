@@ -7,6 +7,7 @@ of the library without symbols. Where gdb cannot run programs the test is skippe
 
 import os
 import pathlib
+import re
 import struct
 import subprocess
 import time
@@ -108,6 +109,64 @@ class LiveHost(unittest.TestCase):
         self.assertRegex(self.told("mempool report"), "^Usage: mempool report NAME")
         self.assertRegex(self.told("mempool report four short"), "^There is no pool four short")
 
+    def whois(self, expression):
+        return run("mempool whois " + expression)
+
+    def test_tells_what_an_address_is(self):
+        pool = self.pools[LETTERS]
+        bucket = next(pool.buckets())
+        head = (f"   Pool    : {LETTERS}, {pool.address:#018x}\n"
+                f"   Bucket  : 1, {bucket.address:#018x}, group 2, 2 of 3 records used, 16 bytes each\n")
+        records = [f"record {number + 1}, {bucket.recs_base + offset:#018x}, offset {offset}, {state}"
+                   for number, (offset, state) in enumerate(
+                       ((2, "USED"), (18, "FREE, 1 on the free list"), (34, "USED")))]
+        block = evaluate("(long) blocks[7]")
+        middle = (head + f"   Record  : {records[1]}\n   Block   : {block:#018x}, 12 bytes\n"
+                  f"   Ahead   : {records[0]}\n   Behind  : {records[2]}\n")
+        for offset, place in ((0, "is the block of"), (11, "lies 11 bytes into the block of"),
+                              (-1, "lies 3 bytes into the header of")):
+            self.assertEqual(self.whois(f"(char*) blocks[7] + {offset}"),
+                             f"{block + offset:#018x} {place} a free record.\n" + middle)
+        text = self.whois("blocks[6]")
+        self.assertIn("is the block of a used record.\n" + head + f"   Record  : {records[0]}\n", text)
+        self.assertIn(f"   Ahead   : the bucket's header, {bucket.address:#018x}\n", text)
+        self.assertRegex(self.whois("blocks[8]"), r"Behind  : \d+ bytes? ahead of .* at 0x")
+        self.assertIn(f"lies 46 bytes into a bucket's header.\n{head}",
+                      self.whois(str(bucket.recs_base)))
+
+        ext_block = evaluate("(long) extBlocks[1]")
+        text = self.whois("((char*) extBlocks[1] + 36)")
+        self.assertIn(f"{ext_block + 36:#018x} lies 36 bytes into the block of a heap record.\n   Pool    "
+                      f": {LETTERS}, {pool.address:#018x}\n   Record  : heap record 2 of 3, "
+                      f"{ext_block - 24:#018x}, EXT\n   Block   : {ext_block:#018x}, 37 bytes\n", text)
+        text = self.whois("extBlocks[0]")
+        self.assertRegex(text, "(?s)lies 0 bytes into the pool's handle.\n   Pool    : in a block, .*"
+                         "is the block of a heap record.\n   Pool    : " + LETTERS)
+        self.assertIn("lies 8 bytes into the block of a heap", self.whois("(char*) extBlocks[0] + 8"))
+        self.assertIn(f"lies 8 bytes into the pool itself.\n   Pool    : {LETTERS}",
+                      self.whois(str(pool.address + 8)))
+        self.assertIn("lies 0 bytes into the pool's handle.\n   Pool    : off", self.whois("off"))
+        text = self.whois("16")
+        count, start = re.fullmatch(r"""0x0000000000000010 lies in no pool's memory.
+   Behind  : (\d+) bytes ahead of .* at (0x\w+), pool .*
+   Unknown .*\n""", text).groups()
+        self.assertEqual(16 + int(count), int(start, 16))
+        count, start = re.search(r"Ahead   : (\d+) bytes behind the end of the pool's handle at (0x\w+)",
+                                 self.whois("-1")).groups()
+        self.assertEqual(int(start, 16) + 8 + int(count), 2**64 - 1)
+        self.assertIn("the blocks of disabled pools (off) are the heap's own", text)
+        with self.assertRaisesRegex(gdb.error, "may-call-functions is off"):
+            self.whois("letters.Alloc(12)")
+
+        with self.poke(bucket, "freeHead", 0):
+            self.assertIn("FREE, but not found on the free list", self.whois("blocks[7]"))
+        with Poke(block - 12 - 8, b"\3\0"):
+            self.assertIn("offset 2, USED, but its own offset reads 3", self.whois("blocks[6]"))
+        with self.poke(bucket, "parent", 8):
+            text = self.whois("blocks[6]")
+            self.assertIn("lies in no pool's memory", text)
+            self.assertIn(f"   Damaged : pool {LETTERS}: bucket at {bucket.address:#018x}", text)
+
 
 class NextHost(unittest.TestCase):
     """In the order of their names, from where the host stood before."""
@@ -120,6 +179,7 @@ class NextHost(unittest.TestCase):
         self.assertRegex(run("info mempools"), r"\n    100000        1200000      800 .* many\n")
         self.assertEqual(run("mempool report many"), texts[False])
         self.assertEqual(run("mempool report many detailed"), texts[True])
+        self.assertIn("is the block of a used record", run("mempool whois text"))
         self.assertLess(time.process_time() - begin, 5)
 
     def test_2_a_core_of_a_crash_is_read_like_the_program(self):

@@ -2,7 +2,7 @@
 
 import gdb
 
-from . import layout, pools, report
+from . import layout, pools, report, whois
 from .memory import Fault
 
 
@@ -113,5 +113,36 @@ or has quotes or several blanks in a row."""
             write(pieces)
 
 
-for command in (InfoMempools, Mempool, MempoolReport):
+class MempoolWhois(gdb.Command):
+    """Tell which pool, bucket and record an address lies in, used or free, and what lies beside it.
+Usage: mempool whois EXPRESSION
+
+EXPRESSION is a pointer, a number, or an object in memory, whose address is taken. It must not call
+functions of the program."""
+
+    def __init__(self):
+        super().__init__("mempool whois", gdb.COMMAND_DATA, gdb.COMPLETE_EXPRESSION)
+
+    def invoke(self, text, from_tty):
+        if not text.strip():
+            raise gdb.GdbError("Usage: mempool whois EXPRESSION")
+        write(line + "\n" for line in whois.whois(self.address(text)))
+
+    @staticmethod
+    def address(text):
+        with gdb.with_parameter("may-call-functions", False):
+            try:
+                value = gdb.parse_and_eval(text)
+                kind = value.type.strip_typedefs().code
+                if kind in (gdb.TYPE_CODE_REF, gdb.TYPE_CODE_RVALUE_REF):
+                    value = value.referenced_value()
+                    kind = value.type.strip_typedefs().code
+                if kind in (gdb.TYPE_CODE_STRUCT, gdb.TYPE_CODE_UNION, gdb.TYPE_CODE_ARRAY):
+                    value = value.address
+                return int(value) % 2**64
+            except (gdb.error, TypeError, ValueError) as error:
+                raise gdb.GdbError(f"{text}: {error}") from None
+
+
+for command in (InfoMempools, Mempool, MempoolReport, MempoolWhois):
     command()
