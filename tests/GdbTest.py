@@ -5,6 +5,7 @@ the live host and taken back. Environment: HOST; TEST_DIR to write into; STRIP a
 of the library without symbols. Where gdb cannot run programs the test is skipped.
 """
 
+import itertools
 import os
 import pathlib
 import re
@@ -109,6 +110,111 @@ class LiveHost(unittest.TestCase):
         self.assertRegex(self.told("mempool report"), "^Usage: mempool report NAME")
         self.assertRegex(self.told("mempool report four short"), "^There is no pool four short")
 
+    # What may befall a bucket of three records, at the offsets 2, 18 and 34, the first in use.
+    def test_reports_and_checks_a_damaged_bucket(self):
+        bucket = next(self.pools["three"].buckets())
+        base = bucket.recs_base
+        at = f"bucket at {bucket.address:#018x}"
+
+        def record(number):
+            offset = 16 * number - 14
+            return f"{at}, record {number} at {base + offset:#018x}, offset {offset}"
+        link = f"{record(3)}: the link of this free record "
+        other = "which is no record's offset"
+        for offset, code, value, fault in (
+                (34, "H", 18, link + "leads back to offset 18: the free list runs in a circle"),
+                (34, "H", 34, link + "leads back to offset 34: the free list runs in a circle"),
+                (34, "H", 2, link + "leads to offset 2, a used record"),
+                (34, "H", 50, link + "reads 50, " + other),
+                (34, "H", 19, link + "reads 19, " + other),
+                (34, "H", 1, link + "reads 1, " + other),
+                (-2, "H", 65522, f"{at}: freeHead reads 65522, {other}"),
+                (-2, "H", 17, f"{at}: freeHead reads 17, {other}"),
+                (-2, "H", 2, f"{at}: freeHead leads to offset 2, a used record"),
+                (-2, "H", 0, f"{record(2)}: FREE, but not on the free list"),
+                (18, "H", 0, f"{record(3)}: FREE, but not on the free list"),
+                (0, "H", 9, f"{at}: 9 free records of 3"),
+                (0, "H", 1, f"{at}: it tells of 1 free records and lists 2"),
+                (36, "B", 2, f"{record(3)}: its type reads 0x02, neither FREE nor USED"),
+                (20, "B", 7, f"{record(2)}: its type reads 0x07, neither FREE nor USED"),
+                (2, "H", 18, f"{record(1)}: USED, but its own offset reads 18"),
+                (-6, "H", 49, f"{at}: a size of 49, not 50"),
+                (-6, "H", 37, f"{at}: a size of 37, not 50"),
+                (-6, "H", 36, f"{at}: a size of 36, not 50"),
+                (-6, "HH", (1, 1), f"{at}: a record size of 1, not 16"),
+                (-6, "HHH", (47, 15, 1), f"{at}: a record size of 15, not 16"),
+                (-4, "H", 0, f"{at}: a record size of 0, not 16")):
+            values = value if isinstance(value, tuple) else (value,)
+            with Poke(base + offset, struct.pack("<" + code, *values)):
+                self.assertEqual(run("mempool check three"), f"pool three: {fault}\n")
+                text = run("mempool report three detailed")
+                self.assertEqual(text, own_report("three", True), fault)
+
+    def test_checks_every_field(self):
+        pool = self.pools[LETTERS]
+        node = next(address for address, node in pool.registry.nodes() if node.pool == pool.address)
+        group = pool.groups[0]
+        free, full = group.buckets[:2]
+        for form, address, unchecked in (
+                (self.layout.REGISTRY, pool.registry.address, ()),
+                (self.layout.NODE, node, ()),
+                (self.layout.POOL, pool.address, ()),
+                (self.layout.STRING, pool.address, ()),
+                (self.layout.GROUP, group.address, ()),
+                (self.layout.BUCKET, free.address, ()),
+                (self.layout.BUCKET, full.address, ("next2",)),
+                (self.layout.EXT_REC, pool.ext_rec_list[1].address, ()),
+                (self.layout.REC_HDR, free.recs_base + 2, ("guard",)),
+                (self.layout.REC_HDR, free.recs_base + 18, ("guard",))):
+            for field, offset, _ in form.fields:
+                if form is self.layout.EXT_REC and field == "length":
+                    continue  # Most lengths can be.
+                byte, = gdb.selected_inferior().read_memory(address + offset, 1)
+                with Poke(address + offset, bytes([byte[0] ^ 0x80])):
+                    text = self.told(f'mempool check "{LETTERS}"')
+                    self.assertEqual(text.startswith("pool fifteen letters: sound, "),
+                                     field in unchecked, (form.cxx_name, field, text))
+                    self.told(f'mempool report "{LETTERS}" detailed')
+
+    def test_checks_the_lists_and_totals(self):
+        pool = self.fresh(LETTERS)
+        group = pool.groups[0]
+        first, second, last = group.buckets
+        ext_recs = pool.ext_rec_list
+        lower, higher = min(itertools.permutations(ext_recs, 2),
+                            key=lambda pair: (pair[1].address - pair[0].address) % 2**64)
+        wild = "bucket at 0x0000000000000010: cannot be read"
+        name = f"group {group.index} at {group.address:#018x}"
+        for thing, field, value, fault in (
+                (first, "next1", 0x10, wild),
+                (last, "next1", first.address, f"group {group.index}: the list of its buckets runs in "
+                 f"a circle: {first.address:#018x} comes a second time"),
+                (group, "freeBuckets", 0x10, wild),
+                (group, "freeBuckets", 0, f"bucket at {first.address:#018x}: 1 free records, but not "
+                 "on the free-bucket list"),
+                (group, "numBuckets", 4, f"{name}: it tells of 4 buckets and has 3"),
+                (group, "numFreeBuckets", 2,
+                 f"{name}: it tells of 2 buckets with a free record and lists 1"),
+                (second, "prev2", first.address,
+                 f"bucket at {second.address:#018x}: full, but prev2 is not null"),
+                (ext_recs[1], "hdr", b"\xAA\xBB\2\0", "heap record at "
+                 f"{ext_recs[1].address:#018x}: its header reads aa bb 02 00, not aa bb 02 cc"),
+                (pool, "numExtRecs", 4, f"pool at {pool.address:#018x}: it tells of 4 heap records "
+                 "and has 3"),
+                (ext_recs[1], "length", 36,
+                 f"heap record at {ext_recs[1].address:#018x}: a length of 36 bytes"),
+                (lower, "length", higher.address - lower.address,
+                 f"it begins inside of the heap record at {lower.address:#018x}")):
+            with self.poke(thing, field, value):
+                self.assertTrue(run(f'mempool check "{LETTERS}"').endswith(fault + "\n"), fault)
+
+    def test_checks_all_pools(self):
+        lines = run("mempool check").splitlines()
+        self.assertEqual([line.split(": sound, ")[0] for line in lines],
+                         [f"pool {name}" for name in self.pools])
+        self.assertEqual(lines[list(self.pools).index(LETTERS)], f"pool {LETTERS}: sound, 9 used and "
+                         "2 free records in 4 buckets, 3 heap records")
+
     def whois(self, expression):
         return run("mempool whois " + expression)
 
@@ -177,6 +283,7 @@ class NextHost(unittest.TestCase):
         texts = {detailed: own_report("many", detailed) for detailed in (False, True)}
         begin = time.process_time()
         self.assertRegex(run("info mempools"), r"\n    100000        1200000      800 .* many\n")
+        self.assertRegex(run("mempool check"), "many: sound, 100000 used and 100000 free records")
         self.assertEqual(run("mempool report many"), texts[False])
         self.assertEqual(run("mempool report many detailed"), texts[True])
         self.assertIn("is the block of a used record", run("mempool whois text"))
@@ -192,6 +299,8 @@ class NextHost(unittest.TestCase):
         run("kill")
         run(f"core-file {TEST_DIR / 'core'}")
         self.assertEqual(run("mempool report overrun detailed"), live)
+        self.assertRegex(run("mempool check"), "(?m)^pool overrun: bucket at 0x[0-9a-f]+: freeHead "
+                         "reads 65535, which is no record's offset$")
         run("core-file")
 
     def test_3_without_symbols_it_says_so(self):

@@ -2,7 +2,7 @@
 
 import gdb
 
-from . import layout, pools, report, whois
+from . import check, layout, memory, pools, report, whois
 from .memory import Fault
 
 
@@ -70,7 +70,7 @@ are not counted."""
             ext_recs = pool.ext_rec_list
             enabled = "yes" if pool.enabled else "no"
         except Fault:
-            return f"{'damaged':>57}"
+            return f"{'damaged: see mempool check':>57}"
         used = sum(bucket.used_recs for bucket in buckets)
         used_bytes = sum(bucket.used_recs * bucket.data_size for bucket in buckets)
         ext_bytes = sum(ext_rec.length for ext_rec in ext_recs)
@@ -144,5 +144,29 @@ functions of the program."""
                 raise gdb.GdbError(f"{text}: {error}") from None
 
 
-for command in (InfoMempools, Mempool, MempoolReport, MempoolWhois):
+class MempoolCheck(PoolCommand):
+    """Check every invariant of the memory of a pool, or of all pools and the registry.
+Usage: mempool check [NAME]
+
+The first that is broken is told with its address."""
+
+    def __init__(self):
+        super().__init__("mempool check", gdb.COMMAND_DATA)
+
+    def invoke(self, text, from_tty):
+        words = gdb.string_to_argv(text)
+        found = [pool_named(words)] if words else pools.all_pools()[0]
+        for address in memory.registry_addresses():
+            try:
+                check.check_registry(pools.Registry(address))
+            except Fault as fault:
+                write(f"{fault}\n")
+        for pool in found:
+            try:
+                write(f"pool {pool.title}: sound, {check.check_pool(pool)}\n")
+            except Fault as fault:
+                write(f"pool {pool.title}: {fault}\n")
+
+
+for command in (InfoMempools, Mempool, MempoolReport, MempoolWhois, MempoolCheck):
     command()
