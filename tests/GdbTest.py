@@ -273,6 +273,14 @@ class LiveHost(unittest.TestCase):
             self.assertIn("lies in no pool's memory", text)
             self.assertIn(f"   Damaged : pool {LETTERS}: bucket at {bucket.address:#018x}", text)
 
+    def test_prints_values(self):
+        self.assertEqual(run("output letters"), f'pool "{LETTERS}", 12 blocks, 4 buckets')
+        self.assertEqual(run("output off"), 'pool "off", disabled')
+        self.assertEqual(run("output numbers"), "OBR::vector of length 3, capacity 4 = {1, 2, 3}")
+        text = run(f"output *(OBR::MemPool::BucketMgr*) {self.pools[LETTERS].address}")
+        self.assertIn(f'pool "{LETTERS}", 12 blocks, 4 buckets = {{', text)
+        self.assertRegex(text, "minRecordSize = 8,")
+
 
 class NextHost(unittest.TestCase):
     """In the order of their names, from where the host stood before."""

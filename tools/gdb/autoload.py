@@ -5,6 +5,8 @@ links are followed. A program that has the library linked in statically sources 
 import os
 import sys
 
+import gdb
+
 # Where a script of the user's starts the program, __file__ is still that script.
 this_file = (lambda: None).__code__.co_filename
 folder = os.path.dirname(os.path.realpath(this_file))
@@ -12,3 +14,6 @@ if folder not in sys.path:
     sys.path.insert(0, folder)
 
 import obrmempool.commands  # noqa: E402  (The path is set above.)
+import obrmempool.printers  # noqa: E402
+
+obrmempool.printers.register(gdb.current_objfile())
