@@ -31,16 +31,17 @@ inline std::string Lines(const std::string& shorthand) {
 
 class TextSource final : public Trace::ByteSource {
 public:
-    explicit TextSource(std::string bytes) : rest(std::move(bytes)) {}
+    explicit TextSource(std::string text) : whole(std::move(text)) {}
     std::size_t Read(char* bytes, std::size_t size) override {
-        const std::size_t number = rest.copy(bytes, std::min<std::size_t>(size, 7));
-        rest.erase(0, number);
+        const std::size_t number = whole.copy(bytes, std::min<std::size_t>(size, 7), numRead);
+        numRead += number;
         return number;
     }
     std::string Problem() const override { return ""; }
 
 private:
-    std::string rest;
+    std::string whole;
+    std::size_t numRead = 0;
 };
 
 inline std::unique_ptr<Trace::TextReader> ReadLines(const std::string& lines) {

@@ -26,6 +26,7 @@ int Run(int argc, char** argv) {
     });
 
     Tool::AddReplay(program);
+    Tool::AddText(program);
 
     const std::string first = argc > 1 ? argv[1] : "-";
     const auto isFirst = [&](const CLI::App* sub) { return sub->check_name(first); };

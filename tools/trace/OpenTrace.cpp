@@ -7,13 +7,18 @@
 #include <system_error>
 #include <utility>
 
+#include "trace/CompactForm.hpp"
+#include "trace/CompactReader.hpp"
 #include "trace/GzSource.hpp"
 #include "trace/TextReader.hpp"
 
 namespace Trace {
 
 std::unique_ptr<EventSource> MakeReader(Input input) {
-    // A form that is not text is told from it here, by what input.Ahead() begins with.
+    while (input.Ahead().size() < compactMagic.size() && input.ReadMore()) {}
+    if (input.Ahead().substr(0, compactMagic.size()) == compactMagic) {
+        return std::make_unique<CompactReader>(std::move(input));
+    }
     return std::make_unique<TextReader>(std::move(input));
 }
 

@@ -1,0 +1,183 @@
+// The compact form against the lines that it stands for, whole, cut anywhere and damaged anywhere,
+// and `mempool text`, which turns it into these lines.
+
+#include <cstddef>
+#include <memory>
+#include <random>
+#include <string>
+#include <string_view>
+
+#include <gtest/gtest.h>
+
+#include "Shell.hpp"
+#include "TraceLines.hpp"
+#include "trace/CompactForm.hpp"
+#include "trace/CompactWriter.hpp"
+#include "trace/OpenTrace.hpp"
+#include "trace/TextWriter.hpp"
+
+namespace {
+
+const std::string everyKind =
+    Lines(
+        "@c:P\n@n:P:main() (a.c:5)\n@a:P:X:18446744073709551615\n@a:P:Y:0\n@f:P:Y:\n@f:P:X:\n"
+        "@c:Q\n@a:Q:X:4096\n@a:P:X:127\n@a:P:Y:128\n@x:P\n@d:P\n@f:Q:Y:\n@d:Q\n") +
+    "xmpt:a:ffffffffffffffff:8000000000000001:3\nxmpt:a:0000000000000000:0000000000000000:3\n"
+    "xmpt:i:program:jq :. \nxmpt:i::\n";
+
+std::string Compact(const std::string& lines) {
+    std::string file;
+    Trace::CompactWriter writer([&](std::string_view bytes) { file += bytes; });
+    const auto reader = ReadLines(lines);
+    Trace::Event event;
+    while (reader->Next(event)) { writer.Write(event); }
+    writer.Finish();
+    return file;
+}
+
+struct Text {
+    std::string lines;
+    std::string problem;
+    std::size_t position = 0;
+};
+Text ReadText(const std::string& file) {
+    const auto reader = Trace::MakeReader(Trace::Input(std::make_unique<TextSource>(file)));
+    Text text;
+    Trace::Event event;
+    while (reader->Next(event)) { Trace::AppendLine(text.lines, event); }
+    text.problem = reader->Problem();
+    text.position = reader->Position();
+    return text;
+}
+
+TEST(Compact, IsReadAsTheLinesThatWereWritten) {
+    const Text text = ReadText(Compact(everyKind));
+    EXPECT_EQ(text.lines, everyKind);
+    EXPECT_EQ(text.problem, "");
+    EXPECT_EQ(text.position, 18U);
+    EXPECT_EQ(ReadText(Compact("")).lines, "");
+}
+
+// More than one block, and more pools than have an index at a time.
+TEST(Compact, HoldsLongTraces) {
+    std::mt19937_64 random(1);
+    std::string lines;
+    Trace::Event event;
+    for (std::size_t count = 0; count != Trace::maxPools + 5000; ++count) {
+        event = {Trace::Kind::Created, random(), random(), random() >> random() % 64, {}, {}};
+        for (const auto kind : {Trace::Kind::Created, Trace::Kind::Allocated, Trace::Kind::Freed}) {
+            event.kind = kind;
+            Trace::AppendLine(lines, event);
+        }
+    }
+    event = {Trace::Kind::Named, event.pool, 0, 0, {}, {}};
+    const std::string name(Trace::maxTextSize, 'n');
+    event.text = name;
+    Trace::AppendLine(lines, event);
+    const std::string file = Compact(lines);
+    EXPECT_TRUE(ReadText(file).lines == lines);
+    EXPECT_LT(file.size() * 3, lines.size());
+
+    // What is too long for a text is cut.
+    lines.insert(lines.size() - 1, "x");
+    EXPECT_EQ(ReadText(Compact(lines)).lines.size(), lines.size() - 1);
+}
+
+// A recorder tells neither the pool of a block that is released, nor who missed its end.
+TEST(Compact, KnowsWhereAReleasedBlockLies) {
+    std::string file;
+    Trace::CompactWriter writer([&](std::string_view bytes) { file += bytes; });
+    const auto allocate = [&](std::uint64_t pool, std::uint64_t block) {
+        writer.Write({Trace::Kind::Allocated, pool, block, 8, {}, {}});
+    };
+    writer.WriteOwned();
+    writer.WriteThread(1);
+    allocate(0x6a1200, 0x10);
+    allocate(0x6a1300, 0x20);
+    writer.WriteReleased(0x30);
+    writer.WriteReleased(0x10);
+    writer.WriteReleased(0x10);
+    writer.WriteThread(2);
+    writer.WriteReleased(0x20);
+    allocate(0x6a1300, 0x20);
+    allocate(0x6a1200, 0x20);
+    writer.WriteReleased(0x20);
+    writer.Finish();
+    const std::string p = Lines(":P:00000000000000");
+    const std::string q = Lines(":Q:00000000000000");
+    EXPECT_EQ(ReadText(file).lines, "xmpt:a" + p + "10:8\nxmpt:a" + q + "20:8\nxmpt:f" + p +
+                                        "10:\nxmpt:f" + q + "20:\nxmpt:a" + q + "20:8\nxmpt:f" + q +
+                                        "20:\nxmpt:a" + p + "20:8\nxmpt:f" + p +
+                                        "20:\nxmpt:i:foreign_frees:1\n");
+}
+
+TEST(Compact, IsReadAsFarAsItGoes) {
+    // Two blocks.
+    std::string file;
+    {
+        Trace::CompactWriter writer([&](std::string_view bytes) { file += bytes; });
+        const auto reader = ReadLines(everyKind);
+        Trace::Event event;
+        while (reader->Next(event)) {
+            writer.Write(event);
+            if (event.kind == Trace::Kind::Cleared) { writer.Flush(); }
+        }
+        writer.Finish();
+    }
+    ASSERT_EQ(ReadText(file).lines, everyKind);
+    const std::size_t firstBlock = everyKind.find("xmpt:d");
+    for (std::size_t size = Trace::compactMagic.size(); size != file.size(); ++size) {
+        const Text text = ReadText(file.substr(0, size));
+        EXPECT_EQ(text.problem, "unexpected end of file") << size;
+        EXPECT_EQ(text.lines, everyKind.substr(0, text.lines.size())) << size;
+        if (size > file.size() - 20) { EXPECT_GE(text.lines.size(), firstBlock) << size; }
+    }
+    EXPECT_EQ(ReadText(file + "x").problem, "there is more behind its end");
+    for (std::size_t bit = 8 * Trace::compactMagic.size(); bit != 8 * file.size(); ++bit) {
+        std::string damaged = file;
+        damaged[bit / 8] = static_cast<char>(damaged[bit / 8] ^ 1 << bit % 8);
+        const Text text = ReadText(damaged);
+        EXPECT_EQ(text.lines, everyKind.substr(0, text.lines.size())) << bit;
+        EXPECT_TRUE(!text.problem.empty() || text.lines == everyKind) << bit;
+    }
+}
+
+// Records that no writer writes, in a block whose checksum is right.
+TEST(Compact, RefusesSenselessRecords) {
+    for (const std::string record : {"\x02\x07", "\x0f", "\x08\x80", "\x0b\x05xy", "\x09",
+                                     "\x08\xff\xff\xff\xff\xff\xff\xff\xff\xff\xff\xff\x01"}) {
+        std::string block(1000, '\0');
+        const std::string plain = std::string("\x09\x01", 2) + record;
+        block.resize(ZSTD_compress(block.data(), block.size(), plain.data(), plain.size(), 1));
+        std::string file(Trace::compactMagic);
+        for (const std::size_t size : {block.size(), plain.size()}) {
+            file += std::string(1, static_cast<char>(size)) + std::string(3, '\0');
+        }
+        file += block + std::string(8, '\0');
+        EXPECT_EQ(ReadText(file).problem, "damaged") << testing::PrintToString(record);
+    }
+}
+
+TEST(TextCommand, PrintsAnyTrace) {
+    const std::string command = MEMPOOL " text ";
+    Shell::WriteFile("compact", Compact(everyKind));
+    Shell::WriteFile("lines", "before\n>" + everyKind + "after\n");
+    Shell::WriteFile("bad", "xmpt:q\n" + everyKind);
+    Shell::WriteFile("none", "xmpt:q\nno\n");
+    Shell::WriteFile("cut", Compact(everyKind).substr(0, 60));
+    EXPECT_EQ(Shell::Output(command + "compact"), everyKind);
+    EXPECT_EQ(Shell::Output("gzip -c compact | " + command + "-"), everyKind);
+    EXPECT_EQ(Shell::Output(command + "lines"), everyKind);
+    EXPECT_EQ(Shell::Output(command + "bad 2>&1 >/dev/null"),
+              "mempool: bad: 1 malformed lines left out\n");
+    EXPECT_EQ(Shell::Output(command + "- <none", 1),
+              "mempool: standard input: 1 malformed lines left out\n"
+              "mempool: standard input: no trace line\n");
+    EXPECT_EQ(Shell::Output(command + "cut", 1),
+              "mempool: cut: unexpected end of file; read as far as it goes\n");
+    EXPECT_EQ(Shell::Output(command + "lost", 1), "mempool: lost: No such file or directory\n");
+    EXPECT_EQ(Shell::Output(command + "compact >/dev/full", 1),
+              "mempool: standard output: No space left on device\n");
+}
+
+}  // namespace
