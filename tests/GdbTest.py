@@ -1,7 +1,7 @@
 """Run by gdb on GdbHost: what the commands tell, beside what the library and the host know.
 
-The library's own report is called for; the commands themselves call nothing. Damage is written into
-the live host and taken back. Environment: HOST; TEST_DIR to write into; STRIP and LIBRARY for a copy
+The host is asked for the library's own report; nothing is called. Damage is written into the live
+host and taken back. Environment: HOST; TEST_DIR to write into; STRIP and LIBRARY for a copy
 of the library without symbols. Where gdb cannot run programs the test is skipped.
 """
 
@@ -31,8 +31,19 @@ def evaluate(expression):
 
 def own_report(name, detailed):
     path = TEST_DIR / "report.txt"
-    gdb.parse_and_eval(f'Report("{name}", {int(detailed)}, "{path}")')
+    inferior = gdb.selected_inferior()
+    for variable, value in (("askedName", os.fsencode(name) + b"\0"),
+                            ("askedPath", os.fsencode(path) + b"\0"),
+                            ("askedDetailed", bytes([detailed])), ("asked", b"\1")):
+        inferior.write_memory(evaluate(f"(long) &{variable}"), value)
+    go_on()
     return path.read_text()
+
+
+def go_on():
+    """To the next stop of the host, in its main."""
+    run("continue")
+    run("up")
 
 
 class Poke:
@@ -286,8 +297,7 @@ class NextHost(unittest.TestCase):
     """In the order of their names, from where the host stood before."""
 
     def test_1_is_quick_with_100000_blocks(self):
-        run("continue")
-        run("up")
+        go_on()
         texts = {detailed: own_report("many", detailed) for detailed in (False, True)}
         begin = time.process_time()
         self.assertRegex(run("info mempools"), r"\n    100000        1200000      800 .* many\n")

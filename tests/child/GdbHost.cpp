@@ -1,5 +1,5 @@
-// A host for gdb to look at: pools of every kind, a call by which gdb has the library write its own
-// report, and a crash at the end. Its debug information describes the library's structs.
+// A host for gdb to look at: pools of every kind, reports that it writes when gdb asks for them,
+// and a crash at the end. Its debug information describes the library's structs.
 
 #include <malloc.h>
 #include <MemPool>
@@ -16,11 +16,21 @@ using namespace OBR::MemPool;
 const MgrRegistry* registryOfNone = nullptr;
 const ExtRec* extRecOfNone = nullptr;
 
-extern "C" void Report(const char* name, bool detailed, const char* path) {
-    const std::ofstream file(path);
+// The report that gdb asks for: it sets these while the host stands in Ready and lets it go on. It
+// calls nothing, since gdb cannot do that on a processor with registers that it does not know.
+char askedName[64] = "";
+char askedPath[4096] = "";
+bool asked = false;
+bool askedDetailed = false;
+
+bool ReportIfAsked() {
+    if (!asked) { return false; }
+    asked = false;
+    const std::ofstream file(askedPath);
     std::streambuf* const screen = std::cout.rdbuf(file.rdbuf());
-    detailed ? GetMgr(name)->DbgDetailed() : GetMgr(name)->Dbg();
+    askedDetailed ? GetMgr(askedName)->DbgDetailed() : GetMgr(askedName)->Dbg();
     std::cout.rdbuf(screen);
+    return true;
 }
 
 extern "C" void Ready() {
@@ -73,7 +83,7 @@ int main() {
     OBR::vector<int> numbers;
     for (const int number : {1, 2, 3}) { numbers.push_back(number); }
 
-    Ready();
+    do { Ready(); } while (ReportIfAsked());
 
     // 100000 blocks, and as many free records between them.
     NUV_OBR_MEMPOOL_ON(true);
@@ -88,7 +98,7 @@ int main() {
     mallopt(M_TOP_PAD, 0);  // From now on the heap ends with its newest block.
     Mgr overrun("overrun");
     auto* const text = static_cast<char*>(overrun.Alloc(12));
-    Ready();
+    do { Ready(); } while (ReportIfAsked());
 
     // The header of the next record goes, and with it the way to the free one behind.
     for (int index = 0; index < 15; ++index) { text[index] = '\xFF'; }
