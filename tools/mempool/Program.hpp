@@ -18,6 +18,7 @@ struct Program {
 // One line a subcommand, each in the file of its name; main.cpp calls them in the order of the
 // help.
 void AddReplay(Program& program);
+void AddReport(Program& program);
 void AddText(Program& program);
 
 }  // namespace Tool

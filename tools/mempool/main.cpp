@@ -26,6 +26,7 @@ int Run(int argc, char** argv) {
     });
 
     Tool::AddReplay(program);
+    Tool::AddReport(program);
     Tool::AddText(program);
 
     const std::string first = argc > 1 ? argv[1] : "-";

@@ -1,0 +1,106 @@
+// mempool report: what a trace tells about the memory of its program.
+
+#include "mempool/Report.hpp"
+
+#include <cerrno>
+#include <cstdlib>
+#include <exception>
+#include <fstream>
+#include <iostream>
+#include <memory>
+#include <new>
+#include <sstream>
+#include <stdexcept>
+#include <string>
+#include <system_error>
+
+#include "mempool/Print.hpp"
+#include "mempool/Program.hpp"
+#include "mempool/Progress.hpp"
+#include "mempool/Settings.hpp"
+#include "report/Analysis.hpp"
+#include "report/Json.hpp"
+
+namespace Tool {
+
+namespace {
+
+constexpr const char* description =
+    "Tell from a trace where a program's memory is: by size, lifetime and group";
+
+constexpr const char* notes =
+    R"(Nothing runs anew: the trace is read once, and what pools and heap would hold is worked out by the
+rules of the library and of the C library's malloc.
+
+event         An allocation, a release, a Clear, and the begin or the end of a pool.
+group         What the recording has traced as one pool. Those of one name count as one.
+the peak      The first moment with the most bytes asked for.
+bytes held    Of pools: buckets, heap records and tables. Of the heap: its blocks as it rounds them.
+              Malloc's own 8 bytes a block, and what lies unused between blocks, are left out.
+records       The share of blocks that fit into a bucket. The others are heap records.
+padding       Bytes that rounding adds to those.
+short, never  The shares of blocks that are freed within 100 events, and that are not freed until
+              their pool or the trace ends.
+together      The share of blocks that die in a row of two or more, without an allocation of their
+              group between.
+clear         Of these, those of rows that leave nothing of the group alive: one Clear of a pool
+              would do.
+
+--json has the exact figures; docs/report.md tells its keys.
+)";
+
+struct Options {
+    ReportOptions report;
+    std::string path;
+    bool all = false;
+};
+
+int ReportOn(const Options& options) {
+    ReportOptions report = options.report;
+    if (options.all) { report.extent = Extent::All; }
+    try {
+        Trace::StepReader reader(options.path);
+        return WriteReport(reader, report);
+    } catch (const std::bad_alloc&) {
+        std::cerr << "mempool: " << options.path << ": out of memory\n";
+    }
+    return EXIT_FAILURE;
+}
+
+}  // namespace
+
+int WriteReport(Trace::StepReader& reader, const ReportOptions& options) {
+    const std::string problem = options.settings.Problem();
+    if (!problem.empty()) { throw std::runtime_error("these settings make no pool: " + problem); }
+    const Progress progress(reader.Name());
+    const Report::Analysis analysis = Report::Analyse(reader, options.settings, [&](auto position) {
+        progress.Show("line " + std::to_string(position));
+    });
+    progress.Clear();
+
+    if (options.json) {
+        std::cout << Report::ToJson(analysis) << '\n';
+    } else {
+        std::ostringstream badLines;
+        PrintBadLines(badLines, reader);
+        PrintAnalysis(std::cout, analysis, options.extent, badLines.str());
+    }
+    std::cout << std::flush;
+    return WarnOfBrokenTrace(reader);
+}
+
+void AddReport(Program& program) {
+    CLI::App& report = *program.commandLine.add_subcommand("report", description);
+    report.footer(notes);
+    const auto options = std::make_shared<Options>();
+    report.add_option("TRACE", options->path, "File to report on; - is standard input")
+        ->required()
+        ->type_name("");
+    report.add_flag("--json", options->report.json, "Print all figures as JSON");
+    report.add_flag("--all", options->all, "Print every size and every group");
+    AddSettings(report, options->report.settings);
+    report.callback(
+        [&program, options] { program.job = [options] { return ReportOn(*options); }; });
+}
+
+}  // namespace Tool

@@ -1,0 +1,67 @@
+// How blocks of a group of the recording die: a *run* is a row of releases without an allocation of
+// that group between. Blocks of a run of two or more die together. If the run leaves nothing of the
+// group alive, one Clear of a pool of its own would do instead.
+
+#ifndef OBR_TOOLS_REPORT_RUNS_HPP
+#define OBR_TOOLS_REPORT_RUNS_HPP
+
+#include <algorithm>
+#include <array>
+#include <cstddef>
+#include <cstdint>
+
+namespace Report {
+
+// Runs of 2 to 9 blocks, of 10 to 99, and so on, and in the last all that are longer.
+constexpr std::size_t numLengths = 7;
+constexpr std::size_t LengthBin(std::uint64_t numBlocks) {
+    std::size_t bin = 0;
+    for (std::uint64_t bound = 10; numBlocks >= bound && bin + 1 < numLengths; bound *= 10) {
+        ++bin;
+    }
+    return bin;
+}
+
+class Runs {
+public:
+    void Release(std::uint64_t numBlocks) { current += numBlocks; }
+
+    // The next allocation, or the end. `numLive` are the blocks of the group that the run has left.
+    void End(std::uint64_t numLive) {
+        if (current >= 2) {
+            ++numRuns;
+            together += current;
+            byLength[LengthBin(current)] += current;
+            longest = std::max(longest, current);
+            if (numLive == 0) {
+                ++numClears;
+                clearable += current;
+            }
+        }
+        current = 0;
+    }
+
+    // Those of another group, of which none goes on.
+    void Add(const Runs& other) {
+        numRuns += other.numRuns;
+        together += other.together;
+        for (std::size_t bin = 0; bin < numLengths; ++bin) { byLength[bin] += other.byLength[bin]; }
+        longest = std::max(longest, other.longest);
+        numClears += other.numClears;
+        clearable += other.clearable;
+    }
+
+    std::uint64_t numRuns = 0;                            // Of two blocks or more.
+    std::uint64_t together = 0;                           // Their blocks.
+    std::uint64_t longest = 0;                            // Blocks of the longest.
+    std::array<std::uint64_t, numLengths> byLength = {};  // Blocks by the length of their run.
+    std::uint64_t numClears = 0;  // Those of the runs that leave nothing alive.
+    std::uint64_t clearable = 0;  // Their blocks.
+
+private:
+    std::uint64_t current = 0;  // Blocks of the run that goes on.
+};
+
+}  // namespace Report
+
+#endif

@@ -1,0 +1,48 @@
+// The blocks by their size. Sizes up to 1024 stand for themselves; above that an eighth of a power
+// of two shares a row, so that a trace of any sizes makes a table of bounded length.
+
+#ifndef OBR_TOOLS_REPORT_SIZES_HPP
+#define OBR_TOOLS_REPORT_SIZES_HPP
+
+#include <cstddef>
+#include <cstdint>
+#include <vector>
+
+#include "report/Tally.hpp"
+
+namespace Report {
+
+struct SizeRow {
+    std::uint32_t smallest = 0;  // That occurs.
+    std::uint32_t largest = 0;
+    Tally tally;
+};
+
+class Sizes {
+public:
+    SizeRow& Row(std::uint32_t size) {
+        const std::size_t place = PlaceOf(size);
+        if (place >= rows.size()) { rows.resize(place + 1); }
+        return rows[place];
+    }
+
+    // With those that no block has.
+    const std::vector<SizeRow>& Rows() const { return rows; }
+
+private:
+    // Ranges end with a power of two or an eighth of it, which real sizes often are.
+    static std::size_t PlaceOf(std::uint32_t size) {
+        constexpr std::uint32_t exact = 1024;
+        if (size <= exact) { return size; }
+        const std::uint32_t below = size - 1;
+        std::uint32_t shift = 0;
+        while (below >> shift >= 2 * exact) { ++shift; }
+        return exact + 1 + shift * 8 + ((below >> shift) - exact) / (exact / 8);
+    }
+
+    std::vector<SizeRow> rows;
+};
+
+}  // namespace Report
+
+#endif

@@ -1,0 +1,84 @@
+// The figures of a set of blocks: all of them, those of one size, or those of one group of the
+// recording. A tally is told of each block that comes and goes.
+
+#ifndef OBR_TOOLS_REPORT_TALLY_HPP
+#define OBR_TOOLS_REPORT_TALLY_HPP
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+
+namespace Report {
+
+struct BlockSum {
+    std::uint64_t blocks = 0;
+    std::uint64_t bytes = 0;  // Asked for.
+
+    void Add(std::uint32_t size) {
+        ++blocks;
+        bytes += size;
+    }
+    void Remove(std::uint32_t size) {
+        --blocks;
+        bytes -= size;
+    }
+    void Add(const BlockSum& other) {
+        blocks += other.blocks;
+        bytes += other.bytes;
+    }
+};
+
+// Lifetimes in events of the trace, from the allocation to the release, in bins: within 10, above
+// that within 100, and so on, and in the last all that are longer.
+constexpr std::size_t numLifetimes = 10;
+constexpr std::size_t LifetimeBin(std::uint64_t events) {
+    std::size_t bin = 0;
+    for (std::uint64_t bound = 10; events > bound && bin + 1 < numLifetimes; bound *= 10) { ++bin; }
+    return bin;
+}
+
+struct Tally {
+    BlockSum all;
+    BlockSum inRecords;  // Of these, those that go into buckets. The others are heap records.
+    std::uint64_t padding = 0;  // Bytes that rounding adds to those in buckets.
+    BlockSum live;
+    std::array<std::uint64_t, numLifetimes> lifetimes = {};  // Blocks that were released.
+    std::uint64_t dropped = 0;  // Of these, those that went when their pool was cleared.
+    std::uint64_t never = 0;    // Alive when their pool was destroyed, or at the end.
+
+    BlockSum atPeak;  // What lived at the peak of the trace, once that is finished.
+
+    // Ahead of each change of `live`, at the event with this number. `peak` is that of the peak so
+    // far. What lives there is kept when the first change behind it comes, so that a new peak costs
+    // nothing.
+    void Change(std::uint64_t event, std::uint64_t peak) {
+        if (changed <= peak) { atPeak = live; }
+        changed = event;
+    }
+
+    // At the end of the trace.
+    void Finish(std::uint64_t peak) {
+        if (changed <= peak) { atPeak = live; }
+        never += live.blocks;
+    }
+
+    void Add(const Tally& other);
+
+private:
+    std::uint64_t changed = 0;  // The event of the last change.
+};
+
+inline void Tally::Add(const Tally& other) {
+    all.Add(other.all);
+    inRecords.Add(other.inRecords);
+    padding += other.padding;
+    live.Add(other.live);
+    for (std::size_t bin = 0; bin < numLifetimes; ++bin) { lifetimes[bin] += other.lifetimes[bin]; }
+    dropped += other.dropped;
+    never += other.never;
+    atPeak.Add(other.atPeak);
+}
+
+}  // namespace Report
+
+#endif
