@@ -1,0 +1,256 @@
+// Runs a program that is already there on pools, unchanged:
+//
+//     LD_PRELOAD=build/release/examples/libMallocOnPools.so NUV_OBR_MEMPOOL_BUCKET_SIZE=65535 perl
+//     ...
+//
+// It takes the place of the malloc family. Blocks up to the largest record of its one Heap come
+// from there, aligned to 16 bytes as malloc promises; larger ones stay with the C library, which
+// can grow them in place. The settings are those of the environment, except that pools are on
+// unless NUV_OBR_MEMPOOL_ON says no (then every block is the C library's), and that there is no
+// trace. MALLOC_ON_POOLS_REPORT=FILE appends the pool's report to FILE when a process exits.
+//
+// Threads: a heap has no lock of its own, so that calls take one here as soon as the process has a
+// second thread. It works then, but no better than any one lock: this is for programs without
+// threads.
+//
+// Whose block? A block of the C library has its size in the 8 bytes ahead of it, so that the 4
+// bytes directly ahead are 0 below 4 GB, and never look like what a Heap writes there. A Heap thus
+// refuses such a block by one look at it, whenever and by whomever it was made: before this library
+// was ready, in another thread, or by the C library itself.
+
+#include <MemPoolHeap>
+
+#include <dlfcn.h>
+#include <pthread.h>
+#include <sys/single_threaded.h>
+
+#include <algorithm>
+#include <atomic>
+#include <cerrno>
+#include <cstddef>
+#include <cstdint>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <exception>
+#include <fstream>
+#include <iostream>
+#include <mutex>
+#include <new>
+
+// The C library's own functions, by names that nobody takes the place of.
+// NOLINTBEGIN(bugprone-reserved-identifier)
+extern "C" {
+void* __libc_malloc(std::size_t size);
+void* __libc_calloc(std::size_t count, std::size_t size);
+void* __libc_realloc(void* block, std::size_t size);
+void* __libc_memalign(std::size_t alignment, std::size_t size);
+void __libc_free(void* block);
+}
+// NOLINTEND(bugprone-reserved-identifier)
+
+namespace {
+
+using OBR::MemPool::Heap;
+using OBR::MemPool::HeapSettings;
+
+constexpr std::size_t alignmentOfMalloc = 16;
+
+Heap* heap = nullptr;  // Lives from the start-up to the end of the process, behind all exit steps.
+
+// Blocks of fewer bytes than that come from the heap. 0 while it must not be asked: ahead of the
+// start-up, while it reports, and while its exhaustion is on its way to the caller.
+std::atomic<std::size_t> limit{0};
+std::size_t usualLimit = 0;  // What it is otherwise.
+
+std::recursive_mutex mutex;  // A report, and an exception, give blocks back on their way.
+
+class Lock {
+public:
+    Lock() : isHeld(__libc_single_threaded == 0) {
+        if (isHeld) { mutex.lock(); }
+    }
+    Lock(const Lock&) = delete;
+    Lock& operator=(const Lock&) = delete;
+    ~Lock() {
+        if (isHeld) { mutex.unlock(); }
+    }
+
+private:
+    const bool isHeld;  // The first thread may come or go meanwhile.
+};
+
+void* Fail(int error) {
+    errno = error;
+    return nullptr;
+}
+
+// A block of the heap; null, with the reason in errno, if there is no memory.
+void* Take(std::size_t size, std::size_t alignment) {
+    const Lock lock;
+    try {
+        return heap->Allocate(size, alignment);
+    } catch (const std::bad_alloc&) {
+        limit = usualLimit;
+        return Fail(ENOMEM);
+    }
+}
+
+// False for what is no block of the heap.
+bool GiveBack(void* block) {
+    const Lock lock;
+    return heap != nullptr && heap->Free(block);
+}
+
+// 0 for what is no block of the heap.
+std::size_t Usable(void* block) {
+    const Lock lock;
+    return heap != nullptr ? heap->UsableSize(block) : 0;
+}
+
+void* Aligned(std::size_t alignment, std::size_t size) {
+    alignment = std::max(alignment, alignmentOfMalloc);
+    if (alignment <= 4096 && size + alignment - alignmentOfMalloc < limit) {
+        return Take(size, alignment);
+    }
+    return __libc_memalign(alignment, size);
+}
+
+bool IsPowerOfTwo(std::size_t number) {
+    return number != 0 && (number & (number - 1)) == 0;
+}
+
+using UsableSizeOfLibrary = std::size_t (*)(void*);
+UsableSizeOfLibrary usableSizeOfLibrary = nullptr;
+
+void FindUsableSize() {
+    usableSizeOfLibrary =
+        reinterpret_cast<UsableSizeOfLibrary>(dlsym(RTLD_NEXT, "malloc_usable_size"));
+}
+
+// Behind the start-up of the library, which reads the environment.
+__attribute__((constructor)) void StartUp() {
+    using namespace OBR::MemPool;  // NOLINT(google-build-using-namespace)
+    FindUsableSize();
+    if (std::getenv("NUV_OBR_MEMPOOL_ON") != nullptr && !NUV_OBR_MEMPOOL_ON()) { return; }
+    NUV_OBR_MEMPOOL_TRACE(false);  // Its lines would allocate, which is an event to be traced.
+    try {
+        heap = new Heap("malloc", HeapSettings().On(true));
+    } catch (const std::exception& error) {
+        std::fprintf(stderr, "MallocOnPools: %s\n", error.what());
+        std::_Exit(1);
+    }
+    // Whoever forks holds the lock, so that the child finds the heap whole. There the lock is new:
+    // the child's thread is another than the one that holds it.
+    pthread_atfork([] { mutex.lock(); }, [] { mutex.unlock(); },
+                   [] { ::new (&mutex) std::recursive_mutex; });
+
+    // A block takes up to 16 bytes more: the record's header, and the way to its alignment.
+    const std::size_t record = NUV_OBR_MEMPOOL_MAX_RECORD_SIZE();
+    usualLimit = record < 2 * alignmentOfMalloc ? 0 : ((record - alignmentOfMalloc) & ~7U) + 1;
+    limit = usualLimit;
+}
+
+__attribute__((destructor)) void Report() {
+    const char* const name = std::getenv("MALLOC_ON_POOLS_REPORT");
+    if (name == nullptr || heap == nullptr) { return; }
+    const Lock lock;
+    limit = 0;
+    std::ofstream file(name, std::ios::app);
+    std::streambuf* const output = std::cout.rdbuf(file.rdbuf());
+    heap->GetMgr().Dbg();
+    std::cout.rdbuf(output);
+    if (!file.flush()) { std::fprintf(stderr, "MallocOnPools: cannot write %s\n", name); }
+    limit = usualLimit;
+}
+
+}  // namespace
+
+// What the pool itself asks for comes from the C library. These are this library's own: a program's
+// new and delete end in the malloc below. Throwing asks malloc for the exception's memory.
+void* operator new(std::size_t size) {
+    void* const block = __libc_malloc(size);
+    if (block == nullptr) {
+        limit = 0;
+        throw std::bad_alloc();
+    }
+    return block;
+}
+void operator delete(void* block) noexcept {
+    __libc_free(block);
+}
+void operator delete(void* block, std::size_t) noexcept {
+    __libc_free(block);
+}
+
+extern "C" {
+
+void* malloc(std::size_t size) noexcept {
+    return size < limit.load(std::memory_order_relaxed) ? Take(size, alignmentOfMalloc)
+                                                        : __libc_malloc(size);
+}
+
+void free(void* block) noexcept {
+    if (block != nullptr && !GiveBack(block)) { __libc_free(block); }
+}
+
+void* calloc(std::size_t count, std::size_t size) noexcept {
+    std::size_t bytes = 0;
+    if (__builtin_mul_overflow(count, size, &bytes)) { return Fail(ENOMEM); }
+    if (bytes >= limit.load(std::memory_order_relaxed)) { return __libc_calloc(count, size); }
+    void* const block = Take(bytes, alignmentOfMalloc);
+    return block == nullptr ? nullptr : std::memset(block, 0, bytes);
+}
+
+// A block that shrinks stays, unless less than half of it would be used.
+void* realloc(void* block, std::size_t size) noexcept {
+    if (block == nullptr) { return malloc(size); }
+    const std::size_t usable = Usable(block);
+    if (usable == 0) { return __libc_realloc(block, size); }
+    if (size == 0) {
+        free(block);
+        return nullptr;
+    }
+    if (size <= usable && size >= usable / 2) { return block; }
+    void* const moved = malloc(size);
+    if (moved == nullptr) { return size <= usable ? block : nullptr; }
+    std::memcpy(moved, block, std::min(size, usable));
+    free(block);
+    return moved;
+}
+
+void* reallocarray(void* block, std::size_t count, std::size_t size) noexcept {
+    std::size_t bytes = 0;
+    if (__builtin_mul_overflow(count, size, &bytes)) { return Fail(ENOMEM); }
+    return realloc(block, bytes);
+}
+
+int posix_memalign(void** block, std::size_t alignment, std::size_t size) noexcept {
+    if (!IsPowerOfTwo(alignment) || alignment % sizeof(void*) != 0) { return EINVAL; }
+    const int error = errno;
+    void* const aligned = Aligned(alignment, size);
+    errno = error;
+    if (aligned == nullptr) { return ENOMEM; }
+    *block = aligned;
+    return 0;
+}
+
+void* memalign(std::size_t alignment, std::size_t size) noexcept {
+    return IsPowerOfTwo(alignment) ? Aligned(alignment, size) : __libc_memalign(alignment, size);
+}
+
+void* aligned_alloc(std::size_t alignment, std::size_t size) noexcept {
+    return IsPowerOfTwo(alignment) ? Aligned(alignment, size) : Fail(EINVAL);
+}
+
+// valloc and pvalloc remain the C library's: their blocks are refused by the heap like all of its.
+
+std::size_t malloc_usable_size(void* block) noexcept {
+    if (block == nullptr) { return 0; }
+    const std::size_t usable = Usable(block);
+    if (usable != 0) { return usable; }
+    if (usableSizeOfLibrary == nullptr) { FindUsableSize(); }
+    return usableSizeOfLibrary(block);
+}
+
+}  // extern "C"
