@@ -1,6 +1,7 @@
 #!/usr/bin/env bash
-# Installs the Debian packages that the named jobs need and that are missing: build, test, lint and
-# bench, in any number. Without the right to install it prints the command that would, and fails.
+# Installs the Debian packages that the named jobs need and that are missing: build, test, lint, bench,
+# fuzz, cross and coverage, in any number. Without the right to install it prints the command that
+# would, and fails.
 set -euo pipefail
 
 packages=()
@@ -11,6 +12,7 @@ for job in "$@"; do
         lint) packages+=(git clang-format clang-tidy shellcheck) ;;
         bench) packages+=(liblua5.4-dev libsqlite3-dev libbenchmark-dev zlib1g-dev libzstd-dev libmimalloc2.0 libjemalloc2 libtcmalloc-minimal4
             libboost-dev gnuplot-nox python3) ;;
+        fuzz) packages+=(libgmock-dev zlib1g-dev libzstd-dev clang libclang-rt-14-dev) ;;
         *)
             echo "install-packages.sh: unknown job '$job'" >&2
             exit 2

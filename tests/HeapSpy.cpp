@@ -72,6 +72,12 @@ void* operator new(std::size_t size) {
 void* operator new[](std::size_t size) {
     return HeapSpy::Request(size, HeapSpy::Form::array);
 }
+// A sanitizer brings one of its own, whose blocks are none of ours. std::stable_sort asks for it.
+void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
+    try {
+        return operator new(size);
+    } catch (const std::bad_alloc&) { return nullptr; }
+}
 void operator delete(void* block) noexcept {
     HeapSpy::Release(block, HeapSpy::Form::single);
 }

@@ -1,0 +1,197 @@
+// The account of pools and blocks, compared with what the library says of them.
+
+#include "Accounts.hpp"
+
+#include <algorithm>
+#include <array>
+#include <cstring>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include "../PoolFixture.hpp"
+
+namespace Fuzz {
+
+using namespace OBR::MemPool;
+
+namespace {
+
+constexpr std::uint32_t heapRecordHeader = 0xCC02BBAA;
+
+}  // namespace
+
+void Account::Add(std::uint8_t* data, const Block& block) {
+    EXPECT_GE(block.usable, block.size);
+    EXPECT_EQ(reinterpret_cast<std::uintptr_t>(data) % block.alignment, 0);
+    std::memset(data, block.fill, block.usable);
+    EXPECT_TRUE(live.emplace(data, block).second) << "A block is given out twice.";
+}
+
+void Account::ExpectFilled(Live::const_iterator one) const {
+    const auto& [data, block] = *one;
+    EXPECT_EQ(static_cast<std::size_t>(std::count(data, data + block.usable, block.fill)),
+              block.usable)
+        << "A block of " << block.usable << " bytes was written to.";
+}
+
+void Account::ExpectAllFilled() const {
+    for (auto one = live.begin(); one != live.end(); ++one) { ExpectFilled(one); }
+}
+
+void Account::Check(bool thoroughly) const {
+    constexpr std::uint32_t fewSteps = 600;
+    const std::uint32_t recsOfBucket = pool->bucketSize / (pool->dataAlignment + 4) + 1;
+    const bool isQuick = pool->numGroups + pool->GetNumBuckets() * recsOfBucket < fewSteps;
+    if (!thoroughly && !isQuick) { return; }
+    const Blocks blocks = CheckInvariants(*pool);
+    ASSERT_EQ(blocks.size(), pool->enabled ? live.size() : 0);
+    if (!pool->enabled) { return; }
+    auto at = blocks.begin();
+    for (const auto& [data, block] : live) {
+        const auto [start, size] = *at++;
+        ASSERT_LE(start, data);
+        ASSERT_EQ(data + block.usable, start + size);
+        if (!isOfHeap) { ASSERT_EQ(data, start); }
+        // No more is taken than alignment and the smallest size class explain.
+        const std::size_t least = std::max<std::size_t>(block.size, 1);
+        const std::size_t most =
+            block.alignment < 8 ? least : (least + 7) / 8 * 8 + block.alignment - 4;
+        const std::size_t rounded =
+            (most + pool->dataAlignment - 1) / pool->dataAlignment * pool->dataAlignment;
+        ASSERT_LE(size, std::max<std::size_t>(rounded, pool->minRecordSize + pool->dataAlignment));
+    }
+}
+
+const std::uint8_t* Account::RecordOf(const std::uint8_t* data) const {
+    const Blocks blocks = CheckInvariants(*pool);
+    const auto above = blocks.upper_bound(data);
+    return above == blocks.begin() ? data : std::prev(above)->first;
+}
+
+bool Account::StaysReadable(const void* data) const {
+    const Bucket* const bucket = pool->FindBucket(data);
+    if (bucket == nullptr) { return false; }
+    const std::uint32_t total = (bucket->size - 2u) / bucket->recSize;
+    return pool->keepEmptyBuckets || total - bucket->numFree > 1;
+}
+
+Account& Accounts::Open(Mgr& builder, bool isOfHeap) {
+    all.push_back(std::make_unique<Account>(
+        Account{builder.GetBucketMgr(), builder.GetName(), &builder, isOfHeap}));
+    return *all.back();
+}
+
+void Accounts::Close(const Account& account) {
+    all.erase(std::find_if(all.begin(), all.end(),
+                           [&account](const auto& one) { return one.get() == &account; }));
+}
+
+void Accounts::Forget(const Mgr* handle) {
+    for (const auto& account : all) {
+        if (account->builder == handle) { account->builder = nullptr; }
+    }
+}
+
+bool Accounts::IsTaken(const char* name) const {
+    return name != nullptr && std::any_of(all.begin(), all.end(), [name](const auto& account) {
+               return account->name == name;
+           });
+}
+
+std::size_t Accounts::NumBlocks() const {
+    std::size_t number = 0;
+    for (const auto& account : all) { number += account->live.size(); }
+    return number;
+}
+
+void Accounts::WithBlockOfOther(
+    Bytes& bytes, const Account* not_of,
+    const std::function<void(const Account&, std::uint8_t*)>& visit) const {
+    const std::uint32_t first = bytes.Byte();
+    const std::uint32_t place = bytes.Byte();
+    for (std::size_t n = 0; n < all.size(); ++n) {
+        const Account& account = *all[(first + n) % all.size()];
+        if (&account == not_of || account.live.empty()) { continue; }
+        const std::size_t index = place % account.live.size();
+        visit(account, std::next(account.live.begin(), static_cast<long>(index))->first);
+        return;
+    }
+}
+
+void Accounts::CheckRegistry(const std::function<bool(const Mgr*)>& hasPool) const {
+    EXPECT_EQ(GetNumMgrs(), all.size());
+    std::map<std::string, Mgr*> expected;
+    for (const auto& account : all) {
+        Mgr* const handle = hasPool(account->builder) ? account->builder : nullptr;
+        EXPECT_EQ(GetMgr(account->name.c_str()), handle);
+        if (handle != nullptr) { expected[account->name] = handle; }
+    }
+    EXPECT_EQ(GetMgr("no such pool"), nullptr);
+    std::vector<Mgr*> wanted;
+    for (const auto& [name, handle] : expected) { wanted.push_back(handle); }
+    std::vector<Mgr*> handles;
+    OBR::vector<Mgr*, std::allocator<Mgr*>> compact;
+    GetMgrs(handles);
+    GetMgrs(compact);
+    EXPECT_EQ(handles, wanted);
+    EXPECT_EQ(std::vector<Mgr*>(compact.begin(), compact.end()), wanted);
+}
+
+Foreign MakeForeign(Bytes& bytes) {
+    // As far as a question may look for a header, past the tag of a Heap as well. All of it is 0
+    // but for the last 8 bytes ahead of the pointer.
+    constexpr std::size_t farthest = 2 * 65600;
+    constexpr std::size_t most = 8;
+    static std::array<std::uint8_t, farthest + most> arena;
+    std::uint8_t* const data = arena.data() + farthest + bytes.Below(most);
+    std::memset(data - 2 * most, 0, 2 * most);
+    std::uint32_t header = 0;
+    switch (bytes.Below(4)) {
+        case 0:
+            header = heapRecordHeader;
+            break;
+        case 1:
+            header = 0x00010000 + bytes.Short();  // A used record's.
+            break;
+        case 2:
+            header = 0xA55A0000 + bytes.Short();  // A moved block's.
+            break;
+        default:
+            header = bytes.Word();
+    }
+    const std::uint32_t length = bytes.Word();
+    std::memcpy(data - 4, &header, sizeof header);
+    std::memcpy(data - 8, &length, sizeof length);
+    return {data, header == heapRecordHeader, length};
+}
+
+bool HasHeapRecordHeader(const std::uint8_t* data) {
+    return std::memcmp(data - 4, &heapRecordHeader, 4) == 0;
+}
+
+Sizes Sizes::InForce() {
+    return {NUV_OBR_MEMPOOL_BUCKET_SIZE(), NUV_OBR_MEMPOOL_DATA_ALIGNMENT(),
+            NUV_OBR_MEMPOOL_MAX_RECORD_SIZE(), NUV_OBR_MEMPOOL_MIN_RECORD_SIZE()};
+}
+
+bool Sizes::CanMakePool() const {
+    const std::uint64_t multiple = std::max<std::uint64_t>(alignment, 1);
+    const auto roundUp = [multiple](std::uint64_t value) {
+        const std::uint64_t steps = (std::max<std::uint64_t>(value, 1) + multiple - 1) / multiple;
+        return static_cast<std::uint32_t>(steps * multiple);
+    };
+    std::uint32_t maximum = roundUp(largest);
+    if (maximum > largest) { maximum -= static_cast<std::uint32_t>(multiple); }
+    return maximum + std::uint64_t{4} <= std::clamp<std::uint32_t>(bucket, 4, 65535) &&
+           roundUp(smallest) <= maximum;
+}
+
+std::uint8_t FillByte(Bytes& bytes) {
+    // Four of these two would look like a record's header, or a Heap's, to whoever asks about the
+    // middle of a block.
+    const std::uint8_t fill = bytes.Byte();
+    return fill == 0x01 || fill == 0x5A ? std::uint8_t{0xF1} : fill;
+}
+
+}  // namespace Fuzz

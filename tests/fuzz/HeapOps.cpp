@@ -1,0 +1,231 @@
+// What a host does with a Heap and its blocks, by the calls of C, of C++ and of containers.
+
+#include <MemPoolHeap>
+
+#include <algorithm>
+#include <stdexcept>
+
+#include <gtest/gtest.h>
+
+#include "../PoolFixture.hpp"
+#include "World.hpp"
+
+namespace Fuzz {
+
+using namespace OBR::MemPool;
+
+void World::StepOf(HeapPlace& place) {
+    if (place.heap == nullptr) { return Build(place); }
+    const std::uint32_t choice = bytes.Byte();
+    if (choice >= 250) { return Destroy(place); }
+    Account& account = *place.account;
+    if (choice < 90) {
+        Take(place);
+    } else if (choice < 130) {
+        Resize(place);
+    } else if (choice < 190) {
+        GiveBack(place);
+    } else if (choice < 220) {
+        RefuseForeign(place);
+    } else if (choice < 235) {
+        ReportOn(place.heap->GetMgr(), account);
+        CheckStats(place);
+    } else {
+        account.ExpectAllFilled();
+        place.heap->FreeAll();
+        account.live.clear();
+    }
+    account.Check(false);
+}
+
+// With settings of its own or the process's. What cannot make a pool is refused.
+void World::Build(HeapPlace& place) {
+    const char* const name = Name();
+    const std::uint8_t said = bytes.Byte();
+    HeapSettings settings;
+    Sizes sizes = Sizes::InForce();
+    const auto say = [&](std::uint32_t bit, HeapSettings& (HeapSettings::*word)(std::size_t),
+                         std::uint32_t& size) {
+        if ((said >> bit & 1) == 0) { return; }
+        size = bytes.Short();
+        (settings.*word)(size);
+    };
+    say(0, &HeapSettings::BucketSize, sizes.bucket);
+    say(1, &HeapSettings::MaxRecordSize, sizes.largest);
+    say(2, &HeapSettings::MinRecordSize, sizes.smallest);
+    say(3, &HeapSettings::DataAlignment, sizes.alignment);
+    const bool isOn = (said & 16) != 0 || NUV_OBR_MEMPOOL_ON();
+    settings.On(isOn);
+    if ((said & 32) != 0) { settings.KeepEmptyBuckets((said & 64) != 0); }
+
+    const bool isTooLarge = sizes.alignment > 65532;
+    sizes.alignment = std::max((sizes.alignment + 3) / 4 * 4, 4u);
+    // A name whose pool has lost its handle is not seen, and would end the process.
+    if (accounts.IsTaken(name) && GetMgr(name) == nullptr) { return; }
+    bool isRefused = false;
+    const bool succeeds = Succeeds([&] {
+        try {
+            place.heap = std::make_unique<Heap>(name, settings);
+        } catch (const std::invalid_argument&) { isRefused = true; }
+    });
+    if (!succeeds) { return; }
+    EXPECT_EQ(isRefused, isTooLarge || !sizes.CanMakePool() || accounts.IsTaken(name));
+    if (isRefused) { return; }
+    place.account = &accounts.Open(place.heap->GetMgr(), true);
+    EXPECT_EQ(place.account->pool->enabled, isOn);
+}
+
+void World::Destroy(HeapPlace& place) {
+    place.account->ExpectAllFilled();
+    place.account->Check(true);
+    CheckStats(place);
+    accounts.Close(*place.account);
+    place.account = nullptr;
+    place.heap.reset();
+}
+
+void World::Take(HeapPlace& place) {
+    if (!HasRoom()) { return; }
+    Heap& heap = *place.heap;
+    std::size_t size = Size(*place.account);
+    std::size_t alignment = 8;
+    const std::uint32_t way = bytes.Below(6);
+    if (way == 1 || way == 2) { alignment = std::size_t{1} << bytes.Below(14); }
+    const bool isZero = way == 3;
+    if (isZero) { size = size / 3 * 3; }
+    if (way == 5) { size = size / sizeof(std::uint64_t) * sizeof(std::uint64_t); }
+    std::uint8_t* data = nullptr;
+    const auto take = [&] {
+        void* taken = nullptr;
+        switch (way) {
+            case 1:
+                taken = heap.Allocate(size, alignment);
+                break;
+            case 2:
+                taken = Resource(heap).allocate(size, alignment);
+                break;
+            case 3:
+                taken = heap.Calloc(3, size / 3);
+                break;
+            case 4:
+                taken = heap.Realloc(nullptr, size);
+                break;
+            case 5:
+                taken = Allocator<std::uint64_t>(heap).allocate(size / sizeof(std::uint64_t));
+                break;
+            default:
+                taken = heap.Malloc(size);
+        }
+        if (taken == nullptr) { throw std::bad_alloc(); }
+        data = static_cast<std::uint8_t*>(taken);
+    };
+    if (alignment > 4096) {
+        EXPECT_THROW(take(), std::bad_alloc);
+        return;
+    }
+    if (!Succeeds(take)) { return; }
+    if (isZero) { EXPECT_EQ(std::count(data, data + size, 0), static_cast<long>(size)); }
+    const std::size_t usable = heap.UsableSize(data);
+    if (!place.account->pool->enabled) { EXPECT_EQ(usable, std::max<std::size_t>(size, 1)); }
+    place.account->Add(data, {size, alignment, usable, FillByte(bytes)});
+}
+
+// A block stays in place if it has room, and keeps its bytes in any case.
+void World::Resize(HeapPlace& place) {
+    Account& account = *place.account;
+    const auto one = OneBlock(account);
+    if (one == account.live.end()) { return; }
+    std::uint8_t* const data = one->first;
+    Block block = one->second;
+    const std::size_t size = std::max(Size(account), 1u);
+    std::uint8_t* moved = nullptr;
+    account.ExpectFilled(one);
+    const bool succeeds = Succeeds([&] {
+        moved = static_cast<std::uint8_t*>(place.heap->Realloc(data, size));
+        if (moved == nullptr) { throw std::bad_alloc(); }
+    });
+    if (!succeeds) { return account.ExpectFilled(one); }
+    EXPECT_EQ(moved == data, size <= block.usable);
+    if (moved == data) { return account.ExpectFilled(one); }
+    EXPECT_EQ(std::count(moved, moved + block.usable, block.fill), static_cast<long>(block.usable));
+    account.live.erase(one);
+    block = {size, 8, place.heap->UsableSize(moved), block.fill};
+    account.Add(moved, block);
+}
+
+void World::GiveBack(HeapPlace& place) {
+    Account& account = *place.account;
+    Heap& heap = *place.heap;
+    const auto one = OneBlock(account);
+    if (one == account.live.end()) { return; }
+    const auto [data, block] = *one;
+    account.ExpectFilled(one);
+    account.live.erase(one);
+    const bool staysReadable =
+        account.pool->enabled && account.StaysReadable(account.RecordOf(data));
+    switch (bytes.Below(4)) {
+        case 0:
+            heap.Deallocate(data, block.size, block.alignment);
+            break;
+        case 1:
+            Resource(heap).deallocate(data, block.size, block.alignment);
+            break;
+        case 2:
+            EXPECT_EQ(heap.Realloc(data, 0), nullptr);
+            break;
+        default:
+            EXPECT_TRUE(heap.Free(data));
+    }
+    if (!staysReadable) { return; }
+    EXPECT_FALSE(heap.Free(data)) << "freed twice";
+    EXPECT_EQ(heap.UsableSize(data), 0);
+    EXPECT_EQ(heap.Realloc(data, block.size + 1), nullptr);
+}
+
+void World::RefuseForeign(HeapPlace& place) {
+    Heap& heap = *place.heap;
+    const bool enabled = place.account->pool->enabled;
+    const std::size_t tooLarge = Heap::MaxSize() + 1 + bytes.Short();
+    const std::size_t noAlignment = bytes.Short() | 3;
+    EXPECT_EQ(heap.Malloc(tooLarge), nullptr);
+    EXPECT_EQ(heap.Calloc(tooLarge, tooLarge), nullptr);
+    EXPECT_THROW(heap.Allocate(1, noAlignment), std::bad_alloc);
+    EXPECT_FALSE(heap.Free(nullptr));
+    EXPECT_EQ(heap.UsableSize(nullptr), 0);
+    heap.Deallocate(nullptr, 1);
+
+    const auto refuse = [&](void* data, std::uint32_t length) {
+        EXPECT_EQ(heap.UsableSize(data), enabled ? length : 0);
+        if (enabled && length != 0) { return; }  // Taken for a heap record, and freed as one.
+        EXPECT_FALSE(heap.Free(data));
+        EXPECT_EQ(heap.Realloc(data, 1 + bytes.Byte()), nullptr);
+        EXPECT_EQ(heap.Realloc(data, 0), nullptr);
+    };
+    const Foreign foreign = MakeForeign(bytes);
+    refuse(foreign.data, foreign.looksLikeHeapRecord ? foreign.length : 0);
+
+    accounts.WithBlockOfOther(bytes, place.account, [&](const Account& other, std::uint8_t* data) {
+        const std::size_t usable = other.live.at(data).usable;
+        if (usable >= 4) { refuse(data + 4 + bytes.Byte() % (usable - 3), 0); }
+        // A heap record of another pool is not told from one of this.
+        const bool isHeapRecord = other.pool->enabled && HasHeapRecordHeader(other.RecordOf(data));
+        if (!isHeapRecord) { refuse(data, 0); }
+    });
+}
+
+void World::CheckStats(const HeapPlace& place) const {
+    const HeapStats stats = place.heap->GetStats();
+    const Account& account = *place.account;
+    EXPECT_EQ(stats.usedRecords + stats.heapRecords, account.live.size());
+    EXPECT_EQ(stats.buckets, account.pool->GetNumBuckets());
+    std::size_t bytesUsed = 0;
+    if (account.pool->enabled) {
+        for (const auto& [data, size] : CheckInvariants(*account.pool)) { bytesUsed += size; }
+    } else {
+        for (const auto& [data, block] : account.live) { bytesUsed += block.usable; }
+    }
+    EXPECT_EQ(stats.bytesUsed, bytesUsed);
+    EXPECT_GE(stats.bytesHeld, stats.bytesUsed);
+}
+
+}  // namespace Fuzz
