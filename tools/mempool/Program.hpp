@@ -5,6 +5,8 @@
 #define OBR_TOOLS_MEMPOOL_PROGRAM_HPP
 
 #include <functional>
+#include <string>
+#include <vector>
 
 #include <CLI/CLI.hpp>
 
@@ -13,10 +15,13 @@ namespace Tool {
 struct Program {
     CLI::App commandLine;
     std::function<int()> job;  // Of the subcommand that was asked for; returns the exit status.
+    std::vector<const CLI::App*> runners;  // The subcommands that run a program.
+    std::vector<std::string> command;      // That program and its arguments.
 };
 
 // One line a subcommand, each in the file of its name; main.cpp calls them in the order of the
 // help.
+void AddRecord(Program& program);
 void AddReplay(Program& program);
 void AddReport(Program& program);
 void AddText(Program& program);

@@ -1,10 +1,14 @@
 // Reads the command line and does what the subcommand asks for.
 
+#include <algorithm>
 #include <cstdlib>
 #include <exception>
 #include <iostream>
 #include <string>
+#include <utility>
+#include <vector>
 
+#include "mempool/Command.hpp"
 #include "mempool/Program.hpp"
 
 namespace {
@@ -25,6 +29,7 @@ int Run(int argc, char** argv) {
         return "mempool: " + std::string(error.what()) + "\nSee '" + asked + " --help'.\n";
     });
 
+    Tool::AddRecord(program);
     Tool::AddReplay(program);
     Tool::AddReport(program);
     Tool::AddText(program);
@@ -35,11 +40,12 @@ int Run(int argc, char** argv) {
         std::cerr << "mempool: '" << first << "' is no subcommand\nSee 'mempool --help'.\n";
         return EXIT_FAILURE;
     }
+    std::vector<std::string> words(argv + 1, argv + argc);
+    const int failure = Tool::CutCommand(program, words) ? Tool::ownFailure : EXIT_FAILURE;
     try {
-        app.parse(argc, argv);
-    } catch (const CLI::ParseError& error) {
-        return app.exit(error) == 0 ? EXIT_SUCCESS : EXIT_FAILURE;
-    }
+        std::reverse(words.begin(), words.end());  // As the parser takes them.
+        app.parse(std::move(words));
+    } catch (const CLI::ParseError& error) { return app.exit(error) == 0 ? EXIT_SUCCESS : failure; }
     return program.job();
 }
 

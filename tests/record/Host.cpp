@@ -1,0 +1,195 @@
+// A program to be recorded. Its argument says what it does; sizes from 70000 on tell its own blocks
+// from all others. It is linked to nothing of the project.
+
+#include <dlfcn.h>
+#include <malloc.h>
+#include <pthread.h>
+#include <sched.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <new>
+#include <string>
+#include <thread>
+#include <vector>
+
+namespace {
+
+// What lies here is used, whatever an optimiser thinks.
+void* volatile sink = nullptr;
+volatile std::size_t tooMany = ~std::size_t{0};
+
+void* Keep(void* block) {
+    sink = block;
+    return block;
+}
+void Use(std::size_t size) {
+    std::free(Keep(std::malloc(size)));
+}
+
+// A block that was there before main, and one that nobody frees.
+struct Early {
+    void* block = Keep(std::malloc(70000));
+} early;
+
+void Family() {
+    std::free(Keep(std::malloc(70001)));
+    std::free(Keep(std::calloc(7, 10001)));
+    void* block = Keep(std::realloc(nullptr, 70002));
+    block = Keep(std::realloc(block, 70003));
+    block = Keep(reallocarray(block, 2, 35002));
+    if (reallocarray(block, tooMany, 2) != nullptr) { std::abort(); }
+    if (std::realloc(block, tooMany / 4) != nullptr) { std::abort(); }
+    sink = std::realloc(block, 0);
+    std::free(Keep(memalign(64, 70005)));
+    std::free(Keep(std::aligned_alloc(64, 70016)));
+    void* aligned = nullptr;
+    if (posix_memalign(&aligned, 4096, 70007) != 0 || malloc_usable_size(aligned) < 70007) {
+        std::abort();
+    }
+    std::free(Keep(aligned));
+    if (posix_memalign(&aligned, 3, 70008) == 0) { std::abort(); }
+    std::free(Keep(valloc(70009)));
+    std::free(Keep(pvalloc(70010)));
+    std::free(early.block);
+    std::free(nullptr);
+}
+
+struct alignas(64) Wide {
+    char bytes[70016];
+};
+
+void Operators() {
+    ::operator delete(Keep(::operator new(70001)));
+    ::operator delete (Keep(::operator new(70002)), std::size_t{70002});
+    ::operator delete[](Keep(::operator new[](70003)));
+    ::operator delete(Keep(::operator new(70004, std::nothrow)), std::nothrow);
+    delete static_cast<Wide*>(Keep(new Wide));
+    delete[] static_cast<Wide*>(Keep(new (std::nothrow) Wide[1]));
+}
+
+void Threads() {
+    std::vector<std::thread> threads;
+    for (int index = 0; index != 4; ++index) {
+        threads.emplace_back([] {
+            std::vector<void*> blocks;
+            for (int round = 0; round != 20000; ++round) {
+                blocks.push_back(std::malloc(70000));
+                if (round % 3 != 0) {
+                    std::free(blocks.back());
+                    blocks.pop_back();
+                }
+            }
+            for (void* const block : blocks) { std::free(block); }
+        });
+    }
+    for (std::thread& thread : threads) { thread.join(); }
+    std::thread([] { sink = std::malloc(70001); }).join();
+    std::free(sink);
+}
+
+void Wait(pid_t child) {
+    int status = 0;
+    if (waitpid(child, &status, 0) != child || status != 0) { std::abort(); }
+}
+
+void Fork() {
+    Use(70001);
+    const pid_t child = fork();
+    if (child == 0) {
+        Use(70002);
+        _exit(0);
+    }
+    Wait(child);
+    Use(70003);
+}
+
+void VFork() {
+    const pid_t child = vfork();
+    if (child == 0) {
+        execl("/bin/sh", "sh", "-c", "exit 0", nullptr);
+        _exit(1);
+    }
+    Wait(child);
+    Use(70001);
+}
+
+void Spawn(const char* self) {
+    if (std::system((std::string(self) + " family").c_str()) != 0) { std::abort(); }
+    Use(70001);
+}
+
+void Exec(const char* self) {
+    Use(70001);
+    execl(self, self, "family", nullptr);
+}
+
+void Load() {
+    void* const library = dlopen("libz.so.1", RTLD_NOW);
+    if (library == nullptr) { std::abort(); }
+    Use(70001);
+    dlclose(library);
+    Use(70002);
+}
+
+void Signals() {
+    std::signal(SIGALRM, [](int) { Use(70001); });
+    ualarm(1000, 1000);
+    for (int count = 0; count != 300000; ++count) { Use(16); }
+    ualarm(0, 0);
+}
+
+void Environment() {
+    for (char** variable = environ; *variable != nullptr; ++variable) { std::puts(*variable); }
+    for (int descriptor = 3; descriptor != 1024; ++descriptor) {
+        if (lseek(descriptor, 0, SEEK_CUR) >= 0) { std::printf("open %d\n", descriptor); }
+    }
+}
+
+}  // namespace
+
+__attribute__((noinline)) void FirstCaller() {
+    Keep(std::malloc(70001));
+}
+// A string that is duplicated is the C library's own call of malloc, in the name of its caller.
+__attribute__((noinline)) void SecondCaller() {
+    const std::string text(70001, 'x');
+    Keep(strdup(text.c_str()));
+}
+
+int main(int argc, char** argv) {
+    const std::string what = argc > 1 ? argv[1] : "";
+    if (what == "family") { Family(); }
+    if (what == "operators") { Operators(); }
+    if (what == "threads") { Threads(); }
+    if (what == "fork") { Fork(); }
+    if (what == "vfork") { VFork(); }
+    if (what == "spawn") { Spawn(argv[0]); }
+    if (what == "exec") { Exec(argv[0]); }
+    if (what == "load") { Load(); }
+    if (what == "signals") { Signals(); }
+    if (what == "environment") { Environment(); }
+    if (what == "callers") {
+        FirstCaller();
+        SecondCaller();
+    }
+    if (what == "exit") {
+        Use(70001);
+        _exit(7);
+    }
+    if (what == "abort") {
+        Use(70001);
+        std::abort();
+    }
+    if (what == "sleep") {
+        Use(70001);
+        std::puts("ready");
+        std::fflush(stdout);
+        pause();
+    }
+    return 0;
+}

@@ -1,0 +1,173 @@
+// `mempool record` on a program that does all that makes recording hard. What it did is told by the
+// trace as lines: "+70001" for a block allocated, "-70001" for it freed.
+
+#include <cstdlib>
+#include <map>
+#include <sstream>
+#include <string>
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include "Shell.hpp"
+#include "trace/StepReader.hpp"
+
+using testing::ContainsRegex;
+using testing::HasSubstr;
+
+namespace {
+
+struct Recorded {
+    std::string story;  // The events of the program's own blocks.
+    std::map<std::string, std::string> facts;
+    std::map<std::string, int> numBlocks;  // Of its own, by the names of the pools.
+    std::uint64_t numEvents = 0;
+};
+
+Recorded ReadTrace(const std::string& name) {
+    Trace::StepReader reader(Shell::FolderPath() + "/" + name);
+    Recorded recorded;
+    std::ostringstream story;
+    Trace::Step step = {};
+    while (reader.Next(step)) {
+        ++recorded.numEvents;
+        const bool isOwn = step.block.size >= 70000 && step.block.size < 71000;
+        if (!isOwn) { continue; }
+        if (step.kind == Trace::Kind::Allocated) {
+            story << '+' << step.block.size << ' ';
+            ++recorded.numBlocks[reader.Blocks().Pools().at(step.pool).name];
+        }
+        if (step.kind == Trace::Kind::Freed) { story << '-' << step.block.size << ' '; }
+    }
+    EXPECT_EQ(reader.Bad().Total(), 0U);
+    EXPECT_EQ(reader.Warning(), "");
+    recorded.story = story.str();
+    recorded.facts = reader.Facts();
+    return recorded;
+}
+
+Recorded Record(const std::string& what, const std::string& options = "", int exitStatus = 0) {
+    const std::string host = "./Host ";
+    Shell::Output("ln -sf " HOST " Host");
+    EXPECT_EQ(
+        Shell::Output(MEMPOOL " record -o trace " + options + " -- " + host + what, exitStatus),
+        "");
+    return ReadTrace("trace");
+}
+
+TEST(Record, TellsTheMallocFamily) {
+    const Recorded recorded = Record("family");
+    EXPECT_EQ(recorded.story.substr(0, recorded.story.find("+70005")),
+              "+70000 +70001 -70001 +70007 -70007 +70002 -70002 +70003 -70003 +70004 -70004 +70008 "
+              "-70008 ");
+    EXPECT_THAT(recorded.story,
+                HasSubstr("+70005 -70005 +70016 -70016 +70007 -70007 +70009 -70009 +70010 -70010 "
+                          "-70000 "));
+    EXPECT_EQ(recorded.facts.at("program"), "./Host family");
+    EXPECT_EQ(recorded.facts.at("by"), "all");
+    EXPECT_EQ(recorded.facts.at("threads"), "1");
+    EXPECT_EQ(recorded.facts.at("foreign_frees"), "0");
+}
+
+TEST(Record, TellsEachBlockOfOperatorNewOnce) {
+    EXPECT_EQ(Record("operators").story,
+              "+70000 +70001 -70001 +70002 -70002 +70003 -70003 +70004 -70004 +70016 -70016 "
+              "+70016 -70016 ");
+}
+
+// With their order kept no block is allocated twice, and none is freed that is not there.
+TEST(Record, KeepsTheOrderOfThreads) {
+    const Recorded recorded = Record("threads", "--by thread");
+    EXPECT_EQ(recorded.facts.at("threads"), "6");
+    EXPECT_EQ(recorded.numBlocks.size(), 6U);
+    EXPECT_EQ(recorded.numBlocks.at("thread 2"), 20000);
+    EXPECT_EQ(std::stoi(recorded.facts.at("foreign_frees")) > 0, true);
+    EXPECT_GT(recorded.numEvents, 160000U);
+}
+
+TEST(Record, LeavesChildrenAlone) {
+    EXPECT_EQ(Record("fork").story, "+70000 +70001 -70001 +70003 -70003 ");
+    EXPECT_EQ(Record("vfork").story, "+70000 +70001 -70001 ");
+    EXPECT_EQ(Record("spawn").story, "+70000 +70001 -70001 ");
+    EXPECT_EQ(Record("exec").story, "+70000 +70001 -70001 ");
+}
+
+TEST(Record, FollowsTheProgramToItsEnd) {
+    EXPECT_EQ(Record("load").story, "+70000 +70001 -70001 +70002 -70002 ");
+    EXPECT_THAT(Record("signals").story, ContainsRegex("^.70000 (.70001 -70001 )+$"));
+    EXPECT_EQ(Record("exit", "", 7).story, "+70000 +70001 -70001 ");
+    EXPECT_THAT(Shell::Output("ulimit -c 0; " MEMPOOL " record -o trace ./Host abort; "
+                              "kill -l $?",
+                              0)
+                    .substr(0, 0),
+                "");
+    EXPECT_EQ(ReadTrace("trace").story, "+70000 +70001 -70001 ");
+}
+
+// A signal that a user sends to mempool is the program's, and mempool ends like it.
+TEST(Record, DiesByTheSignalOfTheProgram) {
+    Shell::Output("ln -sf " HOST " Host");
+    EXPECT_EQ(Shell::Output(MEMPOOL " record -o trace ./Host sleep >out & "
+                                    "until grep -qs ready out; do sleep 0.01; done; "
+                                    "kill -TERM $!; wait $! 2>/dev/null; kill -l $?"),
+              "TERM\n");
+    EXPECT_EQ(ReadTrace("trace").story, "+70000 +70001 -70001 ");
+}
+
+TEST(Record, CallsTheGroups) {
+    const auto byCaller = Record("callers", "--by caller").numBlocks;
+    ASSERT_EQ(byCaller.size(), 4U);
+    for (const char* name : {"^FirstCaller..\\+0x", "^SecondCaller..\\+0x"}) {
+        EXPECT_THAT(byCaller, testing::Contains(testing::Key(ContainsRegex(name))));
+    }
+    EXPECT_EQ(Record("callers", "--by module").numBlocks,
+              (std::map<std::string, int>{{"RecordHost", 4}}));
+}
+
+TEST(Record, PassesTheProgramOn) {
+    Shell::Output("ln -sf " HOST " Host");
+    const std::string record = MEMPOOL " record -o trace ";
+    for (const std::string set : {"env -i A=1 ", "env -i LD_PRELOAD=libz.so.1 "}) {
+        EXPECT_EQ(Shell::Output(set + record + "./Host environment"),
+                  Shell::Output(set + "./Host environment"));
+    }
+    EXPECT_EQ(Shell::Output("echo in | " + record + "sh -c 'cat; echo err >&2; exit 9'", 9),
+              "in\nerr\n");
+    EXPECT_EQ(Shell::Output(record + "-- sh -c 'echo \"$@\"' sh -o --by -- [x,y] ''"),
+              "-o --by -- [x,y] \n");
+}
+
+TEST(Record, RefusesWhatCannotBeRecorded) {
+    const std::string record = MEMPOOL " record ";
+    Shell::Output("ln -sf " HOST
+                  " Host; echo >plain; mkdir -p folder; "
+                  "printf '#!/lost/sh\\n' >script; chmod +x script");
+    const auto refused = [&](const std::string& command, int status) {
+        return Shell::Output(record + command, status);
+    };
+    EXPECT_EQ(refused("-o trace lost", 127), "mempool: lost: No such file or directory\n");
+    EXPECT_EQ(refused("-o trace ./lost/it", 127),
+              "mempool: ./lost/it: No such file or directory\n");
+    EXPECT_EQ(refused("-o trace ./plain", 126), "mempool: ./plain: Permission denied\n");
+    EXPECT_EQ(refused("-o trace ./folder", 126), "mempool: ./folder: Is a directory\n");
+    EXPECT_EQ(refused("-o trace ./script", 127),
+              "mempool: ./script: /lost/sh: No such file or directory\n");
+    EXPECT_EQ(refused("-o lost/trace ./Host", 125),
+              "mempool: lost/trace: No such file or directory\n");
+    EXPECT_EQ(refused("-o /dev/full ./Host", 125), "mempool: /dev/full: No space left on device\n");
+    EXPECT_EQ(refused("-o /dev/full", 125),
+              "mempool: PROGRAM is required\nSee 'mempool record --help'.\n");
+    EXPECT_EQ(refused("--by size ./Host", 125),
+              "mempool: --by: size not in {all,caller,module,thread}\n"
+              "See 'mempool record --help'.\n");
+    EXPECT_EQ(refused("-o trace " STATIC_HOST, 126),
+              "mempool: " STATIC_HOST ": is statically linked: cannot be recorded\n");
+    if (geteuid() == 0) {
+        Shell::Output("cp " HOST " other && chown 12345 other && chmod u+s other");
+        EXPECT_EQ(refused("-o trace ./other", 126),
+                  "mempool: ./other: runs with the rights of another user or group: cannot be "
+                  "recorded\n");
+    }
+}
+
+}  // namespace

@@ -1,0 +1,5 @@
+// A program without a loader.
+
+int main() {
+    return 0;
+}

@@ -1,0 +1,104 @@
+// mempool record: runs a program and writes a trace of its allocations.
+
+#include "mempool/Record.hpp"
+
+#include <sys/resource.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <iostream>
+#include <map>
+#include <memory>
+#include <string>
+
+#include "mempool/Command.hpp"
+
+namespace Tool {
+
+namespace {
+
+constexpr const char* description = "Run a program and write a trace of its allocations";
+
+constexpr const char* notes =
+    R"(The program runs unchanged, with a recorder loaded ahead of its libraries. Its output, its
+standard streams and its exit status are its own; if a signal kills it, mempool dies by the same.
+Signals sent to mempool go on to the program. What the program starts is not recorded, nor what it
+becomes by exec. A trace that was cut short, by Ctrl-C or a crash of the program, is a whole one.
+
+Recorded are malloc, calloc, realloc (a release and an allocation), reallocarray, free, the aligned
+forms, and operator new and delete, which call them. An allocator that is linked into the program
+itself cannot be seen.
+
+--by caller   A group is a return address: the first one outside of the C and C++ run-time
+              libraries, with the function's name if the file has symbols. Calls out of a function
+              of these libraries that takes stack by a size of its own count as that function's.
+--by module   The program's file and each of its shared libraries is a group.
+--pools       Records the pools of libObrMemPool in place of the heap: they must be on in the
+              program, which must be linked to the shared library.
+
+Facts in the trace (mempool text prints them): program, by, cpu_seconds (without the recorder's own
+part), allocation_share (of that time, what the allocation calls take, from a sample), threads,
+foreign_frees (blocks freed by another thread than their own).
+
+Exit status: the program's own; 125 if recording fails, 126 if the program cannot be run or recorded
+(it is statically linked or runs with other rights), 127 if it is not found.
+)";
+
+int Run(const Record::Order& order) {
+    try {
+        const Record::Outcome outcome = Record::RecordProgram(order);
+        if (isatty(STDERR_FILENO) != 0) {
+            std::cerr << "mempool: " << outcome.numEvents << " events of " << outcome.numThreads
+                      << (outcome.numThreads == 1 ? " thread, " : " threads, ") << outcome.traceSize
+                      << " bytes in " << order.tracePath << '\n';
+        }
+        return EndLike(outcome);
+    } catch (const Record::Refusal& refusal) {
+        std::cerr << "mempool: " << refusal.what() << '\n';
+        return refusal.Status();
+    }
+}
+
+}  // namespace
+
+void AddRecordOptions(CLI::App& subcommand, Record::Order& order) {
+    static const std::map<std::string, Record::By> names = {{"all", Record::By::All},
+                                                            {"caller", Record::By::Caller},
+                                                            {"module", Record::By::Module},
+                                                            {"thread", Record::By::Thread}};
+    CLI::Option* const by = subcommand.add_option_function<std::string>(
+        "--by", [&order](const std::string& name) { order.by = names.at(name); },
+        "What makes a group, a traced pool of its own: all, caller, module or thread");
+    by->type_name("GROUP")->check(CLI::IsMember(names).description(""))->default_str("all");
+    subcommand.add_flag("--pools", order.pools, "Record the pools of libObrMemPool, not the heap")
+        ->excludes(by);
+}
+
+int EndLike(const Record::Outcome& outcome) {
+    if (outcome.signal == 0) { return outcome.exitStatus; }
+    const rlimit noCore = {0, 0};  // The program has left its own, if any.
+    setrlimit(RLIMIT_CORE, &noCore);
+    std::signal(outcome.signal, SIG_DFL);
+    std::raise(outcome.signal);
+    constexpr int shellsSignalBase = 128;
+    return shellsSignalBase + outcome.signal;
+}
+
+void AddRecord(Program& program) {
+    CLI::App& record = *program.commandLine.add_subcommand("record", description);
+    record.footer(notes);
+    AddCommand(program, record);
+    const auto order = std::make_shared<Record::Order>();
+    order->tracePath = "mempool.trace";
+    record.add_option("-o,--output", order->tracePath, "The trace to write, over what is there")
+        ->type_name("FILE")
+        ->capture_default_str();
+    AddRecordOptions(record, *order);
+    record.callback([&program, order] {
+        order->command = program.command;
+        if (order->command.empty()) { throw CLI::RequiredError("PROGRAM"); }
+        program.job = [order] { return Run(*order); };
+    });
+}
+
+}  // namespace Tool

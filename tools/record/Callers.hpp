@@ -1,0 +1,18 @@
+// Whose call it is: the first return address outside of the run-time libraries of C and C++.
+
+#ifndef OBR_TOOLS_RECORD_CALLERS_HPP
+#define OBR_TOOLS_RECORD_CALLERS_HPP
+
+#include <cstdint>
+
+#include "record/Channel.hpp"
+
+namespace Record {
+
+// The index into the channel's callers. The function that is called was entered from
+// `returnAddress`, with `frame` as its canonical frame address.
+std::uint64_t FindCaller(Channel& channel, const void* returnAddress, const void* frame);
+
+}  // namespace Record
+
+#endif

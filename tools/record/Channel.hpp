@@ -1,0 +1,105 @@
+// The memory that a recorded program shares with `mempool record`, which drains it while the
+// program runs. The program's threads put *slots* into a ring without a lock: a thread takes the
+// next number, which is the slot's place in the order of all, and fills the slot. So a signal
+// handler may interrupt another event at any point, and no thread ever waits for one that does not
+// run, but for room in the ring.
+
+#ifndef OBR_TOOLS_RECORD_CHANNEL_HPP
+#define OBR_TOOLS_RECORD_CHANNEL_HPP
+
+#include <atomic>
+#include <cstddef>
+#include <cstdint>
+
+namespace Record {
+
+// Tells the recorder in the program the descriptor of the channel.
+constexpr const char* channelVariable = "MEMPOOL_RECORD_CHANNEL";
+
+enum class By : std::uint32_t { All, Caller, Module, Thread };
+
+enum class Op : std::uint8_t {
+    Allocated,  // Block, size, group.
+    Released,   // Block.
+    PoolCreated,
+    PoolDestroyed,
+    PoolCleared,
+    PoolAllocated,  // Pool; a Data slot with the block and the size follows.
+    PoolFreed,      // Pool; likewise.
+    PoolNamed,      // Pool, size of the name; Data slots with 8 bytes each follow.
+    Data,
+};
+
+// `where` is the address above 16 bits of the thread's number. `what` holds, from the low bits on,
+// the size, the group, the op and the lap.
+struct Slot {
+    std::atomic<std::uint64_t> where;
+    std::atomic<std::uint64_t> what;  // Stored last. Its lap tells that the slot is filled.
+};
+constexpr unsigned int addressShift = 16;
+constexpr std::uint64_t maxThread = 0xFFFF;  // Of all threads behind so many.
+constexpr unsigned int sizeBits = 36;
+constexpr std::uint64_t maxSize =
+    (std::uint64_t{1} << sizeBits) - 1;  // Stands for larger ones too.
+constexpr unsigned int groupShift = sizeBits;
+constexpr std::uint64_t maxGroup = 0xFFFF;
+constexpr unsigned int opShift = 56;
+constexpr unsigned int lapShift = 60;
+
+constexpr std::size_t numSlots = std::size_t{1} << 19;
+
+// How often the ring was full before: 1 to 15, and 1 again. A fresh ring is all 0.
+constexpr std::uint64_t Lap(std::uint64_t index) {
+    return (1 + index / numSlots % 15) << lapShift;
+}
+
+// A place that code calls from, by its return address. Those in the run-time libraries of C and C++
+// are passed over: for them the table keeps how far away on the stack the next return address is.
+struct Caller {
+    enum State : std::uint32_t { Unknown, Final, Passed, Variable };
+
+    std::atomic<std::uint64_t> address;  // 0 while the place in the table is free.
+    std::atomic<std::uint32_t> state;    // Stored last.
+    std::uint32_t module;                // Index into the modules.
+    std::uint64_t frameSize;             // Of Passed.
+};
+constexpr std::size_t numCallers = maxGroup + 1;  // The last is nobody's: it stands for all others.
+
+struct Module {
+    std::uint64_t base;
+    char path[504];  // Cut if it is longer.
+};
+constexpr std::size_t numModules = 1024;  // The first stands for code outside of any.
+
+struct Channel {
+    std::uint64_t magic;
+    By by;
+    std::int32_t pid;        // Of the program, and of no child of it.
+    std::int32_t parentPid;  // Of the process that drains the channel.
+
+    std::atomic<std::uint32_t> isTaken;  // Set by the program's recorder, once.
+    std::atomic<std::uint32_t> numThreads;
+    std::atomic<std::uint32_t> numModulesUsed;
+    std::atomic<std::uint32_t> modulesLock;
+
+    // A sample of the calls is timed: in the allocator itself, and in the recorder around it.
+    std::atomic<std::uint64_t> allocatorTicks;
+    std::atomic<std::uint64_t> recorderTicks;
+
+    alignas(64) std::atomic<std::uint64_t> head;  // Slots taken.
+    alignas(64) std::atomic<std::uint64_t> tail;  // Slots drained.
+    std::atomic<std::uint32_t> tailFutex;         // Its low bits, to wait on.
+    std::atomic<std::uint32_t> numWaiting;
+
+    alignas(64) Slot slots[numSlots];
+    Caller callers[numCallers];
+    Module modules[numModules];
+};
+constexpr std::uint64_t channelMagic = 0x3130'4C4E'4843'504D;
+
+// One call in so many is timed, on average.
+constexpr std::uint32_t samplePeriod = 64;
+
+}  // namespace Record
+
+#endif

@@ -1,0 +1,114 @@
+// From slots to events. Which pool of the trace a block lies in is decided here: a group of the
+// recording is a pool, whose address is no more than a number.
+
+#include "record/Collector.hpp"
+
+#include <linux/futex.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <climits>
+
+namespace Record {
+
+namespace {
+
+constexpr std::uint64_t lapMask = std::uint64_t{0xF} << lapShift;
+
+Op OpOf(std::uint64_t what) {
+    return static_cast<Op>(what >> opShift & 0xF);
+}
+std::uint64_t SizeOf(std::uint64_t what) {
+    return what & maxSize;
+}
+std::uint64_t AddressOf(std::uint64_t where) {
+    return where >> addressShift;
+}
+
+}  // namespace
+
+Collector::Collector(Channel& fromChannel, Trace::CompactWriter& toWriter)
+    : channel(fromChannel), writer(toWriter), knownPools(numCallers + 1) {
+    writer.WriteOwned();
+}
+
+bool Collector::Drain(bool atEnd) {
+    constexpr std::uint64_t most = 1U << 14;
+    const std::uint64_t first = channel.tail.load(std::memory_order_relaxed);
+    const std::uint64_t last = std::min(channel.head.load(std::memory_order_acquire), first + most);
+    std::uint64_t index = first;
+    for (; index != last; ++index) {
+        const Slot& slot = channel.slots[index % numSlots];
+        const std::uint64_t what = slot.what.load(std::memory_order_acquire);
+        if ((what & lapMask) == Lap(index)) {
+            Write(index, slot.where.load(std::memory_order_relaxed), what);
+        } else if (!atEnd) {
+            break;
+        }
+    }
+    if (index == first) { return false; }
+    channel.tail.store(index, std::memory_order_release);
+    channel.tailFutex.store(static_cast<std::uint32_t>(index));
+    if (channel.numWaiting.load() != 0) {
+        syscall(SYS_futex, &channel.tailFutex, FUTEX_WAKE, INT_MAX, nullptr, nullptr, 0);
+    }
+    return true;
+}
+
+void Collector::Write(std::uint64_t, std::uint64_t where, std::uint64_t what) {
+    const std::uint64_t thread = where & maxThread;
+    if (thread != lastThread) {
+        writer.WriteThread(thread);
+        lastThread = thread;
+    }
+    ++numEvents;
+    if (OpOf(what) == Op::Released) { return writer.WriteReleased(AddressOf(where)); }
+    const std::uint64_t pool = PoolOf(what >> groupShift & maxGroup, thread);
+    writer.Write({Trace::Kind::Allocated, pool, AddressOf(where), SizeOf(what), {}, {}});
+}
+
+std::uint64_t Collector::NumberOfPool(std::uint64_t group, std::uint64_t thread) const {
+    switch (channel.by) {
+        case By::Caller:
+            return group + 1;
+        case By::Module:
+            return channel.callers[group].module + 1;
+        case By::Thread:
+            return thread;
+        case By::All:
+            break;
+    }
+    return 1;
+}
+
+// The pool of the trace, which begins with its first block.
+std::uint64_t Collector::PoolOf(std::uint64_t group, std::uint64_t thread) {
+    const std::uint64_t pool = NumberOfPool(group, thread);
+    if (!knownPools[pool]) {
+        knownPools[pool] = true;
+        writer.Write({Trace::Kind::Created, pool, 0, 0, {}, {}});
+        const std::string name = NameOfPool(group, pool);
+        writer.Write({Trace::Kind::Named, pool, 0, 0, {}, name});
+    }
+    return pool;
+}
+
+std::string Collector::NameOfPool(std::uint64_t group, std::uint64_t pool) {
+    const Caller& caller = channel.callers[group];
+    const Module& module = channel.modules[caller.module];
+    switch (channel.by) {
+        case By::Caller:
+            return group == maxGroup ? "other callers"
+                                     : symbols.Name(module, caller.address.load());
+        case By::Module:
+            return caller.module == 0 ? "no module" : NameOf(module);
+        case By::Thread:
+            return "thread " + std::to_string(pool);
+        case By::All:
+            break;
+    }
+    return "heap";
+}
+
+}  // namespace Record

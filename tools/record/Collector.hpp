@@ -1,0 +1,44 @@
+// Drains the channel of a recorded program into a trace.
+
+#ifndef OBR_TOOLS_RECORD_COLLECTOR_HPP
+#define OBR_TOOLS_RECORD_COLLECTOR_HPP
+
+#include <array>
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "record/Channel.hpp"
+#include "record/Symbols.hpp"
+#include "trace/CompactWriter.hpp"
+
+namespace Record {
+
+class Collector {
+public:
+    Collector(Channel& fromChannel, Trace::CompactWriter& toWriter);
+
+    // Takes what is there, some thousand events at most, and returns whether there was any. At the
+    // end of the program slots that were taken and never filled are passed over.
+    bool Drain(bool atEnd = false);
+
+    std::uint64_t NumEvents() const { return numEvents; }
+
+private:
+    void Write(std::uint64_t index, std::uint64_t where, std::uint64_t what);
+    void WritePoolEvent(Op op, std::uint64_t pool, const std::string& data, std::uint64_t size);
+    std::uint64_t PoolOf(std::uint64_t group, std::uint64_t thread);
+    std::uint64_t NumberOfPool(std::uint64_t group, std::uint64_t thread) const;
+    std::string NameOfPool(std::uint64_t group, std::uint64_t pool);
+
+    Channel& channel;
+    Trace::CompactWriter& writer;
+    Symbols symbols;
+    std::vector<bool> knownPools;
+    std::uint64_t lastThread = 0;
+    std::uint64_t numEvents = 0;
+};
+
+}  // namespace Record
+
+#endif

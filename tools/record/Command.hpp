@@ -1,0 +1,28 @@
+// The program that is to be recorded: where it is, and whether a recorder can be loaded into it.
+
+#ifndef OBR_TOOLS_RECORD_COMMAND_HPP
+#define OBR_TOOLS_RECORD_COMMAND_HPP
+
+#include <stdexcept>
+#include <string>
+
+namespace Record {
+
+// Why nothing was recorded, with an exit status as env gives it: 125 for a failure of our own, 126
+// for a program that cannot be run or recorded, 127 for one that is not found.
+class Refusal final : public std::runtime_error {
+public:
+    Refusal(int exitStatus, const std::string& text)
+        : std::runtime_error(text), status(exitStatus) {}
+    int Status() const { return status; }
+
+private:
+    int status;
+};
+
+// Finds the program as a shell does and refuses it if it cannot be recorded.
+void CheckProgram(const std::string& name);
+
+}  // namespace Record
+
+#endif

@@ -1,0 +1,146 @@
+// How the recorder finds its channel and leaves no trace of itself in the program's environment,
+// and the slow paths of an event.
+
+#include "record/Recorder.hpp"
+
+#include <linux/futex.h>
+#include <sys/mman.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <climits>
+#include <cstdlib>
+#include <cstring>
+#include <ctime>
+
+namespace Record {
+
+namespace {
+
+Active inactive = {};
+std::atomic<bool> isSearched = false;
+
+// Takes a variable out of the environment.
+void Forget(char** place) {
+    do { place[0] = place[1]; } while (*place++ != nullptr);
+}
+
+// The text behind "NAME=" in a variable of that name, or null.
+char* ValueOf(char* variable, const char* name) {
+    const std::size_t size = std::strlen(name);
+    return std::strncmp(variable, name, size) == 0 && variable[size] == '=' ? variable + size + 1
+                                                                            : nullptr;
+}
+
+// What the program executes shall find the environment as it was before: the recorder is the first
+// of those preloaded.
+void RestoreEnvironment() {
+    for (char** place = environ; *place != nullptr;) {
+        char* const preloaded = ValueOf(*place, "LD_PRELOAD");
+        char* const others = preloaded != nullptr ? std::strchr(preloaded, ':') : nullptr;
+        if (others != nullptr) { std::memmove(preloaded, others + 1, std::strlen(others)); }
+        if (ValueOf(*place, channelVariable) != nullptr || (preloaded != nullptr && !others)) {
+            Forget(place);
+        } else {
+            ++place;
+        }
+    }
+}
+
+// The channel that the descriptor leads to, if it is meant for this process and was never taken.
+Channel* TakeChannel(int descriptor) {
+    void* const memory =
+        mmap(nullptr, sizeof(Channel), PROT_READ | PROT_WRITE, MAP_SHARED, descriptor, 0);
+    if (memory == MAP_FAILED) { return nullptr; }
+    auto* const channel = static_cast<Channel*>(memory);
+    if (channel->magic == channelMagic && channel->pid == getpid() &&
+        channel->isTaken.exchange(1) == 0) {
+        return channel;
+    }
+    munmap(memory, sizeof(Channel));
+    return nullptr;
+}
+
+void Activate(Channel* channel) {
+    const auto pageSize = static_cast<std::size_t>(sysconf(_SC_PAGESIZE));
+    void* const page =
+        mmap(nullptr, pageSize, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+    if (page == MAP_FAILED || madvise(page, pageSize, MADV_WIPEONFORK) != 0) { return; }
+    static_cast<Active*>(page)->channel.store(channel, std::memory_order_relaxed);
+    active = static_cast<Active*>(page);
+}
+
+std::uint64_t TicksOfTimer() {
+    std::uint64_t least = ~std::uint64_t{0};
+    for (int round = 0; round != 100; ++round) {
+        const std::uint64_t start = Ticks();
+        const std::uint64_t ticks = Ticks() - start;
+        least = ticks < least ? ticks : least;
+    }
+    return least;
+}
+std::uint64_t ticksOfTimer = 0;
+
+}  // namespace
+
+Active* active = &inactive;
+thread_local ThreadState threadState = {};
+
+void Attach() {
+    if (environ == nullptr || isSearched.exchange(true)) { return; }
+    const int oldErrno = errno;
+    const char* const text = std::getenv(channelVariable);
+    if (text != nullptr) {
+        const int descriptor = std::atoi(text);
+        Channel* const channel = TakeChannel(descriptor);
+        close(descriptor);
+        RestoreEnvironment();
+        ticksOfTimer = TicksOfTimer();
+        if (channel != nullptr) { Activate(channel); }
+    }
+    errno = oldErrno;
+}
+
+void NumberThread(Channel& channel) {
+    const std::uint32_t number = channel.numThreads.fetch_add(1) + 1;
+    threadState.number = number < maxThread ? number : maxThread;
+    threadState.random = number;
+}
+
+// Sleeps until the slot is drained. A channel that nobody drains any more is given up: the program
+// goes on without.
+bool WaitForRoom(Channel& channel, std::uint64_t index) {
+    const int oldErrno = errno;
+    const timespec limit = {0, 100000000};
+    bool isDrained = true;
+    ++channel.numWaiting;
+    while (true) {
+        const std::uint32_t seen = channel.tailFutex.load();
+        if (index - channel.tail.load(std::memory_order_acquire) < numSlots) { break; }
+        syscall(SYS_futex, &channel.tailFutex, FUTEX_WAIT, seen, &limit, nullptr, 0);
+        if (getppid() != channel.parentPid) {
+            active->channel.store(nullptr, std::memory_order_relaxed);
+            isDrained = false;
+            break;
+        }
+    }
+    --channel.numWaiting;
+    errno = oldErrno;
+    return isDrained;
+}
+
+Sample::~Sample() {
+    // A thread that was interrupted in between would count for thousands of calls.
+    constexpr std::uint64_t tooLong = 1U << 17;
+    const std::uint64_t whole = Ticks() - start;
+    if (whole > tooLong) { return; }
+    const auto without = [](std::uint64_t ticks, std::uint64_t timer) {
+        return ticks > timer ? ticks - timer : 0;
+    };
+    channel.allocatorTicks.fetch_add(without(inside, ticksOfTimer), std::memory_order_relaxed);
+    channel.recorderTicks.fetch_add(without(whole - inside, 2 * ticksOfTimer),
+                                    std::memory_order_relaxed);
+}
+
+}  // namespace Record

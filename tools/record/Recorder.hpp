@@ -1,0 +1,110 @@
+// The recorder inside of the program: whether it records, and how an event gets into the channel.
+// It asks the program's heap for nothing.
+
+#ifndef OBR_TOOLS_RECORD_RECORDER_HPP
+#define OBR_TOOLS_RECORD_RECORDER_HPP
+
+#include <atomic>
+#include <cstdint>
+
+#include "record/Channel.hpp"
+#include "record/Ticks.hpp"
+
+#define RECORDER_API extern "C" __attribute__((visibility("default")))
+
+namespace Record {
+
+// On a page of its own, which the kernel clears in a forked child: the child goes on unrecorded,
+// however it was made.
+struct Active {
+    std::atomic<Channel*> channel;
+};
+extern Active* active;
+
+struct ThreadState {
+    std::uint32_t number;     // From 1 on, in the order of their first events; 0 before that.
+    std::uint32_t countdown;  // Calls until one is timed.
+    std::uint32_t random;
+};
+// In the memory that the loader gives each thread from the start: its first use allocates nothing.
+extern thread_local ThreadState threadState __attribute__((tls_model("initial-exec")));
+
+// The channel, or null while nothing is recorded.
+inline Channel* ActiveChannel() {
+    return active->channel.load(std::memory_order_relaxed);
+}
+
+// Finds the channel, once the environment can be read.
+void Attach();
+
+// Slow paths.
+void NumberThread(Channel& channel);
+bool WaitForRoom(Channel& channel, std::uint64_t index);
+
+inline std::uint64_t ThreadNumber(Channel& channel) {
+    if (__builtin_expect(threadState.number == 0, 0)) { NumberThread(channel); }
+    return threadState.number;
+}
+
+inline void Fill(Channel& channel, std::uint64_t index, std::uint64_t where, std::uint64_t what) {
+    Slot& slot = channel.slots[index % numSlots];
+    slot.where.store(where, std::memory_order_relaxed);
+    slot.what.store(what | Lap(index), std::memory_order_release);
+}
+
+// Takes `number` slots in a row and returns the index of the first in `index`; false if nothing is
+// recorded any more.
+inline bool Take(Channel& channel, std::uint64_t number, std::uint64_t& index) {
+    index = channel.head.fetch_add(number, std::memory_order_acq_rel);
+    const std::uint64_t last = index + number - 1;
+    const bool hasRoom = last - channel.tail.load(std::memory_order_acquire) < numSlots;
+    return __builtin_expect(hasRoom, 1) || WaitForRoom(channel, last);
+}
+
+inline std::uint64_t Where(Channel& channel, const void* address) {
+    return reinterpret_cast<std::uint64_t>(address) << addressShift | ThreadNumber(channel);
+}
+inline std::uint64_t What(Op op, std::uint64_t size, std::uint64_t group) {
+    return (size < maxSize ? size : maxSize) | group << groupShift |
+           static_cast<std::uint64_t>(op) << opShift;
+}
+
+inline void Put(Channel& channel, Op op, const void* block, std::uint64_t size,
+                std::uint64_t group) {
+    std::uint64_t index = 0;
+    if (Take(channel, 1, index)) {
+        Fill(channel, index, Where(channel, block), What(op, size, group));
+    }
+}
+
+// Whether this call is one to be timed.
+inline bool IsSampled() {
+    if (__builtin_expect(threadState.countdown-- != 0, 1)) { return false; }
+    // The next one is 32 to 95 calls away, so that no pattern of the program keeps step.
+    threadState.random = threadState.random * 1664525U + 1013904223U;
+    threadState.countdown = samplePeriod / 2 + (threadState.random >> 26) - 1;
+    return true;
+}
+
+// Times a call: the recorder's part around it from construction to destruction, and within it that
+// of the allocator.
+class Sample {
+public:
+    explicit Sample(Channel& toChannel) : channel(toChannel), start(Ticks()) {}
+    Sample(const Sample&) = delete;
+    Sample& operator=(const Sample&) = delete;
+    ~Sample();
+
+    void EnterAllocator() { entered = Ticks(); }
+    void LeaveAllocator() { inside += Ticks() - entered; }
+
+private:
+    Channel& channel;
+    const std::uint64_t start;
+    std::uint64_t entered = 0;
+    std::uint64_t inside = 0;
+};
+
+}  // namespace Record
+
+#endif

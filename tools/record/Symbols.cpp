@@ -1,0 +1,73 @@
+// Symbol tables, those of separate debug files included, are elfutils' work.
+
+#include "record/Symbols.hpp"
+
+#include <cxxabi.h>
+#include <elfutils/libdwfl.h>
+
+#include <cstdlib>
+#include <sstream>
+
+namespace Record {
+
+namespace {
+
+std::string Hex(std::uint64_t number) {
+    std::ostringstream text;
+    text << "0x" << std::hex << number;
+    return text.str();
+}
+
+std::string Demangled(const char* symbol) {
+    int status = 0;
+    const std::unique_ptr<char, void (*)(void*)> name(
+        abi::__cxa_demangle(symbol, nullptr, nullptr, &status), std::free);
+    return status == 0 ? name.get() : symbol;
+}
+
+void Close(Dwfl* file) {
+    if (file != nullptr) { dwfl_end(file); }
+}
+
+}  // namespace
+
+std::string NameOf(const Module& module) {
+    const std::string path = module.path;
+    return path.substr(path.rfind('/') + 1);
+}
+
+std::string Symbols::Name(const Module& module, std::uint64_t address) {
+    if (module.path[0] == '\0') { return Hex(address); }
+    const std::string file = NameOf(module);
+    if (Dwfl* const dwfl = Open(module)) {
+        // A call may be the last instruction of a function: what matters lies before the return.
+        if (Dwfl_Module* const found = dwfl_addrmodule(dwfl, address - 1)) {
+            GElf_Off offset = 0;
+            GElf_Sym symbol = {};
+            const char* const name = dwfl_module_addrinfo(found, address - 1, &offset, &symbol,
+                                                          nullptr, nullptr, nullptr);
+            if (name != nullptr) {
+                return Demangled(name) + "+" + Hex(offset + 1) + " (" + file + ")";
+            }
+        }
+    }
+    return file + "+" + Hex(address - module.base);
+}
+
+Dwfl* Symbols::Open(const Module& module) {
+    const auto [place, isNew] = files.try_emplace(&module, nullptr, Close);
+    if (!isNew) { return place->second.get(); }
+    static const Dwfl_Callbacks callbacks = {nullptr, dwfl_standard_find_debuginfo,
+                                             dwfl_offline_section_address, nullptr};
+    File file(dwfl_begin(&callbacks), Close);
+    if (file == nullptr) { return nullptr; }
+    dwfl_report_begin(file.get());
+    if (dwfl_report_elf(file.get(), "", module.path, -1, module.base, false) == nullptr) {
+        return nullptr;
+    }
+    dwfl_report_end(file.get(), nullptr, nullptr);
+    place->second = std::move(file);
+    return place->second.get();
+}
+
+}  // namespace Record

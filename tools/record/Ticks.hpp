@@ -1,0 +1,33 @@
+// A clock that is cheap to read, in ticks of its own.
+
+#ifndef OBR_TOOLS_RECORD_TICKS_HPP
+#define OBR_TOOLS_RECORD_TICKS_HPP
+
+#include <cstdint>
+
+#if defined(__x86_64__)
+#include <x86intrin.h>
+#else
+#include <ctime>
+#endif
+
+namespace Record {
+
+inline std::uint64_t Ticks() {
+#if defined(__x86_64__)
+    return __rdtsc();
+#elif defined(__aarch64__)
+    std::uint64_t ticks = 0;
+    asm volatile("mrs %0, cntvct_el0" : "=r"(ticks));
+    return ticks;
+#else
+    timespec now = {};
+    clock_gettime(CLOCK_MONOTONIC, &now);
+    return static_cast<std::uint64_t>(now.tv_sec) * 1000000000U +
+           static_cast<std::uint64_t>(now.tv_nsec);
+#endif
+}
+
+}  // namespace Record
+
+#endif
