@@ -6,6 +6,8 @@
 #include "record/Callers.hpp"
 
 #include <dlfcn.h>
+#include <sys/auxv.h>
+#include <unistd.h>
 #include <unwind.h>
 
 #include <cerrno>
@@ -87,15 +89,12 @@ std::uint32_t FindModule(Channel& channel, const Dl_info& info) {
     std::uint32_t index = 1;
     for (; index <= number; ++index) {
         const Module& module = channel.modules[index];
-        if (module.base == base &&
-            std::strncmp(module.path, info.dli_fname, sizeof(module.path) - 1) == 0) {
-            break;
-        }
+        if (module.base == base && std::strcmp(module.path, path) == 0) { break; }
     }
     if (index > number && index < numModules) {
         Module& module = channel.modules[index];
         module.base = base;
-        std::strncpy(module.path, info.dli_fname, sizeof(module.path) - 1);
+        std::memcpy(module.path, path, sizeof(path));
         channel.numModulesUsed.store(index);
     }
     channel.modulesLock.store(0);
