@@ -14,9 +14,10 @@ if(MEMPOOL_IS_SHARED)
 endif()
 
 if(OBR_MEMPOOL_INSTALL)
-    set(installedGdbDir ${CMAKE_INSTALL_DATADIR}/ObrMemPool/gdb)
-    install(FILES ${gdbDir}/autoload.py DESTINATION ${installedGdbDir})
-    install(DIRECTORY ${gdbDir}/obrmempool DESTINATION ${installedGdbDir}
+    # Two major versions of the library can be installed at once, each with its script.
+    set(installedGdbDir ${CMAKE_INSTALL_DATADIR}/ObrMemPool-${PROJECT_VERSION_MAJOR}/gdb)
+    install(FILES ${gdbDir}/autoload.py DESTINATION ${installedGdbDir} COMPONENT runtime)
+    install(DIRECTORY ${gdbDir}/obrmempool DESTINATION ${installedGdbDir} COMPONENT runtime
         FILES_MATCHING PATTERN *.py PATTERN __pycache__ EXCLUDE)
 endif()
 if(OBR_MEMPOOL_INSTALL AND MEMPOOL_IS_SHARED)
@@ -26,5 +27,6 @@ if(OBR_MEMPOOL_INSTALL AND MEMPOOL_IS_SHARED)
         set(script \"${installedGdbDir}/autoload.py\")
         set(linkDir \"${CMAKE_INSTALL_LIBDIR}\")
         set(linkName \"${gdbLinkName}\")
-        include(\"${CMAKE_CURRENT_LIST_DIR}/InstallGdbLink.cmake\")")
+        include(\"${CMAKE_CURRENT_LIST_DIR}/InstallGdbLink.cmake\")"
+        COMPONENT runtime)
 endif()

@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
-# Installs the Debian packages that the named jobs need and that are missing: build, test, lint, bench,
-# fuzz, cross and coverage, in any number. Without the right to install it prints the command that
-# would, and fails.
+# Installs the Debian packages that the named jobs need and that are missing: build, test, lint,
+# package, bench, fuzz, cross and coverage, in any number. Without the right to install it prints the
+# command that would, and fails.
 set -euo pipefail
 
 packages=()
@@ -10,6 +10,7 @@ for job in "$@"; do
         build) packages+=(g++ cmake ninja-build libcli11-dev) ;;
         test) packages+=(liblua5.4-dev lua5.4 libsqlite3-dev sqlite3 libgmock-dev zlib1g-dev libzstd-dev libdw-dev nlohmann-json3-dev clang libclang-rt-14-dev binutils pkg-config gdb) ;;
         lint) packages+=(git clang-format clang-tidy shellcheck) ;;
+        package) packages+=(git dpkg-dev file lintian pandoc mmdebstrap) ;;
         bench) packages+=(liblua5.4-dev libsqlite3-dev libbenchmark-dev zlib1g-dev libzstd-dev libmimalloc2.0 libjemalloc2 libtcmalloc-minimal4
             libboost-dev gnuplot-nox python3) ;;
         fuzz) packages+=(libgmock-dev zlib1g-dev libzstd-dev clang libclang-rt-14-dev) ;;

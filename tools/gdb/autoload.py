@@ -13,7 +13,11 @@ folder = os.path.dirname(os.path.realpath(this_file))
 if folder not in sys.path:
     sys.path.insert(0, folder)
 
+# What Python would keep beside them, where root runs gdb, no package would remove.
+keeps_nothing = sys.dont_write_bytecode
+sys.dont_write_bytecode = True
 import obrmempool.commands  # noqa: E402  (The path is set above.)
 import obrmempool.printers  # noqa: E402
 
+sys.dont_write_bytecode = keeps_nothing
 obrmempool.printers.register(gdb.current_objfile())
