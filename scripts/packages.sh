@@ -12,8 +12,9 @@ top=$PWD/build/packages
 root=$top/root
 mkdir -p "$top"
 
-# The bare Debian takes a minute, which the builds share, and stays for the next time.
-inRoot=(g++ clang cmake make pkg-config gdb)
+# The bare Debian has what the hosts and the tools need. It takes a minute, which the builds share,
+# and stays for the next time.
+inRoot=(g++ clang cmake make pkg-config gdb libdw1)
 isBare=true
 [ "$(id -u)" -eq 0 ] || isBare=false
 if $isBare && [ "$(cat "$top/root.made" 2>/dev/null)" != "${inRoot[*]}" ]; then
