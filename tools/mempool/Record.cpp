@@ -33,8 +33,8 @@ itself cannot be seen.
               libraries, with the function's name if the file has symbols. Calls out of a function
               of these libraries that takes stack by a size of its own count as that function's.
 --by module   The program's file and each of its shared libraries is a group.
---pools       Records the pools of libObrMemPool in place of the heap: they must be on in the
-              program, which must be linked to the shared library.
+--pools       Records the pools of libObrMemPool in place of the heap, on or off, Mgr::Clear
+              included. The program must use the shared library.
 
 Facts in the trace (mempool text prints them): program, by, cpu_seconds (without the recorder's own
 part), allocation_share (of that time, what the allocation calls take, from a sample), threads,

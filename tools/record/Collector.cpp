@@ -9,6 +9,7 @@
 
 #include <algorithm>
 #include <climits>
+#include <cstring>
 
 namespace Record {
 
@@ -29,16 +30,14 @@ std::uint64_t AddressOf(std::uint64_t where) {
 }  // namespace
 
 Collector::Collector(Channel& fromChannel, Trace::CompactWriter& toWriter)
-    : channel(fromChannel), writer(toWriter), knownPools(numCallers + 1) {
-    writer.WriteOwned();
-}
+    : channel(fromChannel), writer(toWriter), knownPools(numCallers + 1) {}
 
 bool Collector::Drain(bool atEnd) {
     constexpr std::uint64_t most = 1U << 14;
     const std::uint64_t first = channel.tail.load(std::memory_order_relaxed);
     const std::uint64_t last = std::min(channel.head.load(std::memory_order_acquire), first + most);
     std::uint64_t index = first;
-    for (; index != last; ++index) {
+    for (; index < last; ++index) {
         const Slot& slot = channel.slots[index % numSlots];
         const std::uint64_t what = slot.what.load(std::memory_order_acquire);
         if ((what & lapMask) == Lap(index)) {
@@ -56,7 +55,7 @@ bool Collector::Drain(bool atEnd) {
     return true;
 }
 
-void Collector::Write(std::uint64_t, std::uint64_t where, std::uint64_t what) {
+void Collector::Write(std::uint64_t& index, std::uint64_t where, std::uint64_t what) {
     const std::uint64_t thread = where & maxThread;
     if (thread != lastThread) {
         writer.WriteThread(thread);
@@ -64,8 +63,44 @@ void Collector::Write(std::uint64_t, std::uint64_t where, std::uint64_t what) {
     }
     ++numEvents;
     if (OpOf(what) == Op::Released) { return writer.WriteReleased(AddressOf(where)); }
+    if (OpOf(what) != Op::Allocated) { return WritePoolEvent(index, AddressOf(where), what); }
     const std::uint64_t pool = PoolOf(what >> groupShift & maxGroup, thread);
     writer.Write({Trace::Kind::Allocated, pool, AddressOf(where), SizeOf(what), {}, {}});
+}
+
+// An event of a pool, whose Data slots follow and are filled before it is.
+void Collector::WritePoolEvent(std::uint64_t& index, std::uint64_t pool, std::uint64_t what) {
+    switch (OpOf(what)) {
+        case Op::PoolCreated:
+            return writer.Write({Trace::Kind::Created, pool, 0, 0, {}, {}});
+        case Op::PoolDestroyed:
+            return writer.Write({Trace::Kind::Destroyed, pool, 0, 0, {}, {}});
+        case Op::PoolCleared:
+            return writer.Write({Trace::Kind::Cleared, pool, 0, 0, {}, {}});
+        case Op::PoolNamed: {
+            std::string name(SizeOf(what), '\0');
+            for (std::size_t place = 0; place < name.size(); place += sizeof(std::uint64_t)) {
+                const std::uint64_t part = NextData(index).where;
+                std::memcpy(name.data() + place, &part,
+                            std::min(sizeof(part), name.size() - place));
+            }
+            return writer.Write({Trace::Kind::Named, pool, 0, 0, {}, name});
+        }
+        case Op::PoolAllocated: {
+            const Slot& data = NextData(index);
+            return writer.Write(
+                {Trace::Kind::Allocated, pool, AddressOf(data.where), SizeOf(data.what), {}, {}});
+        }
+        case Op::PoolFreed:
+            return writer.Write(
+                {Trace::Kind::Freed, pool, AddressOf(NextData(index).where), 0, {}, {}});
+        default:
+            break;
+    }
+}
+
+const Slot& Collector::NextData(std::uint64_t& index) const {
+    return channel.slots[++index % numSlots];
 }
 
 std::uint64_t Collector::NumberOfPool(std::uint64_t group, std::uint64_t thread) const {

@@ -25,8 +25,9 @@ public:
     std::uint64_t NumEvents() const { return numEvents; }
 
 private:
-    void Write(std::uint64_t index, std::uint64_t where, std::uint64_t what);
-    void WritePoolEvent(Op op, std::uint64_t pool, const std::string& data, std::uint64_t size);
+    void Write(std::uint64_t& index, std::uint64_t where, std::uint64_t what);
+    void WritePoolEvent(std::uint64_t& index, std::uint64_t pool, std::uint64_t what);
+    const Slot& NextData(std::uint64_t& index) const;
     std::uint64_t PoolOf(std::uint64_t group, std::uint64_t thread);
     std::uint64_t NumberOfPool(std::uint64_t group, std::uint64_t thread) const;
     std::string NameOfPool(std::uint64_t group, std::uint64_t pool);

@@ -101,16 +101,6 @@ inline bool IsReady() {
     return isReady.load(std::memory_order_acquire);
 }
 
-// The channel of a program that is recorded, or null.
-inline Channel* OpenChannel() {
-    Channel* const channel = ActiveChannel();
-    if (__builtin_expect(channel == nullptr, 0)) {
-        Attach();
-        return ActiveChannel();
-    }
-    return channel;
-}
-
 struct CallSite {
     const void* returnAddress;
     const void* frame;

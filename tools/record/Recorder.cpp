@@ -102,6 +102,11 @@ void Attach() {
     errno = oldErrno;
 }
 
+// For a program that asks for nothing.
+__attribute__((constructor)) static void AttachAtStart() {
+    Attach();
+}
+
 void NumberThread(Channel& channel) {
     const std::uint32_t number = channel.numThreads.fetch_add(1) + 1;
     threadState.number = number < maxThread ? number : maxThread;

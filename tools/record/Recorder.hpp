@@ -37,6 +37,12 @@ inline Channel* ActiveChannel() {
 // Finds the channel, once the environment can be read.
 void Attach();
 
+// The channel of a program that is recorded, or null.
+inline Channel* OpenChannel() {
+    if (__builtin_expect(ActiveChannel() == nullptr, 0)) { Attach(); }
+    return ActiveChannel();
+}
+
 // Slow paths.
 void NumberThread(Channel& channel);
 bool WaitForRoom(Channel& channel, std::uint64_t index);

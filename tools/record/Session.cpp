@@ -295,6 +295,7 @@ Outcome RecordProgram(const Order& order) {
     const SharedChannel channel;
     channel->by = order.by;
     Collector collector(*channel, writer);
+    if (!order.pools) { writer.WriteOwned(); }
     const Signals signals;
     const TickRate rate;
     const pid_t program = Start(order, channel, recorder, signals);
