@@ -20,6 +20,7 @@
 #include "mempool/Settings.hpp"
 #include "report/Analysis.hpp"
 #include "report/Json.hpp"
+#include "report/Page.hpp"
 
 namespace Tool {
 
@@ -55,6 +56,13 @@ struct Options {
     bool all = false;
 };
 
+void WriteFile(const std::string& path, const std::string& text) {
+    std::ofstream file(path, std::ios::binary);
+    file << text;
+    file.close();
+    if (!file) { throw std::system_error(errno, std::generic_category(), path); }
+}
+
 int ReportOn(const Options& options) {
     ReportOptions report = options.report;
     if (options.all) { report.extent = Extent::All; }
@@ -72,12 +80,20 @@ int ReportOn(const Options& options) {
 int WriteReport(Trace::StepReader& reader, const ReportOptions& options) {
     const std::string problem = options.settings.Problem();
     if (!problem.empty()) { throw std::runtime_error("these settings make no pool: " + problem); }
+    if (!options.html.empty() && !Report::HasPage()) {
+        throw std::runtime_error(
+            "this program was built without the Debian package libjs-d3 and makes no pages");
+    }
     const Progress progress(reader.Name());
     const Report::Analysis analysis = Report::Analyse(reader, options.settings, [&](auto position) {
         progress.Show("line " + std::to_string(position));
     });
     progress.Clear();
 
+    if (options.html == "-") {
+        std::cout << Report::MakePage(analysis) << std::flush;
+        return WarnOfBrokenTrace(reader);
+    }
     if (options.json) {
         std::cout << Report::ToJson(analysis) << '\n';
     } else {
@@ -86,6 +102,7 @@ int WriteReport(Trace::StepReader& reader, const ReportOptions& options) {
         PrintAnalysis(std::cout, analysis, options.extent, badLines.str());
     }
     std::cout << std::flush;
+    if (!options.html.empty()) { WriteFile(options.html, Report::MakePage(analysis)); }
     return WarnOfBrokenTrace(reader);
 }
 
@@ -97,6 +114,11 @@ void AddReport(Program& program) {
         ->required()
         ->type_name("");
     report.add_flag("--json", options->report.json, "Print all figures as JSON");
+    report
+        .add_option("--html", options->report.html,
+                    "Write a page with charts to FILE too; - is standard output, which then has "
+                    "nothing else")
+        ->type_name("FILE");
     report.add_flag("--all", options->all, "Print every size and every group");
     AddSettings(report, options->report.settings);
     report.callback(

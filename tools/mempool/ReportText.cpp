@@ -20,8 +20,6 @@ using Report::Analysis;
 using Report::BlockSum;
 using Report::Tally;
 
-constexpr std::size_t lineWidth = 80;
-
 // 1234567 as 1,234,567.
 std::string Count(std::uint64_t number) {
     std::string text = std::to_string(number);
@@ -50,6 +48,14 @@ std::string Percent(std::uint64_t part, std::uint64_t whole) {
     text << std::fixed << std::setprecision(1)
          << 100 * static_cast<double>(part) / static_cast<double>(whole) << " %";
     return text.str();
+}
+
+// At most so many bytes, to the start of a character of UTF-8, and dots for the rest.
+std::string Cut(const std::string& text, std::size_t bytes) {
+    if (text.size() <= bytes) { return text; }
+    std::size_t end = bytes - 3;
+    while (end > 0 && (static_cast<unsigned char>(text[end]) & 0xC0) == 0x80) { --end; }
+    return text.substr(0, end) + "...";
 }
 
 // Right-aligned cells.
@@ -145,17 +151,12 @@ void PrintGraph(std::ostream& out, const Analysis& analysis) {
     constexpr std::uint64_t height = 5;
     std::array<std::uint64_t, width> columns = {};
     for (const Report::Point& point : analysis.timeline) {
-        const std::uint64_t event = std::max<std::uint64_t>(point.most.event, 1) - 1;
-        std::uint64_t& column =
-            columns.at(event * width / std::max<std::uint64_t>(analysis.events, 1));
-        column = std::max(column, point.most.asked);
-    }
-    // A short trace has fewer events than the graph has columns: a column without one is as before.
-    for (std::size_t i = 1; i < width; ++i) {
-        if (analysis.events < width &&
-            (i * analysis.events) / width == ((i - 1) * analysis.events) / width) {
-            columns.at(i) = columns.at(i - 1);
-        }
+        // An event of a short trace has several columns.
+        const std::uint64_t behind = point.most.event * width / analysis.events;
+        std::size_t column = (point.most.event - 1) * width / analysis.events;
+        do {
+            columns.at(column) = std::max(columns.at(column), point.most.asked);
+        } while (++column < behind);
     }
     out << "\n   BYTES ASKED FOR OVER THE TRACE\n";
     for (std::uint64_t line = height; line > 0; --line) {
@@ -252,20 +253,22 @@ void PrintGroups(std::ostream& out, const Analysis& analysis, Extent extent) {
         extent == Extent::All ? analysis.groups.size() : std::min(analysis.groups.size(), most);
     out << "\n   GROUPS" << (shown < analysis.groups.size() ? " LARGEST AT THE PEAK" : "")
         << Shown(shown, analysis.groups.size()) << '\n';
-    out << "     at peak       blocks     bytes   short   never together   clear  name\n";
-    constexpr std::size_t nameWidth = lineWidth - 69;
+    out << "    at peak      blocks     bytes  short  never together  clear  name\n";
+    const auto share = [](std::uint64_t part, std::uint64_t whole) {
+        const std::string percent = Percent(part, whole);
+        return percent.substr(0, percent.find(' ')) + (whole == 0 ? "" : "%");
+    };
     for (std::size_t i = 0; i < shown; ++i) {
         const Report::GroupRow& group = analysis.groups[i];
         const Tally& tally = group.tally;
         const std::uint64_t blocks = tally.all.blocks;
-        std::string name = SafeText(group.name);
-        (void)nameWidth;
-        out << "   " << std::setw(9) << Bytes(tally.atPeak.bytes) << ' ' << std::setw(12)
-            << Count(blocks) << ' ' << std::setw(9) << Bytes(tally.all.bytes) << ' ' << std::setw(7)
-            << Percent(tally.lifetimes[0] + tally.lifetimes[1], blocks) << ' ' << std::setw(7)
-            << Percent(tally.never, blocks) << ' ' << std::setw(8)
-            << Percent(group.runs.together, blocks) << ' ' << std::setw(7)
-            << Percent(group.runs.clearable, blocks) << "  " << name << '\n';
+        out << "   " << std::setw(8) << Bytes(tally.atPeak.bytes) << std::setw(12) << Count(blocks)
+            << std::setw(10) << Bytes(tally.all.bytes) << std::setw(7)
+            << share(tally.lifetimes[0] + tally.lifetimes[1], blocks) << std::setw(7)
+            << share(tally.never, blocks) << std::setw(9) << share(group.runs.together, blocks)
+            << std::setw(7) << share(group.runs.clearable, blocks) << "  "
+            << (extent == Extent::All ? SafeText(group.name) : Cut(SafeText(group.name), 36))
+            << '\n';
     }
 }
 

@@ -125,6 +125,7 @@ private:
 
     void Drop(std::uint32_t pool, const std::vector<Trace::Block>& dropped, End end) {
         for (const Trace::Block& block : dropped) { Release(pool, block, end); }
+        if (result.total.live.blocks == 0) { onePool.Clear(0); }
     }
 
     // What there is to see behind an event.

@@ -1,0 +1,146 @@
+// `mempool report` as its users run it. A small made trace, whose figures can be worked out by
+// hand, against expected/report.txt and expected/report.json; OBR_MEMPOOL_APPROVE writes both anew.
+
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <string>
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+using testing::HasSubstr;
+using testing::Not;
+
+namespace {
+
+// A folder of this test run, which goes with it.
+class Folder {
+public:
+    Folder() : path(testing::TempDir() + "ReportTest.XXXXXX") {
+        if (mkdtemp(path.data()) == nullptr) { std::abort(); }
+    }
+    Folder(const Folder&) = delete;
+    Folder& operator=(const Folder&) = delete;
+    ~Folder() { std::filesystem::remove_all(path); }
+
+    std::string path;
+};
+
+std::string Path(const std::string& name) {
+    static const Folder folder;
+    return folder.path + "/" + name;
+}
+
+std::string Bytes(const std::string& path) {
+    std::ifstream file(path, std::ios::binary);
+    return {std::istreambuf_iterator<char>(file), {}};
+}
+
+// What `mempool report` writes on both streams, given that it returns `exitStatus`.
+std::string Tool(const std::string& arguments, int exitStatus = 0) {
+    const std::string command = "cd " + Path("") + " && " MEMPOOL " report " + arguments + " 2>&1";
+    std::FILE* const tool = popen(command.c_str(), "r");
+    std::string text;
+    for (int c = std::fgetc(tool); c != EOF; c = std::fgetc(tool)) { text += static_cast<char>(c); }
+    const int status = pclose(tool);
+    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == exitStatus) << text;
+    return text;
+}
+
+// Two groups, of which one is cleared and the other not all freed. A name with everything that
+// could be taken for something else, and a bad line.
+const char* const trace =
+    "output of the program\n"
+    "xmpt:i:program:demo --fast\nxmpt:i:by:caller\nxmpt:i:allocation_share:0.25\n"
+    "xmpt:i:threads:2\nxmpt:i:foreign_frees:3\nxmpt:i:cpu_seconds:1.5\n"
+    "xmpt:c:0000000000000001\nxmpt:n:0000000000000001:nodes\n"
+    "xmpt:c:0000000000000002\n"
+    "xmpt:n:0000000000000002:</script>\xC3\xBC\x1B[31m\xC2\x9B\"\\\x80&\n"
+    "xmpt:a:0000000000000001:0000000000000010:24\n"
+    "xmpt:a:0000000000000001:0000000000000020:22\n"
+    "xmpt:a:0000000000000002:0000000000000030:5000\n"
+    "xmpt:f:0000000000000001:0000000000000010:\n"
+    "xmpt:f:0000000000000001:0000000000000040:\n"
+    "xmpt:a:0000000000000002:0000000000000050:100\n"
+    "xmpt:x:0000000000000001\n"
+    "xmpt:f:0000000000000002:0000000000000050:\n"
+    "xmpt:f:0000000000000002:0000000000000030:\n"
+    "xmpt:a:0000000000000002:0000000000000060:7\n";
+
+void ExpectFile(const std::string& text, const std::string& name) {
+    const std::string path = std::string(EXPECTED_DIR "/") + name;
+    if (std::getenv("OBR_MEMPOOL_APPROVE") != nullptr) { std::ofstream(path) << text; }
+    EXPECT_EQ(text, Bytes(path));
+}
+
+TEST(Report, TellsTheFiguresOfASmallTrace) {
+    std::ofstream(Path("small")) << trace;
+    ExpectFile(Tool("small"), "report.txt");
+    ExpectFile(Tool("--json small"), "report.json");
+    EXPECT_EQ(Tool("- <small").substr(0, 15), "standard input\n");
+    EXPECT_THAT(Tool("--alignment 16 --json small"), HasSubstr("\"padding\":39,"));
+}
+
+TEST(Report, IsAPageUnlessAllIsAskedFor) {
+    std::ofstream file(Path("many"));
+    const std::string longName = std::string(80, 'n') + "-the-end";
+    for (int group = 100; group < 150; ++group) {
+        const std::string pool = ":0000000000000" + std::to_string(group);
+        file << "xmpt:c" << pool << "\nxmpt:n" << pool << ':' << group << longName << "\nxmpt:a"
+             << pool << ":0000000000000010:" << group << '\n';
+    }
+    file.close();
+    const std::string page = Tool("many");
+    EXPECT_LE(std::count(page.begin(), page.end(), '\n'), 45);
+    EXPECT_THAT(page, HasSubstr("GROUPS LARGEST AT THE PEAK (7 of 50)"));
+    EXPECT_THAT(page, Not(HasSubstr("-the-end")));
+    const std::string all = Tool("--all many");
+    EXPECT_THAT(all, HasSubstr("149" + longName + "\n"));
+    EXPECT_THAT(all, HasSubstr("100" + longName + "\n"));
+    EXPECT_THAT(all, HasSubstr("\n               100             1 "));
+}
+
+// Names are text in the page, and its data end where they should.
+TEST(Report, WritesAPage) {
+    std::ofstream(Path("small")) << trace;
+    const std::string text = Tool("--html page.html small");
+    const std::string page = Bytes(Path("page.html"));
+    if (page.empty()) { GTEST_SKIP() << text; }
+    ExpectFile(text, "report.txt");
+    EXPECT_EQ(Tool("--html - small"), page);
+    const std::string start = "<script type=\"application/json\" id=\"data\">";
+    const std::size_t first = page.find(start) + start.size();
+    std::string data = page.substr(first, page.find("</script>", first) - first);
+    const std::string escape = "\\u003c";
+    EXPECT_EQ(data.find('<'), std::string::npos);
+    data.replace(data.find(escape), escape.size(), "<");
+    EXPECT_EQ(data + "\n", Tool("--json small"));
+    EXPECT_THAT(Tool("--html no/where small", 1), HasSubstr("mempool: no/where: No such file"));
+    EXPECT_THAT(Tool("--html /dev/full small", 1), HasSubstr("mempool: /dev/full: No space left"));
+}
+
+TEST(Report, TellsWhatIsWrongWithATrace) {
+    std::ofstream(Path("other")) << "nothing of the kind\n";
+    EXPECT_EQ(Tool("other", 1), "mempool: other: no trace line\n");
+    EXPECT_EQ(Tool("/nowhere", 1), "mempool: /nowhere: No such file or directory\n");
+    EXPECT_THAT(Tool("--bucket-size 1003 other", 1),
+                HasSubstr("mempool: these settings make no pool: "));
+    std::ofstream(Path("small")) << trace;
+    const std::string cutCommand =
+        "$(gzip <small >whole.gz; head -c 200 whole.gz >cut.gz; echo cut.gz)";
+    const std::string broken = Tool(cutCommand, 1);
+    EXPECT_THAT(broken,
+                HasSubstr("mempool: cut.gz: unexpected end of file; read as far as it goes\n"));
+    EXPECT_THAT(broken, HasSubstr("   blocks                "));
+    EXPECT_THAT(Tool("--json cut.gz", 1),
+                HasSubstr("\"warning\":\"cut.gz: unexpected end of file"));
+}
+
+}  // namespace

@@ -1,0 +1,30 @@
+# Puts the parts of the page into one another and writes them as C++: all that stands ahead of the
+# data, and all that stands behind. Takes PAGE, the folder of the parts, D3, the script, which may be
+# empty, and OUTPUT. Without the script both are empty.
+
+set(page "@DATA@")
+if(D3)
+    file(READ ${PAGE}/report.html page)
+    foreach(part "STYLE;${PAGE}/report.css" "D3;${D3}" "SCRIPT;${PAGE}/report.js")
+        list(GET part 0 name)
+        list(GET part 1 path)
+        file(READ ${path} text)
+        string(REPLACE "@${name}@" "${text}" page "${page}")
+    endforeach()
+endif()
+
+set(source "// Made from the parts of the page.\n\n#include \"report/Page.hpp\"\n\nnamespace Report {\n")
+string(FIND "${page}" "@DATA@" place)
+string(SUBSTRING "${page}" 0 ${place} head)
+math(EXPR place "${place} + 6")
+string(SUBSTRING "${page}" ${place} -1 tail)
+foreach(part head tail)
+    string(HEX "${${part}}" bytes)
+    string(REGEX REPLACE "(................................)" "\\1\n" bytes "${bytes}")
+    string(REGEX REPLACE "([0-9a-f][0-9a-f])" "'\\\\x\\1'," bytes "${bytes}")
+    string(APPEND source "\nnamespace {\nconst char ${part}Bytes[] = {\n${bytes}'\\0'};\n}\n"
+        "std::string_view Page${part}() { return {${part}Bytes, sizeof ${part}Bytes - 1}; }\n")
+endforeach()
+string(REPLACE "Pagehead" "PageHead" source "${source}")
+string(REPLACE "Pagetail" "PageTail" source "${source}")
+file(WRITE ${OUTPUT} "${source}\n}  // namespace Report\n")

@@ -1,0 +1,484 @@
+// Draws the page from the JSON in it, whose keys docs/report.md tells. Names come from the trace,
+// that is from anywhere: they become text, never markup.
+"use strict";
+
+const data = JSON.parse(document.getElementById("data").textContent);
+
+// Numbers as the text report has them: 1,234,567; three digits and a unit; a share in per cent.
+
+const count = (number) => number.toLocaleString("en-US");
+
+function bytes(value) {
+  const units = ["B", "KB", "MB", "GB", "TB", "PB", "EB"];
+  let unit = 0;
+  while (value >= 999.5 && unit + 1 < units.length) {
+    value /= 1000;
+    ++unit;
+  }
+  return value.toFixed(unit === 0 || value >= 99.95 ? 0 : value >= 9.995 ? 1 : 2) + " " + units[unit];
+}
+
+const percent = (part, whole) => (whole === 0 ? "-" : (100 * part / whole).toFixed(1) + " %");
+
+// The same for an axis, whose ticks need no more digits than they have.
+const bytesTick = (value) => bytes(value).replace(/\.0+ |(\.\d*?)0+ /, "$1 ");
+const countTick = (value) =>
+  value >= 1e9 ? value / 1e9 + " G" : value >= 1e6 ? value / 1e6 + " M" : count(value);
+
+const byId = (id) => d3.select("#" + id);
+const shortLived = (row) => row.lifetimes[0] + row.lifetimes[1];
+const sum = (numbers) => numbers.reduce((a, b) => a + b, 0);
+const sizeText = (row) =>
+  row.smallest === row.largest ? count(row.smallest) : count(row.smallest) + "–" + count(row.largest);
+
+const tracedPools = sum(data.groups.map((group) => group.pools));
+
+// A tooltip follows the pointer and stays within the window.
+
+const tip = document.getElementById("tip");
+function showTip(text) {
+  const event = d3.event.touches ? d3.event.touches[0] : d3.event;
+  tip.textContent = text;
+  tip.hidden = false;
+  const left = Math.min(event.clientX + 14, window.innerWidth - tip.offsetWidth - 8);
+  const above = event.clientY - tip.offsetHeight - 12;
+  tip.style.left = Math.max(left, 8) + "px";
+  tip.style.top = (above > 8 ? above : event.clientY + 18) + "px";
+}
+const hideTip = () => { tip.hidden = true; };
+function tipFor(selection, text) {
+  selection
+    .on("mousemove", (datum, i) => showTip(text(datum, i)))
+    .on("touchstart", (datum, i) => showTip(text(datum, i)))
+    .on("mouseout", hideTip);
+}
+
+// An SVG as wide as its place, with a name and a text for those who do not see it.
+function chart(id, height, margin, title, description) {
+  const place = byId(id);
+  place.selectAll("*").remove();
+  const width = Math.max(place.node().clientWidth, 260);
+  const svg = place.append("svg")
+    .attr({viewBox: `0 0 ${width} ${height}`, height: height, role: "img",
+           "aria-label": title, "aria-describedby": id + "-desc"});
+  svg.append("desc").attr("id", id + "-desc").text(description);
+  return {
+    plot: svg.append("g").attr("transform", `translate(${margin.left},${margin.top})`),
+    width: width - margin.left - margin.right,
+    height: height - margin.top - margin.bottom,
+  };
+}
+
+function axis(box, scale, orient, ticks, format) {
+  const made = d3.svg.axis().scale(scale).orient(orient).ticks(ticks).tickFormat(format)
+    .tickPadding(6);
+  if (orient === "left") { made.innerTickSize(-box.width).outerTickSize(0); }
+  const place = box.plot.append("g").attr("class", orient === "left" ? "axis" : "axis plain");
+  if (orient === "bottom") { place.attr("transform", `translate(0,${box.height})`); }
+  place.call(made);
+}
+
+function label(box, text, x, y, anchor) {
+  box.plot.append("text").attr({x: x, y: y, "text-anchor": anchor || "start"}).text(text);
+}
+
+function eventAxis(box, x) {
+  axis(box, x, "bottom", Math.max(2, Math.floor(box.width / 110)), countTick);
+  label(box, "events", box.width, box.height + 36, "end");
+}
+
+function legend(id, entries, draw) {
+  const place = byId(id);
+  place.selectAll("*").remove();
+  entries.forEach((entry) => {
+    const item = place.append("span");
+    draw(item.append("svg").attr({width: 22, height: 12, "aria-hidden": "true"}), entry);
+    item.append("span").text(entry.name);
+  });
+}
+
+// A table of plain text.
+function table(id, heads, rows) {
+  const place = byId(id);
+  place.append("thead").append("tr").selectAll("th").data(heads).enter().append("th")
+    .attr("scope", "col").text(String);
+  place.append("tbody").selectAll("tr").data(rows).enter().append("tr")
+    .selectAll("td").data((row) => row).enter().append("td").text(String);
+}
+
+// What stands on top.
+
+function figure(path) {
+  return path.split(".").reduce((value, key) => value[key], data);
+}
+
+function heading() {
+  const program = data.program || data.trace;
+  document.title = "Memory of " + program;
+  byId("name").text(program);
+  const facts = [];
+  if (data.program) { facts.push(data.trace); }
+  facts.push(count(data.events) + " events");
+  if (data.by) { facts.push("groups by " + data.by); }
+  if (data.threads !== null) { facts.push(data.threads + (data.threads === 1 ? " thread" : " threads")); }
+  if (data.foreign_frees) { facts.push(count(data.foreign_frees) + " blocks freed by another thread"); }
+  if (data.cpu_seconds !== null) { facts.push(data.cpu_seconds + " s of processor time"); }
+  byId("facts").text(facts.join(" · "));
+
+  const banners = [];
+  if (data.warning) { banners.push(data.warning); }
+  if (data.bad_lines.total > 0) {
+    const faults = Object.keys(data.bad_lines.faults)
+      .map((fault) => count(data.bad_lines.faults[fault]) + " × " + fault);
+    banners.push("Left out as bad lines: " + faults.join(", "));
+  }
+  byId("banners").selectAll("p").data(banners).enter().append("p").attr("class", "banner").text(String);
+}
+
+function verdict() {
+  const peak = data.peak;
+  const beside = (held) => {
+    const ratio = peak.heap > 0 ? held / peak.heap - 1 : 0;
+    return Math.abs(ratio) < 0.03 ? "about as much memory as"
+      : (100 * Math.abs(ratio)).toFixed(0) + " % " + (ratio < 0 ? "less memory than" : "more memory than");
+  };
+  const parts = [tracedPools > 1
+    ? `At the peak a pool for each group would hold ${beside(peak.pools)} the heap, a single pool for all ${beside(peak.one_pool)} it.`
+    : `At the peak pools would hold ${beside(peak.pools)} the heap.`,
+    `${percent(data.in_records.blocks, data.blocks)} of the blocks fit into a bucket.`];
+  if (data.together.clear_runs > 0) {
+    parts.push(`${percent(data.together.clear_blocks, data.blocks)} could go with ` +
+      `${count(data.together.clear_runs)} ${data.together.clear_runs === 1 ? "Clear" : "Clears"} ` +
+      `instead of one by one.`);
+  }
+  byId("verdict").text(data.blocks === 0 ? "The trace has no block." : parts.join(" "));
+
+  const tile = (name, path, show, note) => {
+    const place = byId("tiles").append("div");
+    place.append("dt").text(name);
+    place.append("dd").attr({"data-figure": path, "data-value": figure(path)}).text(show(figure(path)));
+    place.append("dd").text(note);
+  };
+  const ofBlocks = (value) => percent(value, data.blocks);
+  tile("Asked for at the peak", "peak.asked", bytes, `in ${count(peak.blocks)} blocks`);
+  tile("Pools hold then", "peak.pools", bytes, `${percent(peak.pools, peak.heap)} of the heap’s ${bytes(peak.heap)}`);
+  tile("Blocks in all", "blocks", count, `of ${bytes(data.bytes)}, ${percent(shortLived(data), data.blocks)} freed within 100 events`);
+  tile("Fit into a bucket", "in_records.blocks", ofBlocks, `rounding adds ${percent(data.padding, data.in_records.bytes)} to their bytes`);
+  tile("One Clear would free", "together.clear_blocks", ofBlocks, `of the blocks, in ${count(data.together.clear_runs)} rows of frees`);
+  tile("Never freed", "never", ofBlocks, "of the blocks, while their pool lives");
+  // Rows of three, or of four.
+  byId("tiles").classed("many", typeof data.allocation_share === "number");
+  if (typeof data.allocation_share === "number") {
+    tile("Most blocks at any time", "most.blocks", count, `${count(peak.blocks)} at the peak`);
+    tile("Time in allocation calls", "allocation_share", (share) => percent(share, 1), "of the processor time: no allocator can save more");
+  }
+  byId("settings").text(`buckets of ${data.settings.bucket_size} bytes, records of ` +
+    `${data.settings.min_record_size} to ${data.settings.max_record_size}, sizes rounded to ` +
+    `${data.settings.data_alignment}, empty buckets ` +
+    (data.settings.keep_empty_buckets ? "kept" : "released"));
+}
+
+// Live bytes. One pool for all is another thing only where there are several.
+
+const series = [
+  {key: "asked", name: "Asked for, and in grey how far it falls in between", title: "Asked for"},
+  {key: "heap", name: "Heap", title: "Heap"},
+  {key: "pools", name: tracedPools > 1 ? "Pools, one a group" : "Pools", title: tracedPools > 1 ? "Pools, one a group" : "Pools"},
+  {key: "one_pool", name: "One pool for all", title: "One pool for all"},
+].filter((line) => line.key !== "one_pool" || tracedPools > 1);
+
+function timeline() {
+  const lines = data.timeline;
+  const highest = d3.max(series, (line) => d3.max(lines[line.key])) || 1;
+  const box = chart("timeline", 320, {left: 62, right: 10, top: 22, bottom: 42},
+    "Live bytes over the trace",
+    `Asked for at the peak, event ${count(data.peak.event)}: ${bytes(data.peak.asked)}. ` +
+    `Pools hold ${bytes(data.peak.pools)} then, the heap ${bytes(data.peak.heap)}.`);
+  const x = d3.scale.linear().domain([0, data.events]).range([0, box.width]);
+  const y = d3.scale.linear().domain([0, highest]).nice().range([box.height, 0]);
+  axis(box, y, "left", 5, bytesTick);
+  eventAxis(box, x);
+  label(box, "bytes", -6, -10, "end");
+
+  const points = d3.range(lines.event.length);
+  const at = (i) => x(lines.event[i]);
+  const area = (low) => d3.svg.area().x(at).y0((i) => y(low(i))).y1((i) => y(lines.asked[i]))(points);
+  box.plot.append("path").attr({class: "asked-area", d: area(() => 0)});
+  box.plot.append("path").attr({class: "asked-band", d: area((i) => lines.least_asked[i])});
+  series.forEach((line) => {
+    box.plot.append("path").attr({class: "line " + line.key,
+      d: d3.svg.line().x(at).y((i) => y(lines[line.key][i]))(points)});
+  });
+
+  const px = x(data.peak.event);
+  const side = px > box.width - 130 ? -1 : 1;
+  box.plot.append("circle").attr({cx: px, cy: y(data.peak.asked), r: 4, fill: "var(--text)"});
+  const top = y(d3.max(series, (line) => data.peak[line.key]));
+  box.plot.append("text").attr({class: "mark", x: px + 8 * side, y: Math.max(top - 8, -8),
+    "text-anchor": side < 0 ? "end" : "start"}).text("peak: asked for " + bytes(data.peak.asked));
+
+  const cursor = box.plot.append("line").attr({class: "cursor", y1: 0, y2: box.height})
+    .style("display", "none");
+  const move = function () {
+    const event = x.invert(d3.mouse(this)[0]);
+    const i = Math.min(d3.bisectLeft(lines.event, event), points.length - 1);
+    cursor.attr({x1: at(i), x2: at(i)}).style("display", null);
+    showTip([`Event ${count(lines.event[i])}`].concat(series.map((line) =>
+      `${line.title}: ${bytes(lines[line.key][i])}`), `Blocks: ${count(lines.blocks[i])}`).join("\n"));
+  };
+  box.plot.append("rect").attr({width: box.width, height: box.height, fill: "transparent"})
+    .on("mousemove", move).on("touchstart", move).on("touchmove", move)
+    .on("mouseout", () => { cursor.style("display", "none"); hideTip(); });
+
+  legend("timeline-legend", series, (svg, line) => {
+    if (line.key === "asked") {
+      svg.append("rect").attr({class: "asked-area", y: 1, width: 22, height: 11});
+      svg.append("rect").attr({class: "asked-band", y: 1, width: 22, height: 5});
+    }
+    svg.append("line").attr({class: "line " + line.key, x1: 1, x2: 21, y1: line.key === "asked" ? 1 : 6, y2: line.key === "asked" ? 1 : 6});
+  });
+}
+
+// Sizes: bins of half a power of two, by their largest size.
+
+function sizeBins() {
+  const bounds = [8, 16, 24, 32];
+  for (let power = 32; power < Math.pow(2, 30); power *= 2) { bounds.push(power * 1.5, power * 2); }
+  const bins = bounds.map((bound, i) =>
+    ({from: i === 0 ? 0 : bounds[i - 1] + 1, to: bound, blocks: 0, bytes: 0, records: 0}));
+  data.sizes.forEach((row) => {
+    const bin = bins[Math.min(d3.bisectLeft(bounds, row.largest), bins.length - 1)];
+    bin.blocks += row.blocks;
+    bin.bytes += row.bytes;
+    bin.records += row.in_records.blocks;
+  });
+  const used = bins.map((bin) => bin.blocks > 0);
+  return bins.slice(used.indexOf(true) < 0 ? 0 : used.indexOf(true), used.lastIndexOf(true) + 1);
+}
+
+const sizeTick = (size) =>
+  size >= 1048576 ? size / 1048576 + " Mi" : size >= 1024 ? size / 1024 + " Ki" : String(size);
+
+function sizes() {
+  const bins = sizeBins();
+  const box = chart("sizes", 280, {left: 48, right: 10, top: 22, bottom: 46}, "Blocks and bytes by size",
+    "A table behind the chart has the figures.");
+  if (bins.length === 0) { return; }
+  const x = d3.scale.ordinal().domain(d3.range(bins.length)).rangeBands([0, box.width], 0.2, 0.1);
+  const share = (bin, key) => (data[key] > 0 ? bin[key] / data[key] : 0);
+  const y = d3.scale.linear().range([box.height, 0])
+    .domain([0, d3.max(bins, (bin) => Math.max(share(bin, "blocks"), share(bin, "bytes")))]).nice();
+  axis(box, y, "left", 5, (value) => Math.round(1000 * value) / 10 + " %");
+  const step = Math.ceil(62 / (box.width / bins.length));
+  axis(box, x.copy(), "bottom", 0, (i) => ((bins.length - 1 - i) % step === 0 ? "≤ " + sizeTick(bins[i].to) : ""));
+  label(box, "bytes of a block", box.width, box.height + 38, "end");
+  label(box, "share", -6, -10, "end");
+  ["blocks", "bytes"].forEach((key, side) => {
+    box.plot.append("g").selectAll("rect").data(bins).enter().append("rect").attr({
+      class: "bar " + key, rx: 1,
+      x: (bin, i) => x(i) + side * x.rangeBand() / 2, width: x.rangeBand() / 2,
+      y: (bin) => y(share(bin, key)), height: (bin) => box.height - y(share(bin, key))});
+  });
+  const bound = d3.bisectLeft(bins.map((bin) => bin.to), data.settings.max_record_size - 4);
+  if (bound < bins.length - 1) {
+    const bx = x(bound) + x.rangeBand() * 1.125;
+    box.plot.append("line").attr({class: "bound", x1: bx, x2: bx, y1: -4, y2: box.height});
+    const right = bx < box.width / 2;
+    label(box, right ? "heap records →" : "← records | heap records", bx + (right ? 5 : -5), -8, right ? "start" : "end");
+  }
+  tipFor(box.plot.append("g").selectAll("rect").data(bins).enter().append("rect").attr({class: "hit",
+    x: (bin, i) => x(i) - x.rangeBand() * 0.125, width: x.rangeBand() * 1.25, height: box.height}),
+    (bin) => `${count(bin.from)} to ${count(bin.to)} bytes\nBlocks: ${count(bin.blocks)}, ${percent(bin.blocks, data.blocks)}\n` +
+      `Bytes: ${bytes(bin.bytes)}, ${percent(bin.bytes, data.bytes)}\nIn records: ${percent(bin.records, bin.blocks)}`);
+  legend("sizes-legend", [{key: "blocks", name: "Share of the blocks"}, {key: "bytes", name: "Share of the bytes"}],
+    (svg, entry) => svg.append("rect").attr({class: "bar " + entry.key, width: 22, height: 12, rx: 2}));
+}
+
+// Lifetimes.
+
+function lifetimeBins() {
+  const bounds = data.lifetime_bounds;
+  const power = (bound) => (bound < 1e6 ? count(bound) : countTick(bound));
+  const bins = data.lifetimes.map((blocks, i) => ({
+    name: i < bounds.length ? "≤ " + power(bounds[i]) : "longer", blocks: blocks, kind: "blocks"}));
+  while (bins.length > 1 && bins[bins.length - 1].blocks === 0) { bins.pop(); }
+  bins.push({name: "never", blocks: data.never, kind: "never"});
+  let before = 0;
+  bins.forEach((bin) => { before += bin.blocks; bin.within = before; });
+  return bins;
+}
+
+function lifetimes() {
+  const bins = lifetimeBins();
+  const box = chart("lifetimes", 250, {left: 48, right: 10, top: 22, bottom: 42}, "Blocks by lifetime",
+    bins.map((bin) => `${bin.name} events: ${percent(bin.blocks, data.blocks)}`).join(", "));
+  const x = d3.scale.ordinal().domain(d3.range(bins.length)).rangeBands([0, box.width], 0.3, 0.15);
+  const share = (bin) => (data.blocks > 0 ? bin.blocks / data.blocks : 0);
+  const y = d3.scale.linear().domain([0, d3.max(bins, share) || 1]).nice().range([box.height, 0]);
+  axis(box, y, "left", 4, (value) => Math.round(1000 * value) / 10 + " %");
+  const isNarrow = box.width / bins.length < 62;
+  axis(box, x, "bottom", 0, (i) => (!isNarrow ? bins[i].name
+    : i < data.lifetime_bounds.length && bins[i].kind === "blocks" ? "10" + "⁰¹²³⁴⁵⁶⁷⁸⁹"[i + 1] : bins[i].name));
+  label(box, "events between allocation and release", box.width, box.height + 36, "end");
+  label(box, "blocks", -6, -10, "end");
+  box.plot.append("g").selectAll("rect").data(bins).enter().append("rect").attr({
+    class: (bin) => "bar " + bin.kind, rx: 2, x: (bin, i) => x(i), width: x.rangeBand(),
+    y: (bin) => y(share(bin)), height: (bin) => box.height - y(share(bin))});
+  box.plot.append("g").selectAll("text").data(bins).enter().append("text").attr({class: "mark",
+    "text-anchor": "middle", x: (bin, i) => x(i) + x.rangeBand() / 2, y: (bin) => y(share(bin)) - 5})
+    .style("font-size", "11px").text((bin) => (bin.blocks > 0 ? (isNarrow ? (100 * share(bin)).toFixed(0) + "%" : percent(bin.blocks, data.blocks)) : ""));
+  tipFor(box.plot.append("g").selectAll("rect").data(bins).enter().append("rect").attr({class: "hit",
+    x: (bin, i) => x(i), width: x.rangeBand(), height: box.height}),
+    (bin) => `${bin.name}${bin.kind === "never" ? " freed" : " events"}\n${count(bin.blocks)} blocks, ${percent(bin.blocks, data.blocks)}` +
+      (bin.kind === "never" ? "" : `\nuntil then ${percent(bin.within, data.blocks)}`));
+}
+
+// Fill of the size classes as a heat map, with the most that each held at its right.
+
+function fillMap() {
+  const columns = data.fill.event;
+  const classes = data.fill.classes.slice().reverse();  // The smallest at the bottom.
+  const held = (row, i) => row.records[i] * (row.data_size + 4);
+  const most = classes.map((row) => d3.max(row.records) * (row.data_size + 4));
+  const cell = classes.length > 24 ? 11 : 16;
+  const box = chart("fill", classes.length * cell + 64, {left: 48, right: 70, top: 20, bottom: 42},
+    "Fill of the size classes over the trace", "A table behind the chart has each class at its fullest.");
+  if (classes.length === 0) { return; }
+  const style = getComputedStyle(document.documentElement);
+  const colour = d3.interpolateLab(style.getPropertyValue("--fill-low").trim(), style.getPropertyValue("--fill-high").trim());
+  const x = d3.scale.linear().domain([0, data.events]).range([0, box.width]);
+  const cells = [];
+  classes.forEach((row, r) => row.records.forEach((records, i) => {
+    if (records > 0) { cells.push({row: row, r: r, i: i, fill: row.used[i] / records}); }
+  }));
+  const from = (i) => x(i === 0 ? 0 : columns[i - 1]);
+  tipFor(box.plot.append("g").selectAll("rect").data(cells).enter().append("rect").attr({class: "cell",
+    x: (c) => from(c.i), y: (c) => c.r * cell, height: cell - 1,
+    width: (c) => Math.max(x(columns[c.i]) - from(c.i) + 0.3, 0.5), fill: (c) => colour(c.fill)}),
+    (c) => `Up to ${c.row.data_size} bytes, at event ${count(columns[c.i])}\n` +
+      `${count(c.row.used[c.i])} of ${count(c.row.records[c.i])} records used, ${percent(c.row.used[c.i], c.row.records[c.i])}\n` +
+      `${bytes(held(c.row, c.i))} in buckets`);
+  const step = cell < 14 ? 2 : 1;
+  box.plot.append("g").selectAll("text").data(classes).enter().append("text").attr({x: -6, "text-anchor": "end",
+    y: (row, r) => r * cell + cell / 2 + 4}).text((row, r) => ((classes.length - 1 - r) % step === 0 ? row.data_size : ""));
+  const bar = d3.scale.linear().domain([0, d3.max(most)]).range([0, 60]);
+  tipFor(box.plot.append("g").selectAll("rect").data(most).enter().append("rect").attr({class: "bar held",
+    x: box.width + 8, y: (value, r) => r * cell + 1, width: (value) => Math.max(bar(value), 1), height: cell - 3}),
+    (value, r) => `Up to ${classes[r].data_size} bytes: at most ${bytes(value)} in buckets`);
+  label(box, "bytes of a record", -42, -8);
+  label(box, "at most", box.width + 8, -8);
+  eventAxis(box, x);
+
+  const place = byId("fill-legend");
+  place.selectAll("*").remove();
+  place.append("span").text("0 %");
+  const scale = place.append("svg").attr({width: 120, height: 12, "aria-hidden": "true"});
+  d3.range(24).forEach((i) => scale.append("rect").attr({x: 5 * i, width: 5.3, height: 12, fill: colour(i / 23)}));
+  place.append("span").text("100 % of the records used");
+  place.append("span").text("· at the right: the most bytes in buckets");
+}
+
+// The groups, sorted by a column at a time.
+
+const groupColumns = [
+  {name: "Group", value: (group) => group.name, text: (group) => group.name, isName: true},
+  {name: "At the peak", value: (group) => group.at_peak.bytes, text: (group) => bytes(group.at_peak.bytes),
+   share: (group) => (data.at_peak.bytes > 0 ? group.at_peak.bytes / data.at_peak.bytes : 0)},
+  {name: "Blocks", value: (group) => group.blocks, text: (group) => count(group.blocks),
+   share: (group) => (data.blocks > 0 ? group.blocks / data.blocks : 0)},
+  {name: "Bytes", value: (group) => group.bytes, text: (group) => bytes(group.bytes)},
+  {name: "In records", part: (group) => group.in_records.blocks},
+  {name: "Padding", value: (group) => group.padding, text: (group) => bytes(group.padding)},
+  {name: "Short-lived", part: shortLived},
+  {name: "Never freed", part: (group) => group.never},
+  {name: "Die together", part: (group) => group.together.blocks},
+  {name: "One Clear", part: (group) => group.together.clear_blocks},
+].map((column) => (column.part === undefined ? column : {
+  name: column.name,
+  value: (group) => (group.blocks > 0 ? column.part(group) / group.blocks : -1),
+  text: (group) => percent(column.part(group), group.blocks)}));
+
+const shown = {column: 1, ascending: false, rows: 25, filter: ""};
+
+function groups() {
+  const column = groupColumns[shown.column];
+  const compare = column.isName ? (a, b) => a.name.localeCompare(b.name) : (a, b) => column.value(a) - column.value(b);
+  const sign = shown.ascending ? 1 : -1;
+  const found = data.groups.filter((group) => group.name.toLowerCase().includes(shown.filter))
+    .sort((a, b) => sign * compare(a, b));
+  const place = byId("groups");
+  place.selectAll("th").attr("aria-sort", (head, i) =>
+    (i !== shown.column ? "none" : shown.ascending ? "ascending" : "descending"));
+  const body = place.select("tbody");
+  body.selectAll("tr").remove();
+  body.selectAll("tr").data(found.slice(0, shown.rows)).enter().append("tr")
+    .selectAll("td").data((group) => groupColumns.map((one) => ({
+      text: one.text(group), isName: one.isName, share: one.share ? one.share(group) : -1})))
+    .enter().append("td")
+    .attr("class", (one) => (one.isName ? "name" : one.share >= 0 ? "share" : null))
+    .style("--share", (one) => (one.share >= 0 ? 100 * one.share + "%" : null))
+    .text((one) => one.text);
+  const left = found.length - Math.min(found.length, shown.rows);
+  byId("groups-more").attr("hidden", left > 0 ? null : "").text(`Show ${count(left)} more`);
+  const all = data.num_groups > data.groups.length
+    ? `of the ${count(data.groups.length)} largest of ${count(data.num_groups)}` : `of ${count(data.num_groups)}`;
+  byId("groups-count").text(`${count(found.length)} ${all}`);
+}
+
+function groupsTable() {
+  const place = byId("groups");
+  place.append("thead").append("tr").selectAll("th").data(groupColumns).enter().append("th")
+    .attr("scope", "col").append("button").attr("type", "button").text((column) => column.name)
+    .on("click", (column, i) => {
+      // Names begin with A, figures with the largest.
+      shown.ascending = shown.column === i ? !shown.ascending : Boolean(column.isName);
+      shown.column = i;
+      groups();
+    });
+  place.append("tbody");
+  byId("groups-more").on("click", () => { shown.rows = Infinity; groups(); });
+  byId("groups-filter").on("input", function () {
+    shown.filter = this.value.toLowerCase();
+    groups();
+  });
+  groups();
+}
+
+function tables() {
+  const names = {asked: "Asked for", pools: "Pools, one a group", one_pool: "One pool for all", heap: "Heap"};
+  table("held", ["", "At the peak", "Of the heap", "Most at any time"], Object.keys(names).map((key) =>
+    [names[key], bytes(data.peak[key]), percent(data.peak[key], data.peak.heap), bytes(data.most[key])]));
+  const rows = data.sizes.slice().sort((a, b) => b.blocks - a.blocks).slice(0, 40);
+  table("sizes-table", ["Bytes", "Blocks", "Share", "At the peak", "In records", "Padding", "Freed within 100 events", "Never freed"],
+    rows.map((row) => [sizeText(row), count(row.blocks), percent(row.blocks, data.blocks), bytes(row.at_peak.bytes),
+      percent(row.in_records.blocks, row.blocks), bytes(row.padding), percent(shortLived(row), row.blocks), percent(row.never, row.blocks)]));
+  byId("sizes-note").text(`${count(data.sizes.length)} sizes or ranges of them occur.`);
+  table("lifetimes-table", ["Events", "Blocks", "Share", "Until then"],
+    lifetimeBins().map((bin) => [bin.name, count(bin.blocks), percent(bin.blocks, data.blocks), percent(bin.within, data.blocks)]));
+  const left = data.fill.num_classes - data.fill.classes.length;
+  byId("fill-note").text(left > 0 ? `The ${data.fill.classes.length} classes with the most bytes of ${data.fill.num_classes}.` : "");
+  table("fill-table", ["Bytes of a record", "Records", "Used then", "In buckets"], data.fill.classes.map((row) => {
+    const i = row.records.indexOf(d3.max(row.records));
+    return [count(row.data_size), count(row.records[i]), percent(row.used[i], row.records[i]), bytes(row.records[i] * (row.data_size + 4))];
+  }));
+}
+
+function charts() {
+  timeline();
+  sizes();
+  lifetimes();
+  fillMap();
+}
+
+heading();
+verdict();
+tables();
+groupsTable();
+charts();
+
+let drawnWidth = window.innerWidth;
+window.addEventListener("resize", () => {
+  if (window.innerWidth !== drawnWidth) { drawnWidth = window.innerWidth; hideTip(); charts(); }
+});
+window.addEventListener("scroll", hideTip, {passive: true});
+window.matchMedia("(prefers-color-scheme: dark)").addEventListener("change", charts);
