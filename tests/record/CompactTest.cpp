@@ -142,19 +142,25 @@ TEST(Compact, IsReadAsFarAsItGoes) {
     }
 }
 
-// Records that no writer writes, in a block whose checksum is right.
-TEST(Compact, RefusesSenselessRecords) {
-    for (const std::string record : {"\x02\x07", "\x0f", "\x08\x80", "\x0b\x05xy", "\x09",
-                                     "\x08\xff\xff\xff\xff\xff\xff\xff\xff\xff\xff\xff\x01"}) {
-        std::string block(1000, '\0');
-        const std::string plain = std::string("\x09\x01", 2) + record;
+// Blocks that no writer writes, whose checksums are right: records that make no sense, more pools
+// than have an index, and no record at all, of which a file could hold any number.
+TEST(Compact, RefusesSenselessBlocks) {
+    std::string pools;
+    for (std::size_t count = 0; count != Trace::maxPools + 1; ++count) { pools.append("\0\1", 2); }
+    const std::string one("\x09\x01", 2);
+    for (const std::string& plain :
+         {one + "\x02\x07", one + "\x0f", one + "\x08\x80", one + "\x0b\x05xy", one + "\x09",
+          one + "\x08\xff\xff\xff\xff\xff\xff\xff\xff\xff\xff\xff\x01", pools, std::string()}) {
+        std::string block(ZSTD_compressBound(plain.size()), '\0');
         block.resize(ZSTD_compress(block.data(), block.size(), plain.data(), plain.size(), 1));
         std::string file(Trace::compactMagic);
         for (const std::size_t size : {block.size(), plain.size()}) {
-            file += std::string(1, static_cast<char>(size)) + std::string(3, '\0');
+            for (int shift = 0; shift != 32; shift += 8) {
+                file += static_cast<char>(size >> shift);
+            }
         }
         file += block + std::string(8, '\0');
-        EXPECT_EQ(ReadText(file).problem, "damaged") << testing::PrintToString(record);
+        EXPECT_EQ(ReadText(file).problem, "damaged") << testing::PrintToString(plain.substr(0, 20));
     }
 }
 

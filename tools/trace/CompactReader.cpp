@@ -65,6 +65,7 @@ bool CompactReader::ReadRecord(Event& event) {
     rest.remove_prefix(1);
     switch (static_cast<Record>(tag & recordMask)) {
         case Record::Pool:
+            if (pools.size() == maxPools) { isSound = false; }
             pools.push_back(TakeNumber());
             return false;
         case Record::NoPools:
@@ -130,7 +131,8 @@ bool CompactReader::NextBlock() {
     if (packedSize == 0 && plainSize == 0) {
         return End(HasAhead(1) ? "there is more behind its end" : "");
     }
-    if (plainSize > maxPlainSize || packedSize > ZSTD_compressBound(maxPlainSize)) {
+    if (plainSize == 0 || plainSize > maxPlainSize ||
+        packedSize > ZSTD_compressBound(maxPlainSize)) {
         return End(damaged);
     }
     if (!HasAhead(packedSize)) { return End(brokenOff); }
@@ -140,7 +142,7 @@ bool CompactReader::NextBlock() {
     }
     input.Skip(packedSize);
     rest = {plain.data(), plainSize};
-    return plainSize != 0 || NextBlock();
+    return true;
 }
 
 bool CompactReader::HasAhead(std::size_t size) {
