@@ -86,6 +86,7 @@ inline void CheckBucket(const BucketMgr& pool, const Group& group, const Bucket&
     const std::uint32_t recSize = group.recDataSize + 4u;
     ASSERT_EQ(bucket.parent, &group);
     ASSERT_EQ(bucket.recSize, recSize);
+    EXPECT_LE(recSize, pool.maxRecordSize);
     const std::uint32_t totalRecs = (pool.bucketSize - 2) / recSize;
     ASSERT_EQ(bucket.size, 2 + totalRecs * recSize);
     EXPECT_TRUE(HeapSpy::IsArray(&bucket, bucket.size + 46u));

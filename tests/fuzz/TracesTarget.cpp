@@ -67,8 +67,7 @@ struct Told {
     }
 };
 
-template <typename Visit>
-std::vector<Told> ReadAll(Trace::EventSource& source, Visit visit) {
+std::vector<Told> ReadAll(Trace::EventSource& source) {
     std::vector<Told> all;
     Trace::Event event;
     while (source.Next(event)) {
@@ -76,14 +75,9 @@ std::vector<Told> ReadAll(Trace::EventSource& source, Visit visit) {
         Trace::AppendLine(told.line, event);
         EXPECT_EQ(told.line.empty(), event.kind == Kind::Malformed);
         all.push_back(std::move(told));
-        visit(event);
     }
     EXPECT_FALSE(source.Next(event)) << "Nothing comes behind the end.";
     return all;
-}
-
-std::vector<Told> ReadAll(Trace::EventSource& source) {
-    return ReadAll(source, [](const Trace::Event&) {});
 }
 
 std::string LinesOf(const std::vector<Told>& events) {
@@ -208,12 +202,23 @@ void ReadCompressed(std::string_view bytes, std::size_t numCut, const std::vecto
     numCut %= packed.size();
     packed.resize(packed.size() - numCut);
     bool isWhole = false;
-    const std::vector<Told> read = ReadFile(packed, isWhole);
+    std::vector<Told> read = ReadFile(packed, isWhole);
+    // The last event can be the reader's own count of what it has read.
+    if (numCut != 0 && !read.empty() && read.back().kind == Kind::Info) { read.pop_back(); }
     ASSERT_LE(read.size(), events.size());
     EXPECT_TRUE(std::equal(read.begin(), read.end(), events.begin()));
     if (numCut != 0) { return; }
     EXPECT_EQ(isWhole, isSound);
     EXPECT_EQ(read.size(), events.size());
+}
+
+std::string CompactOf(Trace::EventSource& source) {
+    std::string file;
+    Trace::CompactWriter writer([&file](std::string_view part) { file += part; });
+    Trace::Event event;
+    while (source.Next(event)) { writer.Write(event); }
+    writer.Finish();
+    return file;
 }
 
 // The trace of these events in its compact form gives them again, and one that breaks off the first
@@ -266,12 +271,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     const std::string file = isRecords ? CompactOf(bytes, form < 128 ? form : bytes.size()) : "";
     if (isRecords) { bytes = file; }
 
-    std::string compact;
-    Trace::CompactWriter writer([&compact](std::string_view part) { compact += part; });
     const auto source = Reader(bytes, pieceSize);
-    const std::vector<Told> events =
-        ReadAll(*source, [&writer](const Trace::Event& event) { writer.Write(event); });
-    writer.Finish();
+    const std::vector<Told> events = ReadAll(*source);
     EXPECT_EQ(ReadAll(*Reader(bytes, bytes.size() + 1)), events);
 
     const std::string lines = LinesOf(events);
@@ -287,10 +288,10 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
             ReadFile(bytes, isWhole);
             break;
         case 2:
-            ReadCompact(compact, 0, events);
+            ReadCompact(CompactOf(*Reader(bytes, pieceSize)), 0, events);
             break;
         default:
-            ReadCompact(compact, numCut / 4, events);
+            ReadCompact(CompactOf(*Reader(bytes, pieceSize)), numCut / 4, events);
     }
     return 0;
 }
