@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # Installs the Debian packages that the named jobs need and that are missing: build, test, lint,
-# package, bench, fuzz, cross and coverage, in any number. Without the right to install it prints the
-# command that would, and fails.
+# package, docs, abi, bench, fuzz, cross and coverage, in any number. Without the right to install it
+# prints the command that would, and fails.
 set -euo pipefail
 
 packages=()
@@ -11,6 +11,8 @@ for job in "$@"; do
         test) packages+=(liblua5.4-dev lua5.4 libsqlite3-dev sqlite3 libgmock-dev zlib1g-dev libzstd-dev libdw-dev nlohmann-json3-dev libjs-d3 chromium chromium-driver python3-selenium python3-pil clang libclang-rt-14-dev binutils pkg-config gdb) ;;
         lint) packages+=(git clang-format clang-tidy shellcheck) ;;
         package) packages+=(git dpkg-dev file lintian pandoc mmdebstrap) ;;
+        docs) packages+=(doxygen) ;;
+        abi) packages+=(abigail-tools) ;;
         bench) packages+=(liblua5.4-dev libsqlite3-dev libbenchmark-dev zlib1g-dev libzstd-dev libmimalloc2.0 libjemalloc2 libtcmalloc-minimal4
             libboost-dev gnuplot-nox python3) ;;
         cross) packages+=(g++-aarch64-linux-gnu g++-riscv64-linux-gnu qemu-user-static googletest) ;;

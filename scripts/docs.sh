@@ -1,0 +1,21 @@
+#!/usr/bin/env bash
+# Writes the reference of both headers, HTML, into build/docs. A declaration without a comment, or a
+# comment that doxygen does not understand, is an error.
+# shellcheck source=scripts/build.sh
+source "$(dirname "$0")/build.sh"
+
+step "Packages"
+scripts/install-packages.sh docs
+step "Reference"
+rm -rf build/docs
+mkdir -p build
+VERSION=$(sed -n 's/^project(.* VERSION \([0-9.]*\).*/\1/p' CMakeLists.txt)
+BRIEF=$(sed -n 's/^ *DESCRIPTION "\(.*\)")$/\1/p' CMakeLists.txt)
+[ -n "$VERSION" ] && [ -n "$BRIEF" ]
+export VERSION BRIEF
+doxygen docs/Doxyfile
+for class in Mgr Heap HeapSettings HeapStats Resource Allocator; do
+    [ -n "$(find build/docs/html -name "*1_1${class}.html")" ] ||
+        { echo "The reference has no page of $class." >&2; exit 1; }
+done
+echo "build/docs/html/index.html"
