@@ -28,30 +28,39 @@ if $isBare && [ "$(cat "$top/root.made" 2>/dev/null)" != "${inRoot[*]}" ]; then
     ) &
 fi
 
-# make_packages NAME: in a folder of that name, of what git tracks here, with the flags by which
-# Debian builds.
+# in_folder NAME COMMAND...: in that folder, with the flags by which Debian builds. What the command
+# tells is shown only if it fails.
 SOURCE_DATE_EPOCH=$(git log -1 --format=%ct)
 export SOURCE_DATE_EPOCH
+in_folder() (
+    cd "$top/$1"
+    shift
+    export DEB_BUILD_MAINT_OPTIONS=hardening=+all DEB_CXXFLAGS_MAINT_STRIP=-g
+    CXXFLAGS="$(dpkg-buildflags --get CXXFLAGS) $(dpkg-buildflags --get CPPFLAGS)"
+    LDFLAGS=$(dpkg-buildflags --get LDFLAGS)
+    export CXXFLAGS LDFLAGS
+    "$@" >"$PWD.log" 2>&1 || { cat "$PWD.log"; exit 1; }
+)
+
+# make_packages NAME: in a folder of that name, of what git tracks here.
 make_packages() {
     step "Build in $1"
     rm -rf "${top:?}/$1"
     mkdir "$top/$1"
     git ls-files -z | tar --create --null --files-from=- | tar --extract --directory="$top/$1"
-    (
-        cd "$top/$1"
-        export DEB_BUILD_MAINT_OPTIONS=hardening=+all DEB_CXXFLAGS_MAINT_STRIP=-g
-        CXXFLAGS="$(dpkg-buildflags --get CXXFLAGS) $(dpkg-buildflags --get CPPFLAGS)"
-        LDFLAGS=$(dpkg-buildflags --get LDFLAGS)
-        export CXXFLAGS LDFLAGS
-        if ! { cmake --preset package && cmake --build --preset package &&
-            cd build/package && cpack -G DEB; } >"$top/$1.log" 2>&1; then
-            cat "$top/$1.log"
-            exit 1
-        fi
-    )
+    in_folder "$1" cmake --preset package
+    in_folder "$1" cmake --build --preset package
+    in_folder "$1/build/package" cpack -G DEB
 }
 make_packages one
 CCACHE_DISABLE=1 make_packages another-folder
+
+step "The library's tests with Debian's flags"
+in_folder one cmake --preset package -B build/tests -DOBR_MEMPOOL_TESTS=ON -DOBR_MEMPOOL_TOOLS=OFF
+in_folder one cmake --build build/tests
+in_folder one ctest --test-dir build/tests -j 2 --output-on-failure --no-tests=error \
+    --exclude-regex 'Consumer|Gdb|Parts'
+tail -n 3 "$top/one.log"
 
 step "Twice the same"
 packages=("$top"/one/build/package/*.deb)
