@@ -6,7 +6,8 @@ usage: bench-report.py RESULTS OUTPUT
 RESULTS holds NUMBER.SUBJECT.ROUND.json (Google Benchmark's, by the number of the row), the same of
 the layer in a folder of its own, "clients" (round, work, mode and what the client tells of its
 time), and "resident" (subject, size, bytes a block and, for the pool, bytes held). The figures for
-the pictures go back there, as ratios.dat and growth.dat.
+the pictures go back there, as ratios.dat and growth.dat, and those of the clients also into moving.md
+beside OUTPUT.
 """
 
 import json
@@ -154,6 +155,23 @@ def layer_goals(layer, clients):
     ]
 
 
+def client_table(clients):
+    return table(["work", "pools", "malloc", "ratio", "spread"],
+                 (["`" + work + "`", number(clients.time(work, "pools"), 3),
+                   number(clients.time(work, "heap"), 3),
+                   number(clients.of(work, "heap", "pools"))] + [clients.spread(work)]
+                  for work in clients.times["pools"]))
+
+
+def write_moving(path, clients):
+    """Puts the clients' table between two comments of a text that is written by hand."""
+    begin, end = "<!-- clients: written by scripts/bench.sh -->", "<!-- /clients -->"
+    head, rest = path.read_text().split(begin)
+    tail = rest.split(end)[1]
+    lines = ["", "", "Seconds, medians, and the ratio within a round:", ""] + list(client_table(clients))
+    path.write_text(head + begin + "\n".join(lines).rstrip() + "\n\n" + end + tail)
+
+
 def layer_tables(layer, rows, clients):
     subjects = [name for name in LAYERED if name in layer.times]
     yield from table(["work, ns"] + subjects,
@@ -161,11 +179,7 @@ def layer_tables(layer, rows, clients):
                       for row in rows))
     yield "The clients, seconds, and the ratio within a round:"
     yield ""
-    yield from table(["work", "pools", "malloc", "ratio", "spread"],
-                     (["`" + work + "`", number(clients.time(work, "pools"), 3),
-                       number(clients.time(work, "heap"), 3),
-                       number(clients.of(work, "heap", "pools"))] + [clients.spread(work)]
-                      for work in clients.times["pools"]))
+    yield from client_table(clients)
 
 
 def write_growth(results, layer, rows):
@@ -273,6 +287,7 @@ def main():
     text += ["## Resident bytes a live block", ""]
     text += resident_tables(resident, held)
     output.write_text("\n".join(text).rstrip() + "\n")
+    write_moving(output.parent / "moving.md", clients)
 
     with (results / "ratios.dat").open("w") as data:
         for row in timed:
