@@ -31,12 +31,12 @@ Replay::Recording Record(const std::string& shorthand) {
     return Replay::ReadRecording(reader, [](auto) {});
 }
 
-// What the allocator makes of a request.
-std::int64_t Usable(std::size_t size) {
+// What the allocator takes for a request, its header of 8 bytes included.
+std::int64_t Taken(std::size_t size) {
     void* const block = ::operator new(size);
     const auto usable = static_cast<std::int64_t>(malloc_usable_size(block));
     ::operator delete(block);
-    return usable;
+    return usable + 8;
 }
 
 TEST(Recording, FindsTheFirstOfThePeaksWithTheMostBlocks) {
@@ -67,7 +67,7 @@ TEST(Measure, CountsWhatIsHeldAndGivesAllOfItBack) {
     const Replay::Recording recording =
         Record("@c:P\n@a:P:X:5000\n@x:P\n@c:Q\n@a:Q:X:6000\n@d:Q\n@a:P:X:6000\n@a:P:Y:1025\n");
     const auto held = Replay::BytesHeld(recording, [] {});
-    EXPECT_EQ(held.heap, Usable(6000) + Usable(1025)) << "In place of the bytes asked for.";
+    EXPECT_EQ(held.heap, Taken(6000) + Taken(1025)) << "In place of the bytes asked for.";
     EXPECT_NEAR(static_cast<double>(held.pool), 6000 + 1025 + 2 * 24 + 249 * 8 + 400, 400);
 
     HeapCount::Start();

@@ -24,6 +24,7 @@ struct Program {
 void AddRecord(Program& program);
 void AddReplay(Program& program);
 void AddReport(Program& program);
+void AddAdvise(Program& program);
 void AddText(Program& program);
 
 }  // namespace Tool

@@ -16,6 +16,7 @@
 #include "mempool/Program.hpp"
 #include "mempool/Progress.hpp"
 #include "mempool/Settings.hpp"
+#include "mempool/Sweep.hpp"
 #include "replay/Measure.hpp"
 #include "replay/PoolSettings.hpp"
 #include "replay/Recording.hpp"
@@ -38,15 +39,19 @@ pool          One enabled pool a traced pool.
 heap          operator new[] and delete[]. What a pool drops is freed on the heap too, block by
               block; at a pool's end that time is not counted. No block is written to.
 the peak      The moment with the most bytes asked for.
-bytes held    What operator new has lent at the peak, in sizes of malloc_usable_size, without the
-              allocator's own headers. A replay of its own counts them, untimed; a timed one pays
-              one test of a flag for it at each heap request.
+bytes held    What operator new has lent at the peak, in sizes of malloc_usable_size, and the 8 bytes
+              of the GNU C library's own header for each block. A replay of its own counts them,
+              untimed; a timed one pays one test of a flag for it at each heap request.
 ns an event   Processor time, page faults included; the median of all rounds.
+--sweep       The search of 'mempool advise', each replay in a process of its own. All settings that
+              were tried are shown, the best at time x bytes first.
 bad lines     Left out of the replay. The library's own trace does not show Mgr::Clear: after one,
               pointers allocated twice are to be expected.
 )";
 
 struct Options {
+    bool sweep = false;
+    unsigned int seconds = 30;
     Replay::PoolSettings settings = Replay::PoolSettings::OfProcess();
     std::vector<std::string> paths;
     unsigned int rounds = 11;
@@ -111,12 +116,25 @@ int Compare(const std::string& path, const Options& options) {
     return status;
 }
 
-int CompareAll(const Options& options) {
-    ApplySettings(options.settings);
+// Likewise, with the settings that a search tries.
+int Sweep(const std::string& path, const Options& options) {
+    Trace::StepReader reader(path);
+    const Progress progress(reader.Name());
+    const Advice advice = TakeAdvice(reader, options.seconds, progress);
+    std::cout << reader.Name() << '\n';
+    PrintBadLines(std::cout, reader);
+    PrintTable(std::cout, advice, true);
+    std::cout << std::flush;
+    return WarnOfBrokenTrace(reader);
+}
+
+int ReplayAll(const Options& options) {
+    if (!options.sweep) { ApplySettings(options.settings); }
     int status = EXIT_SUCCESS;
     for (const std::string& path : options.paths) {
         try {
-            if (Compare(path, options) != EXIT_SUCCESS) { status = EXIT_FAILURE; }
+            const auto replay = options.sweep ? Sweep : Compare;
+            if (replay(path, options) != EXIT_SUCCESS) { status = EXIT_FAILURE; }
         } catch (const std::bad_alloc&) {
             std::cerr << "mempool: " << path << ": out of memory\n";
             status = EXIT_FAILURE;
@@ -126,6 +144,17 @@ int CompareAll(const Options& options) {
         }
     }
     return status;
+}
+
+// A sweep tries settings of its own, and only a sweep has a length.
+void CheckSweep(const CLI::App& replay, bool isSweep) {
+    for (const char* option : {"--bucket-size", "--max-record", "--min-record", "--alignment",
+                               "--keep-empty", "--rounds", "--dbg"}) {
+        if (isSweep && replay.count(option) != 0) { throw CLI::ExcludesError("--sweep", option); }
+    }
+    if (!isSweep && replay.count("--seconds") != 0) {
+        throw CLI::RequiresError("--seconds", "--sweep");
+    }
 }
 
 }  // namespace
@@ -145,8 +174,13 @@ void AddReplay(Program& program) {
         ->check(CLI::Range(1, 1000000))
         ->capture_default_str();
     replay.add_flag("--dbg", options->dbg, "Print the report of each pool at the peak");
-    replay.callback(
-        [&program, options] { program.job = [options] { return CompareAll(*options); }; });
+    replay.add_flag("--sweep", options->sweep,
+                    "Try many settings in place of one, and print a table of them");
+    AddSeconds(replay, options->seconds);
+    replay.callback([&program, &replay, options] {
+        CheckSweep(replay, options->sweep);
+        program.job = [options] { return ReplayAll(*options); };
+    });
 }
 
 }  // namespace Tool

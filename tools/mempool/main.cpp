@@ -32,6 +32,7 @@ int Run(int argc, char** argv) {
     Tool::AddRecord(program);
     Tool::AddReplay(program);
     Tool::AddReport(program);
+    Tool::AddAdvise(program);
     Tool::AddText(program);
 
     const std::string first = argc > 1 ? argv[1] : "-";

@@ -14,15 +14,26 @@ namespace {
 bool counting = false;
 std::int64_t heldBytes = 0;
 
+// What the heap takes for a block beside its usable bytes.
+#ifdef __GLIBC__
+constexpr std::size_t headerSize = sizeof(std::size_t);
+#else
+constexpr std::size_t headerSize = 0;
+#endif
+
+std::int64_t Taken(void* block) {
+    return static_cast<std::int64_t>(malloc_usable_size(block) + headerSize);
+}
+
 void* Lend(std::size_t size) {
     void* const block = std::malloc(std::max(size, std::size_t{1}));
     if (block == nullptr) { throw std::bad_alloc(); }
-    if (counting) { heldBytes += static_cast<std::int64_t>(malloc_usable_size(block)); }
+    if (counting) { heldBytes += Taken(block); }
     return block;
 }
 
 void TakeBack(void* block) noexcept {
-    if (counting) { heldBytes -= static_cast<std::int64_t>(malloc_usable_size(block)); }
+    if (counting && block != nullptr) { heldBytes -= Taken(block); }
     std::free(block);
 }
 

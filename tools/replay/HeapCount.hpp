@@ -12,8 +12,9 @@ namespace HeapCount {
 // Counts from 0 on.
 void Start();
 
-// Stops, and returns the bytes lent since the start and not given back, as malloc_usable_size tells
-// them: rounded as the allocator rounds, without its own headers.
+// Stops, and returns the bytes lent since the start and not given back: rounded as the allocator
+// rounds, as malloc_usable_size tells, and with the header that the GNU C library keeps for each
+// block.
 std::int64_t Stop();
 
 }  // namespace HeapCount

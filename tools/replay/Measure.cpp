@@ -41,10 +41,26 @@ double Median(std::vector<double> values) {
     return *middle;
 }
 
+std::int64_t BytesHeldByPools(const Recording& recording) {
+    return HeldAtPeak<PoolSide>(recording, [] {});
+}
+
+std::int64_t BytesHeldByHeap(const Recording& recording) {
+    return HeldAtPeak<HeapSide>(recording, [] {});
+}
+
+double PoolNanosecondsPerEvent(const Recording& recording) {
+    return TimePerEvent<PoolSide>(recording);
+}
+
+double HeapNanosecondsPerEvent(const Recording& recording) {
+    return TimePerEvent<HeapSide>(recording);
+}
+
 Compared<std::int64_t> BytesHeld(const Recording& recording,
                                  const std::function<void()>& atPoolPeak) {
     const std::int64_t pool = HeldAtPeak<PoolSide>(recording, atPoolPeak);
-    return {pool, HeldAtPeak<HeapSide>(recording, [] {})};
+    return {pool, BytesHeldByHeap(recording)};
 }
 
 Compared<double> NanosecondsPerEvent(const Recording& recording, unsigned int rounds,
@@ -53,9 +69,9 @@ Compared<double> NanosecondsPerEvent(const Recording& recording, unsigned int ro
     std::vector<double> heap;
     for (unsigned int round = 1; round <= rounds; ++round) {
         atRound(round);
-        if (round % 2 == 0) { heap.push_back(TimePerEvent<HeapSide>(recording)); }
-        pool.push_back(TimePerEvent<PoolSide>(recording));
-        if (round % 2 != 0) { heap.push_back(TimePerEvent<HeapSide>(recording)); }
+        if (round % 2 == 0) { heap.push_back(HeapNanosecondsPerEvent(recording)); }
+        pool.push_back(PoolNanosecondsPerEvent(recording));
+        if (round % 2 != 0) { heap.push_back(HeapNanosecondsPerEvent(recording)); }
     }
     return {Median(std::move(pool)), Median(std::move(heap))};
 }

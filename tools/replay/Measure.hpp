@@ -18,14 +18,21 @@ struct Compared {
     Value heap;
 };
 
-// What each side holds from the heap at the peak, in bytes. `atPoolPeak` is called while the pools
-// stand there.
+// One replay of one side: what it holds from the heap at the peak, in bytes.
+std::int64_t BytesHeldByPools(const Recording& recording);
+std::int64_t BytesHeldByHeap(const Recording& recording);
+
+// One replay of one side: processor time an event in nanoseconds, page faults included. There must
+// be an event.
+double PoolNanosecondsPerEvent(const Recording& recording);
+double HeapNanosecondsPerEvent(const Recording& recording);
+
+// The bytes of each side. `atPoolPeak` is called while the pools stand at the peak.
 Compared<std::int64_t> BytesHeld(const Recording& recording,
                                  const std::function<void()>& atPoolPeak);
 
-// Processor time an event in nanoseconds, page faults included: medians over `rounds` of one replay
-// a side. Every other round the heap goes first. `atRound` is called with each round's number, from
-// 1 on. There must be an event.
+// The time an event of each side: medians over `rounds` of one replay a side. Every other round the
+// heap goes first. `atRound` is called with each round's number, from 1 on.
 Compared<double> NanosecondsPerEvent(const Recording& recording, unsigned int rounds,
                                      const std::function<void(unsigned int round)>& atRound);
 

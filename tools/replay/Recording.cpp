@@ -11,8 +11,14 @@ namespace {
 
 class Recorder {
 public:
+    explicit Recorder(std::size_t max) : maxSteps(max) {}
+
     // Adds a step behind which `blocks` stands.
     void Add(Trace::Step step, const Trace::Resolver& blocks) {
+        if (recording.steps.size() == maxSteps) {
+            if (step.kind != Trace::Kind::Named) { ++recording.numLeftOut; }
+            return;
+        }
         switch (step.kind) {
             case Trace::Kind::Named:
                 return;
@@ -66,6 +72,7 @@ private:
         }
     }
 
+    const std::size_t maxSteps;
     Recording recording;
     std::uint64_t liveBytes = 0;
     std::uint64_t liveBlocks = 0;
@@ -74,9 +81,10 @@ private:
 }  // namespace
 
 Recording ReadRecording(Trace::StepReader& reader,
-                        const std::function<void(std::uint64_t position)>& atEvent) {
+                        const std::function<void(std::uint64_t position)>& atEvent,
+                        std::size_t maxSteps) {
     constexpr std::uint64_t interval = 100000;
-    Recorder recorder;
+    Recorder recorder(maxSteps);
     Trace::Step step = {};
     for (std::uint64_t number = 1; reader.Next(step); ++number) {
         recorder.Add(step, reader.Blocks());

@@ -6,6 +6,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <functional>
+#include <limits>
 #include <vector>
 
 #include "trace/Resolver.hpp"
@@ -21,6 +22,8 @@ struct Recording {
     std::vector<Trace::Pool> pools;      // Each pool ever created.
     std::uint32_t numBlocks = 0;         // Their indices are below.
 
+    std::uint64_t numLeftOut = 0;  // Steps behind the last one that was to be kept.
+
     std::uint64_t numCleared = 0;     // Blocks that were alive when their pool was cleared,
     std::uint64_t numNeverFreed = 0;  // when it was destroyed, or at the end of the trace.
 
@@ -30,9 +33,11 @@ struct Recording {
     std::uint64_t peakBlocks = 0;
 };
 
-// Reads to the end. `atEvent` is called with the position now and then.
+// Reads to the end, and keeps the first `maxSteps` steps. `atEvent` is called with the position now
+// and then.
 Recording ReadRecording(Trace::StepReader& reader,
-                        const std::function<void(std::uint64_t position)>& atEvent);
+                        const std::function<void(std::uint64_t position)>& atEvent,
+                        std::size_t maxSteps = std::numeric_limits<std::size_t>::max());
 
 }  // namespace Replay
 

@@ -1,0 +1,83 @@
+// Replays in child processes: their figures come back, and whatever they die of is told.
+
+#include <sys/resource.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <iostream>
+#include <new>
+#include <string>
+
+#include <gtest/gtest.h>
+#include <MemPool>
+
+#include "advise/ForkedMeter.hpp"
+#include "advise/Space.hpp"
+
+using Advise::InChild;
+
+namespace {
+
+std::string ProblemOf(const std::function<double()>& work, double seconds = 60) {
+    const Advise::Outcome outcome = InChild(work, seconds);
+    EXPECT_FALSE(outcome.figure.has_value());
+    return outcome.problem;
+}
+
+TEST(InChild, BringsTheFigureBackAndNothingElse) {
+    int number = 0;
+    testing::internal::CaptureStdout();
+    const Advise::Outcome outcome = InChild(
+        [&] {
+            std::cout << "noise" << std::endl;
+            return ++number + 0.5;
+        },
+        60);
+    EXPECT_EQ(testing::internal::GetCapturedStdout(), "");
+    EXPECT_EQ(outcome.figure, std::optional(1.5));
+    EXPECT_EQ(number, 0);
+}
+
+TEST(InChild, TellsWhatTheChildDiedOf) {
+    EXPECT_EQ(ProblemOf([]() -> double { throw std::bad_alloc(); }), "out of memory");
+    EXPECT_EQ(ProblemOf([]() -> double { throw "up"; }), "ended with status 1");
+    EXPECT_EQ(ProblemOf([]() -> double { _exit(7); }), "ended with status 7");
+    EXPECT_EQ(ProblemOf([] { return raise(SIGKILL) + 0.; }), "ended by signal Killed");
+    const auto loop = []() -> double {
+        for (volatile int i = 0;;) { i = i + 1; }
+    };
+    EXPECT_EQ(ProblemOf(loop, 0.05), "too slow");
+    EXPECT_EQ(InChild([] { return usleep(200000) + 2.; }, 0.05).figure, std::optional(2.))
+        << "To wait takes no time of the processor.";
+}
+
+// Blocks of 100 bytes. In buckets of 506 bytes there are 4 of them each.
+TEST(ForkedMeter, ReplaysWithTheSettingsAskedFor) {
+    Replay::Recording recording;
+    recording.pools.push_back({"P", ""});
+    recording.steps.push_back({Trace::Kind::Created, 0, {}});
+    for (std::uint32_t i = 0; i < 1000; ++i) {
+        recording.steps.push_back({Trace::Kind::Allocated, 0, {i, 100}});
+    }
+    recording.numBlocks = 1000;
+    recording.peakSteps = recording.steps.size();
+    const Replay::PoolSettings before = Replay::PoolSettings::OfProcess();
+
+    Advise::ForkedMeter meter(recording);
+    EXPECT_NEAR(*meter.Held(std::nullopt).figure, 112000, 8000);
+    const auto held = [&](unsigned int bucketSize, unsigned int alignment) {
+        return *meter.Held(Replay::PoolSettings{bucketSize, 500, 8, alignment, false}).figure;
+    };
+    EXPECT_NEAR(held(506, 4), 250 * (4 * 104 + 56) + 1300, 2600);
+    EXPECT_NEAR(held(65450, 4), 2 * 65500 + 1300, 1300);
+    EXPECT_NEAR(held(65450, 64), 3 * 65500 + 700, 700) << "128 bytes a block.";
+    for (const Advise::Side& side : {Advise::Side(), Advise::Side(Advise::LibraryDefaults())}) {
+        const double ns = meter.Time(side).figure.value_or(0);
+        EXPECT_TRUE(ns > 0.5 && ns < 1e5) << ns;
+    }
+    EXPECT_GT(meter.Elapsed(), 0);
+    EXPECT_EQ(Replay::PoolSettings::OfProcess().bucketSize, before.bucketSize);
+    EXPECT_FALSE(OBR::MemPool::NUV_OBR_MEMPOOL_ON());
+}
+
+}  // namespace

@@ -1,0 +1,163 @@
+// The search on a meter with costs that are made: it knows where the optimum lies, and time passes
+// by one unit a replay.
+
+#include "advise/Search.hpp"
+
+#include <cmath>
+#include <functional>
+#include <random>
+#include <set>
+#include <stdexcept>
+#include <tuple>
+#include <vector>
+
+#include <gtest/gtest.h>
+#include <MemPoolHeap>
+
+#include "advise/Space.hpp"
+#include "advise/Verdict.hpp"
+
+using Advise::Outcome;
+using Advise::Side;
+using Replay::PoolSettings;
+
+namespace {
+
+const PoolSettings fastest = {16298, 500, 16, 16, true};
+const PoolSettings smallest = {2010, 1000, 24, 4, false};
+
+// Steps of doubling between two settings.
+double Distance(const PoolSettings& a, const PoolSettings& b) {
+    const auto steps = [](unsigned int x, unsigned int y) {
+        return std::abs(std::log2(static_cast<double>(x) / y));
+    };
+    return steps(a.bucketSize, b.bucketSize) + steps(a.maxRecordSize, b.maxRecordSize) +
+           steps(a.minRecordSize, b.minRecordSize) + steps(a.dataAlignment, b.dataAlignment) +
+           (a.keepEmptyBuckets != b.keepEmptyBuckets ? 1 : 0);
+}
+
+class MadeMeter final : public Advise::Meter {
+public:
+    Outcome Time(const Side& side) override {
+        const double noise = 1 + strays(random);
+        const double drift = ++numReplays > 100 ? 2 : 1;  // Halfway the machine gets slower.
+        return Answer(side, drift * noise * (side ? 10 + Distance(*side, fastest) : 14));
+    }
+    Outcome Held(const Side& side) override {
+        return Answer(side, side ? 1000 + 100 * Distance(*side, smallest) : 1300);
+    }
+    double Elapsed() const override { return seconds; }
+
+    std::function<bool(const Side&)> fails = [](const Side&) { return false; };
+    double secondsPerReplay = 0.01;
+    std::uniform_real_distribution<double> strays{-0.04, 0.04};
+
+private:
+    Outcome Answer(const Side& side, double figure) {
+        seconds += secondsPerReplay;
+        return fails(side) ? Outcome{std::nullopt, "made to fail"} : Outcome{figure, ""};
+    }
+
+    double seconds = 0;
+    unsigned int numReplays = 0;
+    std::minstd_rand random{1};
+};
+
+auto Key(const PoolSettings& s) {
+    return std::tuple(s.bucketSize, s.maxRecordSize, s.minRecordSize, s.dataAlignment,
+                      s.keepEmptyBuckets);
+}
+
+Advise::Findings Find(MadeMeter& meter, double seconds) {
+    std::size_t numTried = 0;
+    const auto findings = Advise::Search(meter, seconds, [&](std::size_t n) { numTried = n; });
+    EXPECT_EQ(numTried, findings.settings.size() + findings.givenUp.size());
+    std::set<decltype(Key({}))> tried;
+    for (const auto& each : findings.settings) {
+        EXPECT_TRUE(tried.insert(Key(each.settings)).second) << "No setting comes twice.";
+        EXPECT_NEAR(each.figures.bytesHeld, 1000 + 100 * Distance(each.settings, smallest), 1e-6);
+    }
+    return findings;
+}
+
+TEST(Search, FindsTheOptimaWithoutTryingAll) {
+    MadeMeter meter;
+    const Advise::Findings findings = Find(meter, 1000);
+    const Advise::Verdict verdict = Advise::Judge(findings);
+    const auto& best = findings.settings.at(*verdict.fastest);
+    EXPECT_LT(Distance(best.settings, fastest), 0.5) << "Noise is as much as half a step.";
+    EXPECT_EQ(Key(findings.settings.at(*verdict.smallest).settings), Key(smallest));
+    EXPECT_EQ(Key(findings.settings.front().settings), Key(Advise::LibraryDefaults()));
+    EXPECT_LT(findings.settings.size(), 120U) << "Of thousands.";
+    // The machine is twice as slow for most of the time, but for the settings as for the heap.
+    EXPECT_NEAR(findings.heap.nsPerEvent, 28, 1);
+    for (const auto& each : findings.settings) {
+        EXPECT_NEAR(each.figures.nsPerEvent, 2 * (10 + Distance(each.settings, fastest)), 2.5);
+        EXPECT_GE(each.figures.rounds, 3U);
+        EXPECT_TRUE(each.figures.nsSpread > 0 && each.figures.nsSpread < 3);
+    }
+    EXPECT_TRUE(findings.heap.nsSpread > 0 && findings.heap.nsSpread < 3);
+    EXPECT_GE(best.figures.rounds, 15U);
+}
+
+TEST(Search, KeepsToItsTime) {
+    for (const double seconds : {5., 30., 200.}) {
+        MadeMeter meter;
+        meter.secondsPerReplay = 1;
+        meter.strays = std::uniform_real_distribution<double>(0, 1e-9);
+        const Advise::Findings findings = Find(meter, seconds);
+        EXPECT_LT(meter.Elapsed(), seconds + 25);
+        EXPECT_GT(meter.Elapsed(), 0.9 * seconds);
+        const Advise::Verdict verdict = Advise::Judge(findings);
+        EXPECT_GE(findings.settings.at(*verdict.fastest).figures.rounds, 3U) << seconds;
+        EXPECT_GE(findings.settings.at(*verdict.smallest).figures.rounds, 3U) << seconds;
+    }
+}
+
+TEST(Search, GivesUpWhatFails) {
+    MadeMeter meter;
+    meter.fails = [](const Side& side) { return side && side->keepEmptyBuckets; };
+    const Advise::Findings findings = Find(meter, 1000);
+    EXPECT_FALSE(findings.givenUp.empty());
+    for (const auto& each : findings.settings) { EXPECT_FALSE(each.settings.keepEmptyBuckets); }
+    for (const auto& each : findings.givenUp) { EXPECT_EQ(each.problem, "made to fail"); }
+
+    // The last one to lead fails in a later round, when all others have failed.
+    MadeMeter late;
+    unsigned int number = 0;
+    late.fails = [&](const Side& side) { return side && ++number > 40; };
+    EXPECT_TRUE(Find(late, 1000).settings.empty());
+
+    MadeMeter heapless;
+    heapless.fails = [](const Side& side) { return !side; };
+    EXPECT_THROW(Find(heapless, 1000), std::runtime_error);
+}
+
+// From the defaults to wherever steps lead: what makes no pool would stop the process. A minimum
+// that is not below the maximum stops one that has both from the environment.
+TEST(Space, HasOnlySettingsThatCanBeSet) {
+    std::set<decltype(Key({}))> known;
+    std::vector<PoolSettings> open = Advise::CoarseGrid();
+    unsigned int largestBucket = 0;
+    unsigned int largestRecord = 0;
+    while (!open.empty()) {
+        const PoolSettings settings = open.back();
+        open.pop_back();
+        if (!known.insert(Key(settings)).second) { continue; }
+        const OBR::MemPool::Heap heap("tried", OBR::MemPool::HeapSettings()
+                                                   .On(true)
+                                                   .BucketSize(settings.bucketSize)
+                                                   .MaxRecordSize(settings.maxRecordSize)
+                                                   .MinRecordSize(settings.minRecordSize)
+                                                   .DataAlignment(settings.dataAlignment));
+        EXPECT_LT(settings.minRecordSize, settings.maxRecordSize);
+        largestBucket = std::max(largestBucket, settings.bucketSize);
+        largestRecord = std::max(largestRecord, settings.maxRecordSize);
+        for (const PoolSettings& next : Advise::Neighbours(settings)) { open.push_back(next); }
+    }
+    EXPECT_GT(known.size(), 1000U);
+    EXPECT_EQ(largestBucket, 65450U);
+    EXPECT_EQ(largestRecord, 32000U);
+}
+
+}  // namespace

@@ -1,0 +1,172 @@
+// The child writes its figure into a pipe and leaves without a trace: no exit handler runs, no
+// buffer is written, and what the library may say on standard output is not seen.
+
+#include "advise/ForkedMeter.hpp"
+
+#include <fcntl.h>
+#include <malloc.h>
+#include <poll.h>
+#include <signal.h>
+#include <sys/prctl.h>
+#include <sys/wait.h>
+#include <time.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cmath>
+#include <cstdlib>
+#include <cstring>
+#include <new>
+#include <optional>
+#include <stdexcept>
+#include <string>
+#include <system_error>
+
+#include <MemPool>
+
+#include "replay/Measure.hpp"
+
+namespace Advise {
+
+namespace {
+
+constexpr int statusOutOfMemory = 3;
+
+// A setting that takes longer than this many times the heap's time, and than a while, is no
+// candidate.
+constexpr double mostOfHeapTime = 8;
+constexpr double leastLimit = 0.5;
+// The heap itself has no other limit than patience.
+constexpr double limitOfHeap = 3600;
+
+// A trace of few events is replayed that often that it takes about so long: the clock and the
+// caches of the processor would tell more of themselves than of it.
+constexpr double leastNanoseconds = 2e7;
+
+[[noreturn]] void BeChild(const std::function<double()>& work, int result) {
+    prctl(PR_SET_PDEATHSIG, SIGKILL);
+    const int nowhere = open("/dev/null", O_WRONLY | O_CLOEXEC);
+    dup2(nowhere, STDOUT_FILENO);
+    try {
+        const double figure = work();
+        const bool isWritten = write(result, &figure, sizeof figure) == sizeof figure;
+        _exit(isWritten ? EXIT_SUCCESS : EXIT_FAILURE);
+    } catch (const std::bad_alloc&) { _exit(statusOutOfMemory); } catch (...) {
+        _exit(EXIT_FAILURE);
+    }
+}
+
+std::optional<double> ReadFigure(int result) {
+    double figure = 0;
+    ssize_t numRead = 0;
+    do { numRead = read(result, &figure, sizeof figure); } while (numRead < 0 && errno == EINTR);
+    return numRead == sizeof figure ? std::optional(figure) : std::nullopt;
+}
+
+double ProcessorSeconds(pid_t child) {
+    clockid_t clock = 0;
+    timespec used = {};
+    if (clock_getcpuclockid(child, &clock) == 0) { clock_gettime(clock, &used); }
+    return static_cast<double>(used.tv_sec) + 1e-9 * static_cast<double>(used.tv_nsec);
+}
+
+// Waits until the child writes its figure or ends; false if it uses more time than that, looked at
+// now and then. A timer in the child would do it too, but while one runs, Linux counts the time of
+// the process in ticks.
+bool EndsInTime(pid_t child, int result, double processorSeconds) {
+    constexpr int milliseconds = 20;
+    pollfd pipe = {result, POLLIN, 0};
+    while (poll(&pipe, 1, milliseconds) <= 0) {
+        if (ProcessorSeconds(child) > processorSeconds) { return false; }
+    }
+    return true;
+}
+
+std::string ProblemOf(int status) {
+    if (WIFSIGNALED(status)) {
+        return std::string("ended by signal ") + strsignal(WTERMSIG(status));
+    }
+    if (WEXITSTATUS(status) == statusOutOfMemory) { return "out of memory"; }
+    return "ended with status " + std::to_string(WEXITSTATUS(status));
+}
+
+}  // namespace
+
+Outcome InChild(const std::function<double()>& work, double processorSeconds) {
+    int ends[2];
+    if (pipe2(ends, O_CLOEXEC) != 0) { throw std::system_error(errno, std::generic_category()); }
+    const pid_t child = fork();
+    if (child == 0) { BeChild(work, ends[1]); }
+    const int error = errno;
+    close(ends[1]);
+    if (child < 0) {
+        close(ends[0]);
+        throw std::system_error(error, std::generic_category(), "no process for a replay");
+    }
+    const bool isTooSlow = !EndsInTime(child, ends[0], processorSeconds);
+    if (isTooSlow) { kill(child, SIGKILL); }
+    const std::optional<double> figure = ReadFigure(ends[0]);
+    close(ends[0]);
+    int status = 0;
+    while (waitpid(child, &status, 0) < 0 && errno == EINTR) {}
+    if (figure.has_value() && status == 0) { return {figure, ""}; }
+    if (isTooSlow) { return {std::nullopt, "too slow"}; }
+    return {std::nullopt, ProblemOf(status)};
+}
+
+ForkedMeter::ForkedMeter(const Replay::Recording& replayed)
+    : recording(replayed), start(std::chrono::steady_clock::now()) {
+#ifdef __GLIBC__
+    malloc_trim(0);  // What reading the trace has left over is not for the replays to use up.
+#endif
+    // The number is the same for all, since the first replay in a process is slower than the
+    // others.
+    const Outcome one = Time(std::nullopt);
+    const double length = one.figure.value_or(0) * static_cast<double>(recording.steps.size());
+    if (length > 0) {
+        numReplays = static_cast<unsigned int>(std::ceil(leastNanoseconds / length));
+    }
+}
+
+Outcome ForkedMeter::Time(const Side& side) {
+    return Run(side, [&] {
+        double total = 0;
+        for (unsigned int replay = 0; replay < numReplays; ++replay) {
+            total += side.has_value() ? Replay::PoolNanosecondsPerEvent(recording)
+                                      : Replay::HeapNanosecondsPerEvent(recording);
+        }
+        return total / numReplays;
+    });
+}
+
+Outcome ForkedMeter::Held(const Side& side) {
+    return Run(side, [&] {
+        return static_cast<double>(side.has_value() ? Replay::BytesHeldByPools(recording)
+                                                    : Replay::BytesHeldByHeap(recording));
+    });
+}
+
+double ForkedMeter::Elapsed() const {
+    return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+}
+
+Outcome ForkedMeter::Run(const Side& side, const std::function<double()>& work) {
+    if (side.has_value()) {
+        return InChild(
+            [&] {
+                side->Apply();
+                OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);
+                OBR::MemPool::NUV_OBR_MEMPOOL_TRACE(false);
+                return work();
+            },
+            std::max(leastLimit, mostOfHeapTime * heapSeconds));
+    }
+    const auto before = std::chrono::steady_clock::now();
+    const Outcome outcome = InChild(work, limitOfHeap);
+    const std::chrono::duration<double> taken = std::chrono::steady_clock::now() - before;
+    heapSeconds = std::max(heapSeconds, taken.count());
+    return outcome;
+}
+
+}  // namespace Advise

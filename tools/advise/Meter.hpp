@@ -1,0 +1,42 @@
+// What a search asks for: one replay at a time, of the heap or of pools with some settings. A test
+// gives a meter with costs of its own.
+
+#ifndef OBR_TOOLS_ADVISE_METER_HPP
+#define OBR_TOOLS_ADVISE_METER_HPP
+
+#include <optional>
+#include <string>
+
+#include "replay/PoolSettings.hpp"
+
+namespace Advise {
+
+// The settings of the pools, or nothing for the heap.
+using Side = std::optional<Replay::PoolSettings>;
+
+// The figure of a replay, or why there is none.
+struct Outcome {
+    std::optional<double> figure;
+    std::string problem;
+};
+
+class Meter {
+public:
+    Meter() = default;
+    Meter(const Meter&) = delete;
+    Meter& operator=(const Meter&) = delete;
+    virtual ~Meter() = default;
+
+    // Processor time an event of one replay, in nanoseconds.
+    virtual Outcome Time(const Side& side) = 0;
+
+    // Bytes held at the peak.
+    virtual Outcome Held(const Side& side) = 0;
+
+    // Seconds on the wall since the meter was made.
+    virtual double Elapsed() const = 0;
+};
+
+}  // namespace Advise
+
+#endif

@@ -1,0 +1,201 @@
+#include "mempool/Sweep.hpp"
+
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
+#include <iomanip>
+#include <map>
+#include <sstream>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+#include "advise/ForkedMeter.hpp"
+#include "advise/Search.hpp"
+#include "advise/Space.hpp"
+#include "trace/StepReader.hpp"
+
+namespace Tool {
+
+namespace {
+
+using Advise::Figures;
+using Advise::Measured;
+
+// How many of the best the short table has, beside those that are named.
+constexpr std::size_t numShown = 8;
+
+std::string Fixed(double value, int digits) {
+    std::ostringstream text;
+    text << std::fixed << std::setprecision(digits) << value;
+    return text.str();
+}
+
+std::string Percent(double share) {
+    return Fixed(100 * share, share < 0.1 ? 1 : 0) + " %";
+}
+
+double TimeRatio(const Advice& advice, const Figures& figures) {
+    return figures.nsPerEvent / advice.findings.heap.nsPerEvent;
+}
+double BytesRatio(const Advice& advice, const Figures& figures) {
+    return figures.bytesHeld / advice.findings.heap.bytesHeld;
+}
+
+void PrintFigures(std::ostream& out, const Advice& advice, const Figures& figures) {
+    out << std::right << std::setw(9) << Fixed(figures.nsPerEvent, 1) << std::setw(8)
+        << (figures.rounds > 1 ? Fixed(figures.nsSpread, 1) : "-") << std::setw(8)
+        << Fixed(TimeRatio(advice, figures), 2) << std::setw(13)
+        << static_cast<std::int64_t>(figures.bytesHeld) << std::setw(8)
+        << Fixed(BytesRatio(advice, figures), 2);
+}
+
+std::string NamesOf(const Advice& advice, std::size_t index) {
+    const Advise::Verdict& verdict = advice.verdict;
+    std::string names;
+    if (verdict.fastest == index) { names += ", fastest"; }
+    if (verdict.smallest == index) { names += ", smallest"; }
+    if (verdict.best == index) { names += ", best"; }
+    if (Advise::NumDifferences(advice.findings.settings[index].settings,
+                               Advise::LibraryDefaults()) == 0) {
+        names += ", default";
+    }
+    return names.empty() ? "" : names.substr(1);
+}
+
+void PrintRow(std::ostream& out, const Advice& advice, std::size_t index) {
+    const Measured& row = advice.findings.settings[index];
+    out << "   " << std::right << std::setw(6) << row.settings.bucketSize << std::setw(8)
+        << row.settings.maxRecordSize << std::setw(8) << row.settings.minRecordSize << std::setw(7)
+        << row.settings.dataAlignment << "  " << std::left << std::setw(9)
+        << (row.settings.keepEmptyBuckets ? "kept" : "released");
+    PrintFigures(out, advice, row.figures);
+    out << ' ' << NamesOf(advice, index) << '\n';
+}
+
+void PrintGivenUp(std::ostream& out, const Advice& advice) {
+    std::map<std::string, unsigned int> problems;
+    for (const auto& each : advice.findings.givenUp) { ++problems[each.problem]; }
+    for (const auto& [problem, number] : problems) {
+        out << "   " << number << (number == 1 ? " setting was" : " settings were")
+            << " given up: " << problem << '\n';
+    }
+}
+
+// What the settings that are advised do, in a sentence.
+std::string Sentence(const Advice& advice) {
+    const Figures& heap = advice.findings.heap;
+    const Figures& pools = advice.findings.settings[*advice.verdict.advised].figures;
+    const bool isPaid = pools.nsPerEvent > heap.nsPerEvent || pools.bytesHeld > heap.bytesHeld;
+    std::string text = "Pools would help";
+    if (isPaid) { text += ", at a price"; }
+    text += ": they take " + Fixed(TimeRatio(advice, pools), 2) + " of the heap's time";
+    if (!Advise::TimesDiffer(pools, heap)) { text += " (the same, within the spread of the runs)"; }
+    return text + " and\n" + Fixed(BytesRatio(advice, pools), 2) +
+           " of its bytes with these settings.";
+}
+
+void PrintShare(std::ostream& out, const Advice& advice, double ratio) {
+    if (!advice.allocationShare.has_value()) {
+        out << "The trace does not tell which share of the program's time its allocation calls "
+               "take, "
+               "and\nso what it can win as a whole.\n";
+        return;
+    }
+    const double share = *advice.allocationShare;
+    out << "Allocation takes " << Percent(share) << " of the program's processor time: at "
+        << Fixed(ratio, 2) << " of the heap's time the\nprogram would take "
+        << Percent(Advise::TimeOfProgram(share, ratio)) << ", and if allocation cost nothing "
+        << Percent(Advise::TimeOfProgram(share, 0)) << ".\n";
+}
+
+}  // namespace
+
+Advice TakeAdvice(Trace::StepReader& reader, unsigned int seconds, const Progress& progress) {
+    const Replay::Recording recording = Replay::ReadRecording(
+        reader, [&](auto position) { progress.Show("event " + std::to_string(position)); },
+        Advise::MaxSteps(seconds));
+    if (recording.peakBlocks == 0) {
+        progress.Clear();
+        throw std::runtime_error(reader.Name() + ": no block was allocated");
+    }
+    Advice advice;
+    advice.numEvents = recording.steps.size();
+    advice.numLeftOut = recording.numLeftOut;
+    const auto share = reader.Facts().find("allocation_share");
+    if (share != reader.Facts().end()) { advice.allocationShare = Advise::ShareOf(share->second); }
+
+    Advise::ForkedMeter meter(recording);
+    advice.findings = Advise::Search(meter, seconds, [&](std::size_t numTried) {
+        progress.Show(std::to_string(numTried) + " settings tried, " + Fixed(meter.Elapsed(), 0) +
+                      " s of at most " + std::to_string(seconds));
+    });
+    progress.Clear();
+    advice.verdict = Advise::Judge(advice.findings);
+    return advice;
+}
+
+void AddSeconds(CLI::App& subcommand, unsigned int& seconds) {
+    subcommand.add_option("--seconds", seconds, "How long to search, about")
+        ->type_name("N")
+        ->check(CLI::Range(1, 100000))
+        ->capture_default_str();
+}
+
+void PrintTable(std::ostream& out, const Advice& advice, bool all) {
+    const std::vector<Measured>& settings = advice.findings.settings;
+    std::vector<std::size_t> order(settings.size());
+    for (std::size_t i = 0; i < order.size(); ++i) { order[i] = i; }
+    std::stable_sort(order.begin(), order.end(), [&](std::size_t a, std::size_t b) {
+        const auto cost = [&](std::size_t i) {
+            return Advise::Cost(settings[i].figures, advice.findings.heap, Advise::Aim::Both);
+        };
+        return cost(a) < cost(b);
+    });
+
+    out << "   Events: " << advice.numEvents;
+    if (advice.numLeftOut != 0) {
+        out << ", the first of " << advice.numEvents + advice.numLeftOut
+            << "; a longer search looks at more";
+    }
+    out << "\n   bucket     max     min  align  empty       ns an              of        bytes     "
+           " of"
+           "\n     size  record  record   ment  buckets     event  spread    heap         held    "
+           "heap\n";
+    out << "   " << std::left << std::setw(40) << "heap";
+    PrintFigures(out, advice, advice.findings.heap);
+    out << '\n';
+    std::size_t numLeftOut = 0;
+    for (std::size_t place = 0; place < order.size(); ++place) {
+        if (all || place < numShown || !NamesOf(advice, order[place]).empty()) {
+            PrintRow(out, advice, order[place]);
+        } else {
+            ++numLeftOut;
+        }
+    }
+    if (numLeftOut != 0) { out << "   and " << numLeftOut << " more settings that were tried\n"; }
+    PrintGivenUp(out, advice);
+}
+
+void PrintVerdict(std::ostream& out, const Advice& advice) {
+    if (!advice.verdict.advised.has_value()) {
+        out << "Pools would not help: none of the settings gains anything that is more than the "
+               "spread "
+               "of the\nruns and more than it costs.\n";
+        PrintShare(out, advice, 1);
+        return;
+    }
+    const Measured& advised = advice.findings.settings[*advice.verdict.advised];
+    out << Sentence(advice) << '\n';
+    PrintShare(out, advice, TimeRatio(advice, advised.figures));
+    out << "\n";
+    for (const auto& [name, value] : Advise::EnvironmentOf(advised.settings)) {
+        out << "    export " << name << '=' << value << '\n';
+    }
+    out << "\nor, in code:\n\n";
+    for (const std::string& line : Advise::CodeOf(advised.settings)) {
+        out << "    " << line << '\n';
+    }
+}
+
+}  // namespace Tool
