@@ -20,7 +20,7 @@ isBare=true
 if $isBare && [ "$(cat "$top/root.made" 2>/dev/null)" != "${inRoot[*]}" ]; then
     rm -rf "$root" "$top/root.made"
     (
-        timeout 600 mmdebstrap --quiet --mode=root --variant=minbase \
+        timeout 1200 mmdebstrap --mode=root --variant=minbase \
             --include="$(IFS=, && echo "${inRoot[*]}")" --dpkgopt=force-unsafe-io \
             --dpkgopt='path-exclude=/usr/share/doc/*' \
             "$(. /etc/os-release && echo "$VERSION_CODENAME")" "$root" >"$top/root.log" 2>&1 &&
