@@ -31,6 +31,9 @@ execute_process(COMMAND awk -v version=${CPACK_PACKAGE_VERSION}-${CPACK_DEBIAN_P
         -f ${CMAKE_CURRENT_LIST_DIR}/changelog.awk ${sources}/CHANGELOG.md
     OUTPUT_VARIABLE changelog COMMAND_ERROR_IS_FATAL ANY)
 
+# What of others is compiled into a component, each told by the Debian package that it comes from.
+set(others_tools libcli11-dev nlohmann-json3-dev libjs-d3)
+
 # What there is to read.
 set(texts_dev README.md docs/moving.md)
 set(texts_tools docs/report.md)
@@ -43,6 +46,13 @@ foreach(component IN LISTS CPACK_COMPONENTS_ALL)
 
     file(WRITE ${doc}/copyright "libObrMemPool\n\nCopyright: the owner of the repository.\n\n"
         "${licence}\n")
+    foreach(other IN LISTS others_${component})
+        set(notice /usr/share/doc/${other}/copyright)
+        if(EXISTS ${notice})
+            file(READ ${notice} notice)
+            file(APPEND ${doc}/copyright "\nIt has code of ${other} in it, which says:\n\n${notice}")
+        endif()
+    endforeach()
     file(WRITE ${doc}/changelog.Debian "${changelog}")
     run(gzip -9nf ${doc}/changelog.Debian)
     foreach(text IN LISTS texts_${component})

@@ -8,9 +8,9 @@ packages=()
 for job in "$@"; do
     case $job in
         build) packages+=(g++ cmake ninja-build libcli11-dev) ;;
-        test) packages+=(liblua5.4-dev lua5.4 libsqlite3-dev sqlite3 libgmock-dev zlib1g-dev libzstd-dev libdw-dev nlohmann-json3-dev libjs-d3 chromium chromium-driver python3-selenium python3-pil clang libclang-rt-14-dev binutils pkg-config gdb) ;;
+        test) packages+=(liblua5.4-dev lua5.4 libsqlite3-dev sqlite3 libgmock-dev zlib1g-dev libzstd-dev libdw-dev nlohmann-json3-dev libjs-d3 chromium chromium-driver python3-selenium python3-pil clang libclang-rt-14-dev binutils pkg-config gdb pandoc) ;;
         lint) packages+=(git clang-format clang-tidy shellcheck) ;;
-        package) packages+=(git dpkg-dev file lintian pandoc mmdebstrap) ;;
+        package) packages+=(git dpkg-dev file lintian mmdebstrap) ;;
         docs) packages+=(doxygen) ;;
         abi) packages+=(abigail-tools) ;;
         bench) packages+=(liblua5.4-dev libsqlite3-dev libbenchmark-dev zlib1g-dev libzstd-dev libmimalloc2.0 libjemalloc2 libtcmalloc-minimal4

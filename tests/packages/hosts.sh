@@ -46,7 +46,10 @@ done
 
 NUV_OBR_MEMPOOL_TRACE=1 ./FirstPool | mempool replay --rounds 1 - >replay.txt
 grep -q "^   events  *5 " replay.txt
-echo "mempool replays the trace of FirstPool"
+mempool record -o FirstPool.trace ./FirstPool >/dev/null
+mempool text FirstPool.trace | grep -q "^xmpt:a:.*:5024$"
+mempool report FirstPool.trace >report.txt
+echo "mempool records FirstPool, reports on it, and replays its own trace"
 
 # The command comes with the library, and finds the pool by the library's symbol table.
 gdb -batch -nx -ex "break OBR::MemPool::Mgr::Clear" -ex run -ex "info mempools" ./FirstPool \
