@@ -45,7 +45,7 @@ std::string Bytes(const std::string& path) {
 
 // What `mempool report` writes on both streams, given that it returns `exitStatus`.
 std::string Tool(const std::string& arguments, int exitStatus = 0) {
-    const std::string command = "cd " + Path("") + " && " MEMPOOL " report " + arguments + " 2>&1";
+    const std::string command = "cd " + Path("") + " && " MEMPOOL " report 2>&1 " + arguments;
     std::FILE* const tool = popen(command.c_str(), "r");
     std::string text;
     for (int c = std::fgetc(tool); c != EOF; c = std::fgetc(tool)) { text += static_cast<char>(c); }
@@ -124,6 +124,7 @@ TEST(Report, WritesAPage) {
     EXPECT_EQ(data + "\n", Tool("--json small"));
     EXPECT_THAT(Tool("--html no/where small", 1), HasSubstr("mempool: no/where: No such file"));
     EXPECT_THAT(Tool("--html /dev/full small", 1), HasSubstr("mempool: /dev/full: No space left"));
+    EXPECT_THAT(Tool("small >/dev/full", 1), HasSubstr("mempool: standard output cannot"));
 }
 
 TEST(Report, TellsWhatIsWrongWithATrace) {

@@ -56,6 +56,11 @@ struct Options {
     bool all = false;
 };
 
+void Flush() {
+    std::cout << std::flush;
+    if (!std::cout) { throw std::runtime_error("standard output cannot be written to"); }
+}
+
 void WriteFile(const std::string& path, const std::string& text) {
     std::ofstream file(path, std::ios::binary);
     file << text;
@@ -91,7 +96,8 @@ int WriteReport(Trace::StepReader& reader, const ReportOptions& options) {
     progress.Clear();
 
     if (options.html == "-") {
-        std::cout << Report::MakePage(analysis) << std::flush;
+        std::cout << Report::MakePage(analysis);
+        Flush();
         return WarnOfBrokenTrace(reader);
     }
     if (options.json) {
@@ -101,7 +107,7 @@ int WriteReport(Trace::StepReader& reader, const ReportOptions& options) {
         PrintBadLines(badLines, reader);
         PrintAnalysis(std::cout, analysis, options.extent, badLines.str());
     }
-    std::cout << std::flush;
+    Flush();
     if (!options.html.empty()) { WriteFile(options.html, Report::MakePage(analysis)); }
     return WarnOfBrokenTrace(reader);
 }

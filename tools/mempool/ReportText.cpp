@@ -50,6 +50,12 @@ std::string Percent(std::uint64_t part, std::uint64_t whole) {
     return text.str();
 }
 
+// Without the blank, for narrow columns.
+std::string Tight(std::uint64_t part, std::uint64_t whole) {
+    const std::string percent = Percent(part, whole);
+    return whole == 0 ? percent : percent.substr(0, percent.size() - 2) + "%";
+}
+
 // At most so many bytes, to the start of a character of UTF-8, and dots for the rest.
 std::string Cut(const std::string& text, std::size_t bytes) {
     if (text.size() <= bytes) { return text; }
@@ -119,9 +125,9 @@ void PrintTotals(std::ostream& out, const Analysis& analysis) {
         << Percent(total.padding, total.inRecords.bytes) << " to them\n";
     Label(out, "die together");
     out << Percent(analysis.runs.together, total.all.blocks)
-        << " of the blocks; one Clear each for "
-        << Percent(analysis.runs.clearable, total.all.blocks) << ", "
-        << Count(analysis.runs.numClears) << " times\n";
+        << " of the blocks; one Clear would do for "
+        << Percent(analysis.runs.clearable, total.all.blocks)
+        << " (runs: " << Count(analysis.runs.numClears) << ")\n";
     Label(out, "peak");
     out << Bytes(analysis.peak.asked) << " in " << Count(analysis.peak.blocks)
         << " blocks, at event " << Count(analysis.peak.event) << "\n\n";
@@ -240,11 +246,9 @@ void PrintLifetimes(std::ostream& out, const Analysis& analysis) {
     std::uint64_t within = 0;
     for (std::size_t bin = 0; bin <= last; ++bin) {
         within += total.lifetimes.at(bin);
-        std::string share = Percent(within, total.all.blocks);
-        if (share.size() > 6) { share.erase(share.size() - 2); }
-        row.Cell(share.size() > 1 ? share.substr(0, share.find(' ')) + "%" : share, 6);
+        row.Cell(Tight(within, total.all.blocks), 6);
     }
-    row.Cell(Percent(total.never, total.all.blocks), 7);
+    row.Cell(Tight(total.never, total.all.blocks), 7);
 }
 
 void PrintGroups(std::ostream& out, const Analysis& analysis, Extent extent) {
@@ -254,19 +258,15 @@ void PrintGroups(std::ostream& out, const Analysis& analysis, Extent extent) {
     out << "\n   GROUPS" << (shown < analysis.groups.size() ? " LARGEST AT THE PEAK" : "")
         << Shown(shown, analysis.groups.size()) << '\n';
     out << "    at peak      blocks     bytes  short  never together  clear  name\n";
-    const auto share = [](std::uint64_t part, std::uint64_t whole) {
-        const std::string percent = Percent(part, whole);
-        return percent.substr(0, percent.find(' ')) + (whole == 0 ? "" : "%");
-    };
     for (std::size_t i = 0; i < shown; ++i) {
         const Report::GroupRow& group = analysis.groups[i];
         const Tally& tally = group.tally;
         const std::uint64_t blocks = tally.all.blocks;
         out << "   " << std::setw(8) << Bytes(tally.atPeak.bytes) << std::setw(12) << Count(blocks)
             << std::setw(10) << Bytes(tally.all.bytes) << std::setw(7)
-            << share(tally.lifetimes[0] + tally.lifetimes[1], blocks) << std::setw(7)
-            << share(tally.never, blocks) << std::setw(9) << share(group.runs.together, blocks)
-            << std::setw(7) << share(group.runs.clearable, blocks) << "  "
+            << Tight(tally.lifetimes[0] + tally.lifetimes[1], blocks) << std::setw(7)
+            << Tight(tally.never, blocks) << std::setw(9) << Tight(group.runs.together, blocks)
+            << std::setw(7) << Tight(group.runs.clearable, blocks) << "  "
             << (extent == Extent::All ? SafeText(group.name) : Cut(SafeText(group.name), 36))
             << '\n';
     }
