@@ -12,6 +12,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <ctime>
 #include <new>
 #include <string>
 #include <thread>
@@ -143,6 +144,12 @@ void Signals() {
     ualarm(0, 0);
 }
 
+void Spin() {
+    const std::clock_t end = std::clock() + CLOCKS_PER_SEC / 10;
+    while (std::clock() < end) {}
+    for (int count = 0; count != 1000; ++count) { Use(200); }
+}
+
 void Environment() {
     for (char** variable = environ; *variable != nullptr; ++variable) { std::puts(*variable); }
     for (int descriptor = 3; descriptor != 1024; ++descriptor) {
@@ -172,6 +179,10 @@ int main(int argc, char** argv) {
     if (what == "exec") { Exec(argv[0]); }
     if (what == "load") { Load(); }
     if (what == "signals") { Signals(); }
+    if (what == "spin") { Spin(); }
+    if (what == "allocate") {
+        for (int count = 0; count != 200000; ++count) { Use(200); }
+    }
     if (what == "environment") { Environment(); }
     if (what == "callers") {
         FirstCaller();

@@ -124,6 +124,14 @@ TEST(Record, CallsTheGroups) {
               (std::map<std::string, int>{{"RecordHost", 4}}));
 }
 
+TEST(Record, EstimatesTheShareOfTheAllocations) {
+    const auto spin = Record("spin").facts;
+    EXPECT_LT(std::stod(spin.at("allocation_share")), 0.05);
+    EXPECT_NEAR(std::stod(spin.at("cpu_seconds")), 0.1, 0.03);
+    // Half of the time is the recorder's, which does not count.
+    EXPECT_GT(std::stod(Record("allocate").facts.at("allocation_share")), 0.5);
+}
+
 TEST(Record, PassesTheProgramOn) {
     Shell::Output("ln -sf " HOST " Host");
     const std::string record = MEMPOOL " record -o trace ";

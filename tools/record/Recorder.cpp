@@ -8,6 +8,7 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <climits>
 #include <cstdlib>
@@ -135,17 +136,24 @@ bool WaitForRoom(Channel& channel, std::uint64_t index) {
     return isDrained;
 }
 
-Sample::~Sample() {
-    // A thread that was interrupted in between would count for thousands of calls.
-    constexpr std::uint64_t tooLong = 1U << 17;
-    const std::uint64_t whole = Ticks() - start;
-    if (whole > tooLong) { return; }
+// A thread that is interrupted within a call seems to spend a long time there. A call that long is
+// counted as no longer than most that really are, and one outside of the allocator not at all.
+void Sample::End(std::uint64_t end) {
+    constexpr std::uint64_t longest = 1U << 19;
+    ThreadState& state = threadState;
+    state.isWarm = !state.isWarm;
+    if (state.isWarm) { return; }
+    // The next one is 32 to 95 calls away, so that no pattern of the program keeps step.
+    state.random = state.random * 1664525U + 1013904223U;
+    state.countdown = samplePeriod / 2 + (state.random >> 26) - 1;
+
     const auto without = [](std::uint64_t ticks, std::uint64_t timer) {
         return ticks > timer ? ticks - timer : 0;
     };
-    channel.allocatorTicks.fetch_add(without(inside, ticksOfTimer), std::memory_order_relaxed);
-    channel.recorderTicks.fetch_add(without(whole - inside, 2 * ticksOfTimer),
-                                    std::memory_order_relaxed);
+    const std::uint64_t outside = without(end - start - inside, 2 * ticksOfTimer);
+    channel.allocatorTicks.fetch_add(std::min(without(inside, ticksOfTimer), longest),
+                                     std::memory_order_relaxed);
+    if (outside < longest) { channel.recorderTicks.fetch_add(outside, std::memory_order_relaxed); }
 }
 
 }  // namespace Record

@@ -25,6 +25,7 @@ struct ThreadState {
     std::uint32_t number;     // From 1 on, in the order of their first events; 0 before that.
     std::uint32_t countdown;  // Calls until one is timed.
     std::uint32_t random;
+    bool isWarm;  // The last call was timed to warm the caches; the next one counts.
 };
 // In the memory that the loader gives each thread from the start: its first use allocates nothing.
 extern thread_local ThreadState threadState __attribute__((tls_model("initial-exec")));
@@ -83,12 +84,14 @@ inline void Put(Channel& channel, Op op, const void* block, std::uint64_t size,
     }
 }
 
-// Whether this call is one to be timed.
+// Whether this call is one to be timed. Two calls in a row are, of which the second counts: the
+// code that times is rarely run, and the first would tell how slow it is when it is not in the
+// cache.
 inline bool IsSampled() {
-    if (__builtin_expect(threadState.countdown-- != 0, 1)) { return false; }
-    // The next one is 32 to 95 calls away, so that no pattern of the program keeps step.
-    threadState.random = threadState.random * 1664525U + 1013904223U;
-    threadState.countdown = samplePeriod / 2 + (threadState.random >> 26) - 1;
+    if (__builtin_expect(threadState.countdown != 0, 1)) {
+        --threadState.countdown;
+        return false;
+    }
     return true;
 }
 
@@ -99,12 +102,14 @@ public:
     explicit Sample(Channel& toChannel) : channel(toChannel), start(Ticks()) {}
     Sample(const Sample&) = delete;
     Sample& operator=(const Sample&) = delete;
-    ~Sample();
+    ~Sample() { End(Ticks()); }
 
     void EnterAllocator() { entered = Ticks(); }
-    void LeaveAllocator() { inside += Ticks() - entered; }
+    void LeaveAllocator() { inside = Ticks() - entered; }
 
 private:
+    void End(std::uint64_t end);
+
     Channel& channel;
     const std::uint64_t start;
     std::uint64_t entered = 0;

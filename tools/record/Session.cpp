@@ -5,7 +5,6 @@
 
 #include <fcntl.h>
 #include <sys/mman.h>
-#include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -14,6 +13,7 @@
 #include <chrono>
 #include <csignal>
 #include <cstdlib>
+#include <ctime>
 #include <filesystem>
 #include <initializer_list>
 #include <iomanip>
@@ -206,8 +206,12 @@ std::string Text(double number) {
     return text.str();
 }
 
-double Seconds(const timeval& time) {
-    return static_cast<double>(time.tv_sec) + static_cast<double>(time.tv_usec) / 1e6;
+// The processor time of a process that has ended and is still known, without that of its children.
+double ProcessorSeconds(pid_t program) {
+    clockid_t clock = {};
+    timespec time = {};
+    if (clock_getcpuclockid(program, &clock) != 0 || clock_gettime(clock, &time) != 0) { return 0; }
+    return static_cast<double>(time.tv_sec) + static_cast<double>(time.tv_nsec) / 1e9;
 }
 
 // How many ticks a second has, from the time that the program took.
@@ -238,31 +242,38 @@ void WriteStart(Trace::CompactWriter& writer, const Order& order) {
 }
 
 // The recorder's part of the processor time, which the sample tells, is not the program's own.
-void WriteTimes(Trace::CompactWriter& writer, const Channel& channel, const rusage& usage,
+void WriteTimes(Trace::CompactWriter& writer, const Channel& channel, double whole,
                 const TickRate& rate) {
     const double perSecond = rate.PerSecond();
     const auto seconds = [&](std::uint64_t ticks) {
         return perSecond > 0 ? static_cast<double>(ticks) * samplePeriod / perSecond : 0;
     };
-    const double whole = Seconds(usage.ru_utime) + Seconds(usage.ru_stime);
-    const double own = std::max(whole - seconds(channel.recorderTicks), 0.0);
-    const double share = own > 0 ? std::min(seconds(channel.allocatorTicks) / own, 1.0) : 0;
+    // Timed apart, two steps take longer than one behind the other: the estimates may exceed the
+    // whole in a program that does nothing else.
+    const double allocator = std::min(seconds(channel.allocatorTicks), whole);
+    const double own = std::max(whole - seconds(channel.recorderTicks), allocator);
+    const double share = own > 0 ? allocator / own : 0;
     WriteInfo(writer, "cpu_seconds", Text(own));
     WriteInfo(writer, "allocation_share", Text(share));
     WriteInfo(writer, "threads", std::to_string(channel.numThreads));
 }
 
-// Drains the channel until the program ends.
-int Follow(pid_t program, Collector& collector, Trace::CompactWriter& writer,
-           const Signals& signals, rusage& usage) {
+bool IsRunning(pid_t program) {
+    siginfo_t info = {};
+    waitid(P_PID, static_cast<id_t>(program), &info, WEXITED | WNOHANG | WNOWAIT);
+    return info.si_pid == 0;
+}
+
+// Drains the channel until the program ends, which is not waited for yet.
+void Follow(pid_t program, Collector& collector, Trace::CompactWriter& writer,
+            const Signals& signals) {
     using namespace std::chrono_literals;
     constexpr auto shortest = 500us;
     constexpr auto longest = 20ms;
     constexpr auto idleUntilFlush = 500ms;
     std::chrono::nanoseconds pause = shortest;
     std::chrono::nanoseconds idle = 0ns;
-    int status = 0;
-    while (wait4(program, &status, WNOHANG, &usage) == 0) {
+    while (IsRunning(program)) {
         if (collector.Drain()) {
             pause = shortest;
             idle = 0ns;
@@ -278,7 +289,6 @@ int Follow(pid_t program, Collector& collector, Trace::CompactWriter& writer,
         }
     }
     while (collector.Drain(true)) {}
-    return status;
 }
 
 }  // namespace
@@ -299,9 +309,10 @@ Outcome RecordProgram(const Order& order) {
     const Signals signals;
     const TickRate rate;
     const pid_t program = Start(order, channel, recorder, signals);
-    rusage usage = {};
-    const int status = Follow(program, collector, writer, signals, usage);
-    WriteTimes(writer, *channel, usage, rate);
+    Follow(program, collector, writer, signals);
+    WriteTimes(writer, *channel, ProcessorSeconds(program), rate);
+    int status = 0;
+    waitpid(program, &status, 0);
     writer.Finish();
     file.Close();
     file.Check();
