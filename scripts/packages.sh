@@ -120,5 +120,5 @@ else
     library=$hosts/unpacked/usr/lib/$(dpkg-architecture -qDEB_HOST_MULTIARCH)
     cd "$hosts"
     CMAKE_PREFIX_PATH=$hosts/unpacked/usr PKG_CONFIG_PATH=$library/pkgconfig LD_LIBRARY_PATH=$library \
-        PATH=$hosts/unpacked/usr/bin:$PATH sh hosts.sh "$hosts"
+        PATH=$hosts/unpacked/usr/bin:$PATH sh hosts.sh "$hosts" unpacked
 fi
