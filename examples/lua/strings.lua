@@ -3,7 +3,7 @@ local scale = tonumber(os.getenv("SCALE") or 1)
 
 local words = {}
 for i = 1, math.floor(120000 * scale) do
-    words[i] = ("word%x"):format(i * 2654435761 % 99991)
+    words[i] = ("word%x"):format(i * 2654435761 % 9973)
 end
 
 local counts = {}

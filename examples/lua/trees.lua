@@ -1,14 +1,18 @@
--- Binary trees, many small and short-lived beside a large one that stays, as a compiler has them.
+-- Trees of nodes with named fields, many small and short-lived beside a large one that stays, as a
+-- compiler has them.
 local depth = math.floor(15 + math.log(tonumber(os.getenv("SCALE") or 1), 2))
 
 local function build(level)
-    if level == 0 then return {} end
-    return {build(level - 1), build(level - 1)}
+    if level == 0 then return {kind = "leaf", line = level, value = 1} end
+    return {
+        kind = "pair", line = level, type = "sum",
+        left = build(level - 1), right = build(level - 1),
+    }
 end
 
 local function count(tree)
-    if not tree[1] then return 1 end
-    return 1 + count(tree[1]) + count(tree[2])
+    if tree.kind == "leaf" then return 1 end
+    return 1 + count(tree.left) + count(tree.right)
 end
 
 local stays = build(depth)
