@@ -4,9 +4,9 @@
 usage: bench-report.py RESULTS OUTPUT
 
 RESULTS holds NUMBER.SUBJECT.ROUND.json (Google Benchmark's, by the number of the row), the same of
-the layer in a folder of its own, "clients" (round, work, mode and what the client tells of its
-time), and "resident" (subject, size, bytes a block and, for the pool, bytes held). The figures for
-the pictures go back there, as ratios.dat and growth.dat, and those of the clients also into moving.md
+the layer in a folder of its own, "clients" (round, work, mode, seconds of user and of system time),
+and "resident" (subject, size, bytes a block and, for the pool, bytes held). The figures for the
+pictures go back there, as ratios.dat and growth.dat, and those of the clients also into moving.md
 beside OUTPUT.
 """
 
@@ -130,7 +130,7 @@ def read_clients(results):
     times = {}
     for line in (results / "clients").read_text().splitlines():
         round_number, work, mode, figures = line.split("\t")
-        seconds = sum(float(figure) for figure in re.findall(r"([0-9.]+) s", figures))
+        seconds = sum(map(float, figures.split()))
         times.setdefault(mode[2:], {}).setdefault(work, {})[round_number] = seconds
     return times
 
@@ -175,9 +175,9 @@ def write_moving(path, clients):
 def layer_tables(layer, rows, clients):
     subjects = [name for name in LAYERED if name in layer.times]
     yield from table(["work, ns"] + subjects,
-                     ([row] + [number(layer.time(row, name), 1) for name in subjects]
+                     ([row] + [number(layer.time(row, name), 2) for name in subjects]
                       for row in rows))
-    yield "The clients, seconds, and the ratio within a round:"
+    yield "The clients, seconds of processor time of the whole run, and the ratio within a round:"
     yield ""
     yield from client_table(clients)
 
