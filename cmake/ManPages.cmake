@@ -27,7 +27,7 @@ endfunction()
 
 if(PANDOC AND GZIP)
     manual(ObrMemPool.7 dev)
-    if(TARGET mempool AND (NOT CMAKE_CROSSCOMPILING OR CMAKE_CROSSCOMPILING_EMULATOR))
+    if(TARGET mempool AND NOT CMAKE_CROSSCOMPILING)  # The program tells its own help.
         manual(mempool.1 tools mempool)
     endif()
 else()
