@@ -15,6 +15,7 @@
 #include <gtest/gtest.h>
 
 #include "HeapSpy.hpp"
+#include "Layout.hpp"
 #include "MemPool/BucketMgr.hpp"
 #include "MemPool/MgrRegistry.hpp"
 #include "PoolFixture.hpp"
@@ -110,7 +111,7 @@ TEST_F(MgrTest, AHandlePassesEverythingOn) {
     void* const record = mgr.Alloc(5);
     void* const heapRecord = mgr.Alloc(997);
     EXPECT_TRUE(HeapSpy::FailsAt(0, [&] { mgr.Alloc(limit); }));
-    EXPECT_EQ(HeapSpy::lastRequest, limit + 24);
+    EXPECT_EQ(HeapSpy::lastRequest, limit + Layout::extRec);
     EXPECT_EQ(CheckInvariants(pool).size(), 2u);
     EXPECT_EQ(mgr.GetSize(record), 8u);
     EXPECT_TRUE(mgr.Contains(record));
@@ -137,12 +138,6 @@ TEST_F(MgrTest, ARefusedPoolLeavesNothingButAGapInTheNumbers) {
     EXPECT_EQ(GetMgr(mgr->GetName()), &*mgr);
     EXPECT_EQ(Number(*mgr), number + 1 + static_cast<int>(n));
     EXPECT_EQ(mgr->GetSize(mgr->Alloc(1)), 4u);
-
-    EXPECT_TRUE(HeapSpy::FailsAt(0, [&] { *mgr = other; }));
-    EXPECT_NE(mgr->GetBucketMgr(), other.GetBucketMgr());
-    const Mgr& same = other;
-    EXPECT_FALSE(HeapSpy::FailsAt(0, [&] { other = same; }));
-    EXPECT_TRUE(registry.Sharers().empty());
 }
 
 namespace {

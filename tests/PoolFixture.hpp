@@ -16,6 +16,7 @@
 #include <gtest/gtest.h>
 
 #include "HeapSpy.hpp"
+#include "Layout.hpp"
 #include "MemPool/BucketMgr.hpp"
 #include "MemPool/Settings.hpp"
 
@@ -83,21 +84,18 @@ using Blocks = std::map<const std::uint8_t*, std::uint32_t>;
 // and known to the pool.
 inline void CheckBucket(const BucketMgr& pool, const Group& group, const Bucket& bucket,
                         Blocks& blocks) {
-    const std::uint32_t recSize = group.recDataSize + 4u;
+    const std::uint32_t recSize = group.recDataSize + Layout::recHdr;
     ASSERT_EQ(bucket.parent, &group);
     ASSERT_EQ(bucket.recSize, recSize);
     EXPECT_LE(recSize, pool.maxRecordSize);
-    const std::uint32_t totalRecs = (pool.bucketSize - 2) / recSize;
-    ASSERT_EQ(bucket.size, 2 + totalRecs * recSize);
-    EXPECT_TRUE(HeapSpy::IsArray(&bucket, bucket.size + 46u));
+    const std::uint32_t totalRecs = (pool.bucketSize - Layout::firstOffset) / recSize;
+    ASSERT_EQ(bucket.size, Layout::firstOffset + totalRecs * recSize);
+    EXPECT_TRUE(HeapSpy::IsArray(&bucket, bucket.size + Layout::recsBase));
     EXPECT_TRUE(pool.keepEmptyBuckets || bucket.numFree < totalRecs);
 
-    const auto* const recsBase = reinterpret_cast<const std::uint8_t*>(&bucket) + 46;
-    const auto linkAt = [recsBase](std::uint32_t offset) {
-        return recsBase[offset] + recsBase[offset + 1] * 0x100u;
-    };
     std::vector<bool> isFree(bucket.size, false);
-    for (std::uint32_t offset = bucket.freeHead; offset != 0; offset = linkAt(offset)) {
+    for (std::uint32_t offset = bucket.freeHead; offset != 0;
+         offset = Layout::Link(Layout::Record(&bucket, offset))) {
         ASSERT_LT(offset, bucket.size);
         ASSERT_FALSE(isFree[offset]) << "The free list runs in a circle.";
         isFree[offset] = true;
@@ -105,9 +103,10 @@ inline void CheckBucket(const BucketMgr& pool, const Group& group, const Bucket&
     EXPECT_EQ(std::count(isFree.begin(), isFree.end(), true), bucket.numFree);
 
     std::uint32_t numUsed = 0;
-    for (std::uint32_t offset = 2; offset < bucket.size; offset += recSize) {
-        const std::uint8_t* const data = recsBase + offset + 4;
-        ASSERT_EQ(recsBase[offset + 2], isFree[offset] ? 0 : 1);
+    for (std::uint32_t offset = Layout::firstOffset; offset < bucket.size; offset += recSize) {
+        const std::uint8_t* const data = Layout::Data(&bucket, offset);
+        ASSERT_EQ(Layout::Type(data - Layout::recHdr),
+                  isFree[offset] ? Layout::typeFree : Layout::typeUsed);
         ASSERT_EQ(pool.FindBucket(data), isFree[offset] ? nullptr : &bucket);
         if (isFree[offset]) { continue; }
         ++numUsed;
@@ -153,8 +152,8 @@ inline Blocks CheckInvariants(const BucketMgr& pool) {
     const auto extRecs = ListOf<ExtRec>(pool.extRecs, &ExtRec::next, &ExtRec::prev);
     EXPECT_EQ(pool.numExtRecs, extRecs.size());
     for (const ExtRec* const extRec : extRecs) {
-        EXPECT_TRUE(HeapSpy::IsArray(extRec, extRec->length + 24u));
-        const auto* const data = reinterpret_cast<const std::uint8_t*>(extRec) + 24;
+        EXPECT_TRUE(HeapSpy::IsArray(extRec, extRec->length + Layout::extRec));
+        const auto* const data = Layout::Bytes(extRec) + Layout::extRec;
         EXPECT_EQ(pool.GetSize(data), extRec->length);
         EXPECT_EQ(pool.Contains(data), extRec->length != 0);
         blocks[data] = extRec->length;

@@ -9,6 +9,7 @@
 #include <gtest/gtest.h>
 
 #include "HeapSpy.hpp"
+#include "Layout.hpp"
 #include "MemPool/BucketMgr.hpp"
 #include "PoolFixture.hpp"
 
@@ -75,10 +76,9 @@ void ExpectNone(BucketMgr& pool, void* data) {
 std::uint8_t* ForgeRecord(std::uint8_t* bucket, const Group* parent, std::uint16_t size,
                           std::uint16_t offset, std::uint8_t type) {
     std::memcpy(bucket, &parent, sizeof parent);
-    std::memcpy(bucket + 40, &size, sizeof size);
-    std::memcpy(bucket + 46 + offset, &offset, sizeof offset);
-    bucket[46 + offset + 2] = type;
-    return bucket + 46 + offset + 4;
+    std::memcpy(bucket + Layout::sizeAt, &size, sizeof size);
+    Layout::SetHeader(Layout::Record(bucket, offset), type, offset);
+    return Layout::Data(bucket, offset);
 }
 
 }  // namespace
@@ -167,19 +167,17 @@ TEST_F(PoolTest, EachTestOfARecordCounts) {
 
 TEST_F(PoolTest, EachTestOfAHeapRecordCounts) {
     BucketMgr pool(nullptr, "pool");
-    constexpr std::uint8_t image[] = {0x10, 0x27, 0, 0, 0xAA, 0xBB, 2, 0xCC};
     alignas(ExtRec) std::uint8_t memory[64] = {};
     for (std::uint8_t* const block : {memory, memory + 1}) {
-        std::memcpy(block + 16, image, sizeof image);
-        EXPECT_TRUE(pool.Contains(block + 24));
-        EXPECT_EQ(pool.GetSize(block + 24), 10000u);
-        for (std::size_t i = 20; i < 24; ++i) {
-            ++block[i];
-            ExpectNone(pool, block + 24);
-            --block[i];
+        std::uint8_t* const data = Layout::SetExtRec(block, 10000);
+        EXPECT_TRUE(pool.Contains(data));
+        EXPECT_EQ(pool.GetSize(data), 10000u);
+        for (std::uint8_t* byte = data - Layout::recHdr; byte != data; ++byte) {
+            ++*byte;
+            ExpectNone(pool, data);
+            --*byte;
         }
-        block[16] = block[17] = 0;
-        ExpectNone(pool, block + 24);
+        ExpectNone(pool, Layout::SetExtRec(block, 0));
     }
 
     // The newest is in front, and whose it is, is no test.
@@ -187,14 +185,17 @@ TEST_F(PoolTest, EachTestOfAHeapRecordCounts) {
     for (const std::uint32_t size : {2001u, 2002u}) {
         void* const data = other.Alloc(size);
         EXPECT_EQ(other.extRecs->Data(), data);
-        EXPECT_EQ(std::memcmp(static_cast<std::uint8_t*>(data) - 4, image + 4, 4), 0);
+        EXPECT_EQ(
+            std::memcmp(Layout::Bytes(data) - Layout::recHdr, Layout::extRecHdr, Layout::recHdr),
+            0);
         EXPECT_TRUE(pool.Contains(data));
         EXPECT_EQ(pool.GetSize(data), size);
     }
     const ExtRec* const newest = other.extRecs;
     EXPECT_TRUE(other.Free(other.extRecs->Data()));
     EXPECT_EQ(HeapSpy::lastRelease, newest);
-    EXPECT_EQ(std::count(&HeapSpy::releasedHead[0], &HeapSpy::releasedHead[24], 0), 24);
+    EXPECT_EQ(std::count(&HeapSpy::releasedHead[0], &HeapSpy::releasedHead[Layout::extRec], 0),
+              Layout::extRec);
 }
 
 TEST_F(PoolTest, ADisabledPoolIsTheHeap) {

@@ -11,6 +11,7 @@
 #include <gtest/gtest.h>
 
 #include "HeapSpy.hpp"
+#include "Layout.hpp"
 #include "MemPool/BucketMgr.hpp"
 #include "PoolFixture.hpp"
 
@@ -24,15 +25,12 @@ using Bytes = std::vector<std::uint8_t>;
 
 // The bytes of all records from the first one's header on.
 Bytes RecordsOf(const Bucket* bucket) {
-    const auto* const start = reinterpret_cast<const std::uint8_t*>(bucket);
-    return Bytes(start + 48, start + 46 + bucket->size);
+    return Bytes(Layout::Record(bucket, Layout::firstOffset), Layout::Record(bucket, bucket->size));
 }
 
 // Says what the header of the record at `offset` is to be.
 void Expect(Bytes& records, std::uint32_t offset, std::uint8_t type, std::uint32_t link) {
-    records[offset - 2] = static_cast<std::uint8_t>(link % 0x100);
-    records[offset - 1] = static_cast<std::uint8_t>(link / 0x100);
-    records[offset] = type;
+    Layout::SetHeader(&records[offset - Layout::firstOffset], type, link);
 }
 
 }  // namespace
@@ -53,7 +51,7 @@ TEST_F(RecordTest, EveryByteOfABucketIsAsDrawn) {
         const std::uint32_t recSize = row.dataSize + 4;
         Group group(nullptr, row.dataSize, row.bucketSize, false);
         Bucket* const bucket = Bucket::Create(&group, row.bucketSize, row.dataSize);
-        EXPECT_TRUE(HeapSpy::IsArray(bucket, row.size + 46));
+        EXPECT_TRUE(HeapSpy::IsArray(bucket, row.size + Layout::recsBase));
         EXPECT_EQ(bucket->parent, &group);
         for (const Bucket* link : {bucket->next1, bucket->prev1, bucket->next2, bucket->prev2}) {
             EXPECT_EQ(link, nullptr);
@@ -66,7 +64,8 @@ TEST_F(RecordTest, EveryByteOfABucketIsAsDrawn) {
 
         Bytes expected(row.size - 2, HeapSpy::freshByte);
         for (std::uint32_t offset = 2; offset < row.size; offset += recSize) {
-            Expect(expected, offset, 0, offset + recSize < row.size ? offset + recSize : 0);
+            Expect(expected, offset, Layout::typeFree,
+                   offset + recSize < row.size ? offset + recSize : 0);
         }
         EXPECT_TRUE(RecordsOf(bucket) == expected) << "made";
 
@@ -74,8 +73,8 @@ TEST_F(RecordTest, EveryByteOfABucketIsAsDrawn) {
         for (std::uint32_t offset = 2; offset < row.size; offset += recSize) {
             EXPECT_EQ(bucket->numFree == bucket->TotalRecs(), offset == 2);
             EXPECT_NE(bucket->numFree, 0);
-            EXPECT_EQ(bucket->TakeRecord(), reinterpret_cast<char*>(bucket) + 50 + offset);
-            Expect(expected, offset, 1, offset);
+            EXPECT_EQ(bucket->TakeRecord(), Layout::Data(bucket, offset));
+            Expect(expected, offset, Layout::typeUsed, offset);
             offsets.push_back(offset);
         }
         EXPECT_TRUE(RecordsOf(bucket) == expected) << "taken";
@@ -85,11 +84,11 @@ TEST_F(RecordTest, EveryByteOfABucketIsAsDrawn) {
         std::shuffle(offsets.begin(), offsets.end(), random);
         std::uint32_t last = 0;
         for (const std::uint32_t offset : offsets) {
-            char* const data = reinterpret_cast<char*>(bucket) + 50 + offset;
+            std::uint8_t* const data = Layout::Data(bucket, offset);
             std::memset(data, 0xEE, row.dataSize);
             std::memset(&expected[offset + 2], 0xEE, row.dataSize);
             bucket->ReturnRecord(data);
-            Expect(expected, offset, 0, last);
+            Expect(expected, offset, Layout::typeFree, last);
             last = offset;
             EXPECT_EQ(bucket->freeHead, offset);
         }
@@ -97,7 +96,7 @@ TEST_F(RecordTest, EveryByteOfABucketIsAsDrawn) {
         EXPECT_EQ(bucket->numFree, bucket->TotalRecs());
 
         std::array<std::uint8_t, 48> head = {};
-        std::memcpy(&head[44], &bucket->freeHead, 4);
+        std::memcpy(&head[Layout::freeHeadAt], &bucket->freeHead, 4);
         bucket->next1 = bucket->prev1 = bucket->next2 = bucket->prev2 = bucket;
         Bucket::Destroy(bucket);
         EXPECT_EQ(HeapSpy::lastRelease, bucket);
@@ -139,7 +138,7 @@ TEST_F(RecordTest, TheBucketThatGainedRoomLastIsUsedNext) {
     }
 }
 
-TEST_F(RecordTest, AGroupTakesBackOnlyItsOwn) {
+TEST_F(RecordTest, AGroupTakesBackOnlyItsOwnUntilItDropsAll) {
     BucketMgr pool(nullptr, "pool");
     void* const small = pool.Alloc(4);
     void* const large = pool.Alloc(8);
@@ -149,6 +148,10 @@ TEST_F(RecordTest, AGroupTakesBackOnlyItsOwn) {
     EXPECT_EQ(CheckInvariants(pool), before);
     EXPECT_TRUE(pool.groups[0]->Free(small, pool.FindBucket(small)));
     EXPECT_EQ(CheckInvariants(pool).size(), 1u);
+    Group& group = *pool.groups[1];
+    group.DestroyBuckets();
+    EXPECT_EQ(AllBuckets(group).size() + FreeBuckets(group).size(), 0u);
+    EXPECT_EQ(group.numBuckets + group.numFreeBuckets, 0u);
 }
 
 }  // namespace OBR::MemPool
