@@ -6,6 +6,7 @@
 #include <memory>
 #include <new>
 #include <optional>
+#include <sstream>
 #include <string>
 #include <vector>
 
@@ -70,10 +71,12 @@ TEST_P(Trace, EachEventWritesItsLine) {
 
     std::cout << 10;
     EXPECT_EQ(output.Take(), "0XA#################");
-    std::cout.setstate(std::ios::failbit);
-    pool->Free(pool->Alloc(10));
-    std::cout.clear();
-    EXPECT_EQ(output.Take(), "");
+    for (const auto state : {std::ios::failbit, std::ios::badbit, std::ios::eofbit}) {
+        std::cout.setstate(state);
+        pool->Free(pool->Alloc(10));
+        std::cout.clear();
+        EXPECT_EQ(output.Take(), "");
+    }
 
     pool.reset();
     EXPECT_EQ(output.Take(), Line("d", address) + "\n");
@@ -114,6 +117,25 @@ TEST_P(Trace, AnEventIsAWholeLineOrNoneAndDoesItsWork) {
             EXPECT_EQ(GetNumMgrs(), 0u);
         }
     }
+}
+
+// A buffer of the host's own that has put down a time, and then fails.
+TEST(TraceOfFailures, OnlyTheLineItselfIsTakenBack) {
+    struct : std::stringbuf {
+        std::streamsize xsputn(const char*, std::streamsize) override {
+            return std::stringbuf::xsputn("12:00 ", 6) - 6;
+        }
+        int sync() override {
+            ADD_FAILURE() << "What is to be taken back would be out.";
+            return 0;
+        }
+    } stamping;
+    std::streambuf* const output = std::cout.rdbuf(&stamping);
+    NUV_OBR_MEMPOOL_TRACE(true);
+    { const Mgr pool("stamped"); }
+    NUV_OBR_MEMPOOL_TRACE(false);
+    std::cout.rdbuf(output);
+    EXPECT_EQ(stamping.str(), "12:00 12:00 ");
 }
 
 // A pool enters the registry behind its "c:" line and leaves it ahead of its "d:" line. A block is

@@ -41,27 +41,24 @@ public:
     }
 };
 
+// Past the stream's insertions, which heed its width and its locale and may throw. A stream that
+// the host has marked as failed takes no line, as it takes no other output.
+//
 // A buffer that has to grow for a line and cannot (that of a string stream without memory) has
 // filled the room there was. That beginning is taken back, or the next line would stand glued to
 // it.
-bool Put(std::streambuf& buf, std::string_view line) {
-    const Buffer::Extent before = Buffer::ExtentOf(buf);
-    const auto size = static_cast<std::streamsize>(line.size());
-    try {
-        if (buf.sputn(line.data(), size) == size) { return true; }
-    } catch (...) {}
-    Buffer::TakeBack(buf, before, line);
-    return false;
-}
-
-// Past the stream's insertions, which heed its width and its locale and may throw. A stream that
-// the host has marked as failed takes no line, as it takes no other output.
 void Write(FixedText& text) noexcept {
     if (!std::cout.good()) { return; }
     std::streambuf& buf = *std::cout.rdbuf();
+    const Buffer::Extent before = Buffer::ExtentOf(buf);
+    const std::string_view line = text.Add("\n").View();
+    const auto size = static_cast<std::streamsize>(line.size());
+    bool isWhole = false;
     try {
-        if (Put(buf, text.Add("\n").View())) { buf.pubsync(); }
+        isWhole = buf.sputn(line.data(), size) == size;
+        if (isWhole) { buf.pubsync(); }
     } catch (...) {}
+    if (!isWhole) { Buffer::TakeBack(buf, before, line); }
 }
 
 }  // namespace
