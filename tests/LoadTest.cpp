@@ -1,7 +1,9 @@
 // The library comes and goes in a process that is not linked to it: it is loaded with a plugin that
-// uses it, unloaded, and its exit step runs while the host still has pools.
+// uses it, unloaded, and its exit step runs while the host still has pools. A second plugin brings
+// a copy of its own.
 
 #include <dlfcn.h>
+#include <malloc.h>
 
 #include <cstdio>
 #include <cstdlib>
@@ -23,7 +25,8 @@ struct Place {
 
 // The plugin, loaded, and the library with it.
 struct Plugin {
-    void* const file = dlopen(PLUGIN, RTLD_NOW);
+    const char* const path = PLUGIN;
+    void* const file = dlopen(path, RTLD_NOW);
     void (*const build)(void*, const char* name) = Find<void(void*, const char*)>("Build");
     void (*const share)(void*, const void*) = Find<void(void*, const void*)>("Share");
     void (*const destroy)(void*) = Find<void(void*)>("Destroy");
@@ -36,22 +39,26 @@ private:
     }
 };
 
-// A leak checker finds what the pools alive hold through `kept`. All else the library must release.
+// A leak checker finds what the pools alive hold through `kept`. All else the library must release,
+// and the loader keeps nothing of it either.
 TEST(Load, LoadingAndUnloadingLeavesNothingBehind) {
     Child::SetEnvironment({{"NUV_OBR_MEMPOOL_ON", "1"}});
     static Place kept[20];
-    for (Place& place : kept) {
+    std::size_t held = 0;
+    for (int round = 0; round < 1000; ++round) {
         const Plugin plugin;
         Place passing;
         plugin.build(&passing, "passing");
-        plugin.build(&place, "kept");
+        if (round < 20) { plugin.build(&kept[round], "kept"); }
         plugin.destroy(&passing);
         void* const library = dlopen(SONAME, RTLD_NOLOAD | RTLD_NOW);
         ASSERT_NE(library, nullptr);
         dlclose(library);
         dlclose(plugin.file);
         ASSERT_EQ(dlopen(SONAME, RTLD_NOLOAD | RTLD_NOW), nullptr);
+        if (round == 30) { held = mallinfo2().uordblks; }
     }
+    EXPECT_EQ(mallinfo2().uordblks, held);
 }
 
 const std::string builtOwn = "xmpt:c:[0-9a-f]+\n";
@@ -113,6 +120,28 @@ TEST(Load, PoolsOutliveTheExitStep) {
                              "4 pools, 4 and 4 handles, with 'first'\n" + destroyed +  //
                              none + destroyed + destroyed + "left alone\n" + built +   //
                              "1 pools, 1 and 1 handles, with 'first'\n" + destroyed + none));
+}
+
+// Each copy has its own names, settings and pools, and one outlives the other.
+TEST(Load, TwoCopiesInAProcessKnowNothingOfEachOther) {
+    const auto run = [] {
+        LoadBehind([] {});
+        const Plugin other{PLUGIN_WITH_ARCHIVE};
+        other.build(&second, "first");
+        plugin->build(&third, "third");
+        other.showPools("third");
+        plugin->showPools("third");
+        plugin->destroy(&first);
+        dlclose(plugin->file);
+        other.showPools("first");
+        other.destroy(&second);
+        std::exit(0);
+    };
+    const std::string two = "2 pools, 2 and 2 handles, with";
+    EXPECT_EXIT(run(), ExitedWithCode(0),
+                MatchesRegex(builtOwn + built + builtOwn + built + built + two +
+                             "out 'third'\n3 pools, 3 and 3 handles, with 'third'\n" + destroyed +
+                             destroyed + two + " 'first'\n" + destroyed + destroyed));
 }
 
 }  // namespace
