@@ -1,11 +1,16 @@
 // Requests that end the process: what stands on standard output, to the character, the exit status,
 // and that the end is an orderly one.
 
+#include <sys/wait.h>
+#include <unistd.h>
+
 #include <MemPool>
 #include <cstdio>
 #include <cstdlib>
 #include <iomanip>
 #include <iostream>
+#include <memory>
+#include <sstream>
 #include <string>
 
 #include <gmock/gmock.h>
@@ -94,20 +99,68 @@ TEST(Process, SettingsThatCannotMakeAPoolStop) {
     }
 }
 
-// The number of a message takes the stream's justification and fill.
+// The number of a message takes the stream's justification and fill. A handler may meet the next
+// message.
 TEST(Process, ExitHandlersAndStaticDestructorsStillRun) {
-    ExpectStop(
-        "ERROR:../s/MemPool:1645*: Duplicate Obr_MemPool::Mgr name encountered 'a'\n"
-        "exit handler\nstatic destroyed\n",
-        [] {
-            static const struct Farewell {
-                ~Farewell() { std::puts("static destroyed"); }
-            } farewell;
-            std::atexit([] { std::puts("exit handler"); });
-            static const Mgr pool("a");
-            std::cout << std::left << std::setfill('*');
-            const Mgr second("a");
+    const std::string message =
+        "ERROR:../s/MemPool:1645*: Duplicate Obr_MemPool::Mgr name encountered 'a'\n";
+    ExpectStop(message + message + "exit handler\nstatic destroyed\n", [] {
+        static const struct Farewell {
+            ~Farewell() { std::puts("static destroyed"); }
+        } farewell;
+        std::atexit([] { std::puts("exit handler"); });
+        static const Mgr pool("a");
+        std::atexit([] { const Mgr third("a"); });
+        std::cout << std::left << std::setfill('*');
+        const Mgr second("a");
+    });
+}
+
+// The host ends while a line of a report is on its way, and its handler prints the report whole.
+TEST(Process, MayEndInsideAReport) {
+    NUV_OBR_MEMPOOL_ON(true);
+    Mgr pool("reported");
+    NUV_OBR_MEMPOOL_ON(false);
+    pool.Alloc(10);
+    std::ostringstream whole;
+    std::streambuf* const screen = std::cout.rdbuf(whole.rdbuf());
+    Dbg();
+    std::cout.rdbuf(screen);
+    const auto run = [] {
+        Child::Capture(Child::Captured::out);
+        static std::streambuf* const output = std::cout.rdbuf();
+        static struct : std::stringbuf {
+            int sync() override { std::exit(3); }
+        } ending;
+        std::atexit([] {
+            std::cout.rdbuf(output);
+            Dbg();
         });
+        std::cout.rdbuf(&ending);
+        Dbg();
+    };
+    EXPECT_EXIT(run(), testing::ExitedWithCode(3), testing::Eq(whole.str()));
+}
+
+// Either process goes on with its own copies of all pools, and no line is written twice.
+TEST(Process, MayForkWithPoolsThatLive) {
+    const auto run = [] {
+        Child::Capture(Child::Captured::out);
+        NUV_OBR_MEMPOOL_TRACE(true);
+        NUV_OBR_MEMPOOL_ON(true);
+        auto pool = std::make_unique<Mgr>("forked");
+        void* const block = pool->Alloc(10);
+        const pid_t child = fork();
+        int status = 0;
+        if (child != 0) { waitpid(child, &status, 0); }
+        if (status != 0 || !pool->Free(block)) { std::exit(1); }
+        pool->Alloc(5000);
+        pool.reset();
+        std::exit(0);
+    };
+    const std::string end = "xmpt:f:[^\n]*\nxmpt:a:[^\n]*:5000\nxmpt:d:[^\n]*\n";
+    EXPECT_EXIT(run(), testing::ExitedWithCode(0),
+                testing::MatchesRegex("xmpt:c:[^\n]*\nxmpt:a:[^\n]*:10\n" + end + end));
 }
 
 TEST(Process, ABrokenAssumptionIsToldWithItsPlace) {

@@ -9,6 +9,9 @@ using OBR::MemPool::Mgr;
 extern Mgr otherPool;
 extern char* const otherBlock;
 
+// Ahead of all statics that name no priority.
+__attribute__((init_priority(102))) static Mgr early("ahead");
+
 static Mgr pool("consumer");
 static char* const block = static_cast<char*>(pool.Alloc(10));
 
@@ -26,8 +29,10 @@ __attribute__((destructor)) static void DestroyLast() {
 int main() {
     OBR::vector<Mgr*> pools;
     OBR::MemPool::GetMgrs(pools);
-    const bool areListed = pools.size == 3 && pools[0] == &pool && pools[1] == last;
-    return areListed && IsRecord(pool, block) && IsRecord(otherPool, otherBlock) &&
+    const bool areListed =
+        pools.size == 4 && pools[0] == &early && pools[1] == &pool && pools[2] == last;
+    return areListed && early.IsEnabled() && IsRecord(pool, block) &&
+                   IsRecord(otherPool, otherBlock) &&
                    IsRecord(*last, static_cast<char*>(last->Alloc(10))) && pool.Free(block)
                ? 0
                : 1;
