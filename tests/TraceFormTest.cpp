@@ -27,7 +27,8 @@ TEST(TraceForm, IsWrittenAsItIsRead) {
 }
 
 TEST(TraceForm, TellsWhatATraceIsCalledAndWhatItSaysOfItself) {
-    Trace::StepReader reader(ReadLines(Lines("@i:program:jq:x\n@c:P\n@n:Q:no\n@n:P:caller\n")),
+    Trace::StepReader reader(ReadLines(Lines("@i:program:jq:x\n@c:P\n@n:Q:no\n@n:P:caller\n") +
+                                       Lines("@a:P:X:1073741823\n")),
                              "t");
     Trace::Step step = {};
     while (reader.Next(step)) {}
