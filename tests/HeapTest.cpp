@@ -17,13 +17,6 @@ namespace OBR::MemPool {
 
 namespace {
 
-struct WalkSettings {
-    std::uint32_t bucketSize;
-    std::uint16_t alignment;
-    std::uint32_t maximum, minimum;
-    bool keepEmptyBuckets, on;
-};
-
 // The walk's heap has the settings of the process. Live blocks are filled as far as they may be.
 class HeapWalkTest : public PoolFixture, public testing::WithParamInterface<WalkSettings> {
 protected:
@@ -123,9 +116,7 @@ protected:
 }  // namespace
 
 TEST_P(HeapWalkTest, KeepsEveryBlock) {
-    const WalkSettings& is = GetParam();
-    Use(is.bucketSize, is.alignment, is.maximum, is.minimum, is.keepEmptyBuckets);
-    Settings::off = !is.on;
+    Use(GetParam());
     heap.emplace();
     const std::size_t arrayBytesIfNew = HeapSpy::arrayBytes;
     for (int step = 0; step < 1500 && !HasFailure(); ++step) {
@@ -138,12 +129,12 @@ TEST_P(HeapWalkTest, KeepsEveryBlock) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Settings, HeapWalkTest,
-                         testing::Values(WalkSettings{4010, 4, 1000, 8, false, true},
-                                         WalkSettings{4010, 4, 1000, 8, false, false},
-                                         WalkSettings{203, 1, 101, 7, true, true},
-                                         WalkSettings{300, 3, 90, 40, false, true},
-                                         WalkSettings{500, 12, 490, 5, true, true},
-                                         WalkSettings{24, 4, 20, 20, false, true}));
+                         testing::Values(WalkSettings{"Defaults", 4010, 4, 1000, 8, false},
+                                         WalkSettings{"Off", 4010, 4, 1000, 8, false, false},
+                                         WalkSettings{"AlignedTo1", 203, 1, 101, 7, true},
+                                         WalkSettings{"AlignedTo3", 300, 3, 90, 40, false},
+                                         WalkSettings{"AlignedTo12", 500, 12, 490, 5, true},
+                                         WalkSettings{"OneRecord", 24, 4, 20, 20, false}));
 
 namespace {
 

@@ -20,13 +20,6 @@ namespace OBR::MemPool {
 
 namespace {
 
-struct WalkSettings {
-    std::uint32_t bucketSize;
-    std::uint16_t alignment;
-    std::uint32_t maximum, minimum;
-    bool keepEmptyBuckets;
-};
-
 class RandomWalkTest : public PoolFixture, public testing::WithParamInterface<WalkSettings> {
 protected:
     struct Block {
@@ -72,11 +65,10 @@ protected:
 }  // namespace
 
 TEST_P(RandomWalkTest, KeepsEveryInvariant) {
-    const WalkSettings& is = GetParam();
-    Use(is.bucketSize, is.alignment, is.maximum, is.minimum, is.keepEmptyBuckets);
+    Use(GetParam());
     BucketMgr pool(nullptr, "pool");
     const std::size_t numLiveIfNew = HeapSpy::numLive;
-    Use(100, 7, 77, 1, !is.keepEmptyBuckets);  // Later settings do not reach the pool.
+    Use(100, 7, 77, 1, !GetParam().keepEmptyBuckets);  // Later settings do not reach the pool.
     Settings::off = true;
     for (int step = 0; step < 1500 && !HasFailure(); ++step) {
         SCOPED_TRACE(step);
@@ -100,13 +92,13 @@ TEST_P(RandomWalkTest, KeepsEveryInvariant) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Settings, RandomWalkTest,
-                         testing::Values(WalkSettings{200, 4, 100, 8, false},
-                                         WalkSettings{200, 4, 100, 8, true},
-                                         WalkSettings{103, 1, 50, 8, false},
-                                         WalkSettings{300, 3, 90, 40, true},
-                                         WalkSettings{500, 32, 490, 64, false},
-                                         WalkSettings{24, 4, 20, 20, false},  // one record each
-                                         WalkSettings{24, 4, 20, 20, true},
-                                         WalkSettings{4010, 16, 19, 4, false}));  // no bucket
+                         testing::Values(WalkSettings{"Small", 200, 4, 100, 8, false},
+                                         WalkSettings{"SmallKept", 200, 4, 100, 8, true},
+                                         WalkSettings{"OddAddresses", 103, 1, 50, 8, false},
+                                         WalkSettings{"AlignedTo3", 300, 3, 90, 40, true},
+                                         WalkSettings{"AlignedTo32", 500, 32, 490, 64, false},
+                                         WalkSettings{"OneRecord", 24, 4, 20, 20, false},
+                                         WalkSettings{"OneRecordKept", 24, 4, 20, 20, true},
+                                         WalkSettings{"NoBucket", 4010, 16, 19, 4, false}));
 
 }  // namespace OBR::MemPool
