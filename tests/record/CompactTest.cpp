@@ -67,6 +67,7 @@ TEST(Compact, HoldsLongTraces) {
         event = {Trace::Kind::Created, random(), random(), random() >> random() % 64, {}, {}};
         for (const auto kind : {Trace::Kind::Created, Trace::Kind::Allocated, Trace::Kind::Freed}) {
             event.kind = kind;
+            if (kind != Trace::Kind::Created && count % 8 != 0) { continue; }
             Trace::AppendLine(lines, event);
         }
     }
@@ -74,13 +75,24 @@ TEST(Compact, HoldsLongTraces) {
     const std::string name(Trace::maxTextSize, 'n');
     event.text = name;
     Trace::AppendLine(lines, event);
-    const std::string file = Compact(lines);
-    EXPECT_TRUE(ReadText(file).lines == lines);
-    EXPECT_LT(file.size() * 3, lines.size());
+    EXPECT_TRUE(ReadText(Compact(lines)).lines == lines);
 
     // What is too long for a text is cut.
     lines.insert(lines.size() - 1, "x");
     EXPECT_EQ(ReadText(Compact(lines)).lines.size(), lines.size() - 1);
+}
+
+TEST(Compact, TakesFewBytesForBlocksThatLieTogether) {
+    std::string file;
+    Trace::CompactWriter writer([&](std::string_view bytes) { file += bytes; });
+    std::mt19937_64 random(1);
+    for (int count = 0; count != 20000; ++count) {
+        const std::uint64_t block = 0x55'0000'1000 + random() % 4096 * 16;
+        writer.Write({Trace::Kind::Allocated, 1, block, random() % 200, {}, {}});
+        writer.Write({Trace::Kind::Freed, 1, block, 0, {}, {}});
+    }
+    writer.Finish();
+    EXPECT_LT(file.size(), 40000 * 3);
 }
 
 // A recorder tells neither the pool of a block that is released, nor who missed its end.

@@ -19,6 +19,12 @@ namespace Record {
 
 namespace {
 
+const char* Pointer(std::uint64_t address) {
+    const char* pointer = nullptr;
+    std::memcpy(&pointer, &address, sizeof(pointer));
+    return pointer;
+}
+
 constexpr std::size_t maxFrames = 48;
 
 // The place of the address in the table, or that where it belongs; the last one if it is full.
@@ -65,9 +71,9 @@ bool IsRuntime(const char* path) {
 // The path of the program's own file, which the loader calls by whatever name it was started.
 void FindPath(const Dl_info& info, char* path, std::size_t size) {
     Dl_info program = {};
-    const auto entry = static_cast<std::uintptr_t>(getauxval(AT_ENTRY));
-    const bool isProgram = dladdr(reinterpret_cast<void*>(entry), &program) != 0 &&
-                           program.dli_fbase == info.dli_fbase;
+    const std::uint64_t entry = getauxval(AT_ENTRY);
+    const bool isProgram =
+        dladdr(Pointer(entry), &program) != 0 && program.dli_fbase == info.dli_fbase;
     const ssize_t found = isProgram ? readlink("/proc/self/exe", path, size - 1) : -1;
     if (found >= 0) {
         path[found] = '\0';
@@ -85,7 +91,7 @@ std::uint32_t FindModule(Channel& channel, const Dl_info& info) {
     for (int tries = 0; channel.modulesLock.exchange(1) != 0; ++tries) {
         if (tries == 1000000) { return 0; }
     }
-    const std::uint32_t number = channel.numModulesUsed.load();
+    const std::uint32_t number = channel.modulesUsed.load();
     std::uint32_t index = 1;
     for (; index <= number; ++index) {
         const Module& module = channel.modules[index];
@@ -95,7 +101,7 @@ std::uint32_t FindModule(Channel& channel, const Dl_info& info) {
         Module& module = channel.modules[index];
         module.base = base;
         std::memcpy(module.path, path, sizeof(path));
-        channel.numModulesUsed.store(index);
+        channel.modulesUsed.store(index);
     }
     channel.modulesLock.store(0);
     return index < numModules ? index : 0;
@@ -113,7 +119,7 @@ bool Enter(Channel& channel, Caller& caller, const Frame& frame, std::uint64_t f
         return state == Caller::Passed;
     }
     Dl_info info = {};
-    const bool isKnown = dladdr(reinterpret_cast<void*>(frame.address - 1), &info) != 0;
+    const bool isKnown = dladdr(Pointer(frame.address - 1), &info) != 0;
     caller.module = isKnown ? FindModule(channel, info) : 0;
     const bool isPassed = isKnown && frameSize != 0 && IsRuntime(info.dli_fname);
     caller.frameSize = frameSize;
@@ -168,8 +174,7 @@ std::uint64_t FindCaller(Channel& channel, const void* returnAddress, const void
             return IndexOf(channel, caller);
         }
         stack += caller.frameSize;
-        std::memcpy(&address, reinterpret_cast<const char*>(stack) - sizeof(address),
-                    sizeof(address));
+        std::memcpy(&address, Pointer(stack) - sizeof(address), sizeof(address));
     }
     return Unwind(channel, first, reinterpret_cast<std::uint64_t>(frame));
 }

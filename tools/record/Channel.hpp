@@ -72,24 +72,24 @@ struct Module {
 constexpr std::size_t numModules = 1024;  // The first stands for code outside of any.
 
 struct Channel {
-    std::uint64_t magic;
+    // Read at every event and seldom written.
+    alignas(64) std::uint64_t magic;
+    std::atomic<std::uint64_t> tail;  // Slots drained.
     By by;
-    std::int32_t pid;        // Of the program, and of no child of it.
-    std::int32_t parentPid;  // Of the process that drains the channel.
-
-    std::atomic<std::uint32_t> isTaken;  // Set by the program's recorder, once.
-    std::atomic<std::uint32_t> numThreads;
-    std::atomic<std::uint32_t> numModulesUsed;
+    std::int32_t pid;                        // Of the program, and of no child of it.
+    std::int32_t parentPid;                  // Of the process that drains the channel.
+    std::atomic<std::uint32_t> isTaken;      // Set by the program's recorder, once.
+    std::atomic<std::uint32_t> tailFutex;    // The low bits of the tail, to wait on.
+    std::atomic<std::uint32_t> numWaiting;   // Threads that do.
+    std::atomic<std::uint32_t> modulesUsed;  // The index of the last one.
     std::atomic<std::uint32_t> modulesLock;
 
-    // A sample of the calls is timed: in the allocator itself, and in the recorder around it.
+    // Written at every event. A sample of the calls is timed: in the allocator itself, and in the
+    // recorder around it.
+    alignas(64) std::atomic<std::uint64_t> head;  // Slots taken.
     std::atomic<std::uint64_t> allocatorTicks;
     std::atomic<std::uint64_t> recorderTicks;
-
-    alignas(64) std::atomic<std::uint64_t> head;  // Slots taken.
-    alignas(64) std::atomic<std::uint64_t> tail;  // Slots drained.
-    std::atomic<std::uint32_t> tailFutex;         // Its low bits, to wait on.
-    std::atomic<std::uint32_t> numWaiting;
+    std::atomic<std::uint32_t> numThreads;
 
     alignas(64) Slot slots[numSlots];
     Caller callers[numCallers];

@@ -19,7 +19,6 @@ namespace Record {
 
 namespace {
 
-Active inactive = {};
 std::atomic<bool> isSearched = false;
 
 // Takes a variable out of the environment.
@@ -40,7 +39,9 @@ void RestoreEnvironment() {
     for (char** place = environ; *place != nullptr;) {
         char* const preloaded = ValueOf(*place, "LD_PRELOAD");
         char* const others = preloaded != nullptr ? std::strchr(preloaded, ':') : nullptr;
-        if (others != nullptr) { std::memmove(preloaded, others + 1, std::strlen(others)); }
+        if (others != nullptr) {
+            std::copy(others + 1, others + std::strlen(others) + 1, preloaded);
+        }
         if (ValueOf(*place, channelVariable) != nullptr || (preloaded != nullptr && !others)) {
             Forget(place);
         } else {
@@ -84,9 +85,6 @@ std::uint64_t TicksOfTimer() {
 std::uint64_t ticksOfTimer = 0;
 
 }  // namespace
-
-Active* active = &inactive;
-thread_local ThreadState threadState = {};
 
 void Attach() {
     if (environ == nullptr || isSearched.exchange(true)) { return; }

@@ -19,7 +19,8 @@ namespace Record {
 struct Active {
     std::atomic<Channel*> channel;
 };
-extern Active* active;
+inline Active inactive = {};
+inline Active* active = &inactive;
 
 struct ThreadState {
     std::uint32_t number;     // From 1 on, in the order of their first events; 0 before that.
@@ -28,7 +29,7 @@ struct ThreadState {
     bool isWarm;  // The last call was timed to warm the caches; the next one counts.
 };
 // In the memory that the loader gives each thread from the start: its first use allocates nothing.
-extern thread_local ThreadState threadState __attribute__((tls_model("initial-exec")));
+inline thread_local ThreadState threadState __attribute__((tls_model("initial-exec"))) = {};
 
 // The channel, or null while nothing is recorded.
 inline Channel* ActiveChannel() {
