@@ -17,7 +17,6 @@ namespace Tool {
 namespace {
 
 using Report::Analysis;
-using Report::BlockSum;
 using Report::Tally;
 
 // 1234567 as 1,234,567.

@@ -160,6 +160,7 @@ void AddFill(Json& json, const Analysis& analysis, const JsonLimits& limits) {
     }
     json["fill"] = {{"event", std::move(events)}, {"num_classes", rows.size()}};
     std::vector<std::pair<std::uint64_t, std::uint32_t>> order;
+    order.reserve(rows.size());
     for (const auto& [number, row] : rows) { order.emplace_back(row.mostBytes, number); }
     std::sort(order.rbegin(), order.rend());
     order.resize(std::min(order.size(), limits.fillRows));
