@@ -278,6 +278,7 @@ TEST(Analysis, KeepsTheCourseOfALongTrace) {
             return true;
         });
         EXPECT_EQ(point.most.heap, heap);
+        EXPECT_EQ(point.most.chunks, heap + 8 * point.most.blocks);
     }
     ASSERT_LE(analysis.fill.size(), Report::FillMap::maxColumns);
     ASSERT_GE(analysis.fill.size(), Report::FillMap::maxColumns / 2 - 1);

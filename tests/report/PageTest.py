@@ -119,7 +119,7 @@ class PageTest(unittest.TestCase):
         self.assertIn("1 × truncated or malformed", self.texts(".banner:not(noscript *)")[-1])
 
         held = self.texts("#held tbody td")
-        for row, key in enumerate(("asked", "pools", "one_pool", "heap")):
+        for row, key in enumerate(("asked", "pools", "one_pool", "heap", "heap_chunks")):
             self.assertEqual(held[4 * row + 1:4 * row + 4], [
                 shown_bytes(peak[key]), shown_percent(peak[key], peak["heap"]),
                 shown_bytes(self.json["most"][key])])
@@ -158,7 +158,7 @@ class PageTest(unittest.TestCase):
             "return document.getElementById('tip').textContent").split("\n")
         point = lines["event"].index(int(tip[0].replace("Event ", "").replace(",", "")))
         self.assertAlmostEqual(lines["event"][point] / self.json["events"], 0.5, delta=0.02)
-        self.assertIn(f"Heap: {shown_bytes(lines['heap'][point])}", tip)
+        self.assertIn(f"Heap: {shown_bytes(lines['heap_chunks'][point])}", tip)
         self.assertIn(f"Blocks: {lines['blocks'][point]:,}", tip)
 
     def test_groups_sort_and_filter(self):

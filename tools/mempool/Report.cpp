@@ -37,7 +37,8 @@ event         An allocation, a release, a Clear, and the begin or the end of a p
 group         What the recording has traced as one pool. Those of one name count as one.
 the peak      The first moment with the most bytes asked for.
 bytes held    Of pools: buckets, heap records and tables. Of the heap: its blocks as it rounds them.
-              Malloc's own 8 bytes a block, and what lies unused between blocks, are left out.
+              Malloc's own headers, 8 bytes a block, are counted in the last line only, and what
+              lies unused between blocks nowhere. Those of records are counted.
 records       The share of blocks that fit into a bucket. The others are heap records.
 padding       Bytes that rounding adds to those.
 short, never  The shares of blocks that are freed within 100 events, and that are not freed until

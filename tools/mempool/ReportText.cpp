@@ -135,10 +135,11 @@ void PrintTotals(std::ostream& out, const Analysis& analysis) {
         const char* label;
         std::uint64_t Report::Moment::*figure;
     };
-    constexpr std::array<Line, 4> lines = {{{"asked for", &Report::Moment::asked},
+    constexpr std::array<Line, 5> lines = {{{"asked for", &Report::Moment::asked},
                                             {"pools, one a group", &Report::Moment::pools},
                                             {"one pool for all", &Report::Moment::onePool},
-                                            {"heap (malloc)", &Report::Moment::heap}}};
+                                            {"heap (malloc)", &Report::Moment::heap},
+                                            {"heap with headers", &Report::Moment::chunks}}};
     Label(out, "BYTES HELD");
     Row(out).Cell("at the peak", 11).Cell("of heap", 10).Cell("most ever", 12);
     for (const Line& line : lines) {

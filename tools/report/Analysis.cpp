@@ -131,8 +131,13 @@ private:
     // What there is to see behind an event.
     void Look() {
         const BlockSum& live = result.total.live;
-        const Moment now = {result.events,     live.bytes,          live.blocks,
-                            pools.BytesHeld(), onePool.BytesHeld(), heapBytes};
+        const Moment now = {result.events,
+                            live.bytes,
+                            live.blocks,
+                            pools.BytesHeld(),
+                            onePool.BytesHeld(),
+                            heapBytes,
+                            heapBytes + mallocHeader * live.blocks};
         timeline.Add(now);
         fill.Add(now.event, pools);
         if (std::tie(now.asked, now.blocks) > std::tie(result.peak.asked, result.peak.blocks)) {
@@ -144,6 +149,7 @@ private:
         most.pools = std::max(most.pools, now.pools);
         most.onePool = std::max(most.onePool, now.onePool);
         most.heap = std::max(most.heap, now.heap);
+        most.chunks = std::max(most.chunks, now.chunks);
     }
 
     void JoinGroups(const std::vector<Trace::Pool>& traced) {

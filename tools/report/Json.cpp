@@ -40,8 +40,9 @@ Json ToJson(const Runs& runs) {
 }
 
 Json ToJson(const Moment& moment) {
-    return {{"event", moment.event}, {"asked", moment.asked},      {"blocks", moment.blocks},
-            {"pools", moment.pools}, {"one_pool", moment.onePool}, {"heap", moment.heap}};
+    return {{"event", moment.event},       {"asked", moment.asked},      {"blocks", moment.blocks},
+            {"pools", moment.pools},       {"one_pool", moment.onePool}, {"heap", moment.heap},
+            {"heap_chunks", moment.chunks}};
 }
 
 // A fact that is nothing but a number is one; a fact that the trace does not tell is null.
@@ -125,7 +126,7 @@ void AddGroups(Json& json, const Analysis& analysis, const JsonLimits& limits) {
 void AddTimeline(Json& json, const Analysis& analysis) {
     Json lines = Json::object();
     for (const char* key :
-         {"event", "asked", "least_asked", "blocks", "pools", "one_pool", "heap"}) {
+         {"event", "asked", "least_asked", "blocks", "pools", "one_pool", "heap", "heap_chunks"}) {
         lines[key] = Json::array();
     }
     for (const Point& point : analysis.timeline) {

@@ -15,6 +15,9 @@ constexpr std::uint64_t MallocBytes(std::uint64_t size) {
     return std::max<std::uint64_t>((size + 8 + 15) / 16 * 16, 32) - 8;
 }
 
+// What each block takes besides.
+constexpr std::uint64_t mallocHeader = 8;
+
 }  // namespace Report
 
 #endif

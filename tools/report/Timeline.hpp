@@ -19,7 +19,8 @@ struct Moment {
     std::uint64_t blocks = 0;   // which are so many.
     std::uint64_t pools = 0;    // Held by pools, one a traced pool,
     std::uint64_t onePool = 0;  // by a single one for all,
-    std::uint64_t heap = 0;     // and lent by the heap.
+    std::uint64_t heap = 0;     // and lent by the heap, without
+    std::uint64_t chunks = 0;   // and with what malloc has of its own ahead of each block.
 };
 
 // The moment of an interval at which most was asked for: no peak is lost.

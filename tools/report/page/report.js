@@ -138,13 +138,13 @@ function heading() {
 function verdict() {
   const peak = data.peak;
   const beside = (held) => {
-    const ratio = peak.heap > 0 ? held / peak.heap - 1 : 0;
+    const ratio = peak.heap > 0 ? held / peak.heap_chunks - 1 : 0;
     return Math.abs(ratio) < 0.03 ? "about as much memory as"
       : (100 * Math.abs(ratio)).toFixed(0) + " % " + (ratio < 0 ? "less memory than" : "more memory than");
   };
   const parts = [tracedPools > 1
-    ? `At the peak a pool for each group would hold ${beside(peak.pools)} the heap, a single pool for all ${beside(peak.one_pool)} it.`
-    : `At the peak pools would hold ${beside(peak.pools)} the heap.`,
+    ? `At the peak a pool for each group would hold ${beside(peak.pools)} the heap with its headers, a single pool for all ${beside(peak.one_pool)} it.`
+    : `At the peak pools would hold ${beside(peak.pools)} the heap with its headers.`,
     `${percent(data.in_records.blocks, data.blocks)} of the blocks fit into a bucket.`];
   if (data.together.clear_runs > 0) {
     parts.push(`${percent(data.together.clear_blocks, data.blocks)} could go with ` +
@@ -161,7 +161,8 @@ function verdict() {
   };
   const ofBlocks = (value) => percent(value, data.blocks);
   tile("Asked for at the peak", "peak.asked", bytes, `in ${count(peak.blocks)} blocks`);
-  tile("Pools hold then", "peak.pools", bytes, `${percent(peak.pools, peak.heap)} of the heap’s ${bytes(peak.heap)}`);
+  tile("Pools hold then", "peak.pools", bytes, `${percent(peak.pools, peak.heap_chunks)} of the heap’s ${bytes(peak.heap_chunks)}, ` +
+    `${percent(peak.pools, peak.heap)} without its headers`);
   tile("Blocks in all", "blocks", count, `of ${bytes(data.bytes)}, ${percent(shortLived(data), data.blocks)} freed within 100 events`);
   tile("Fit into a bucket", "in_records.blocks", ofBlocks, `rounding adds ${percent(data.padding, data.in_records.bytes)} to their bytes`);
   tile("One Clear would free", "together.clear_blocks", ofBlocks, `of the blocks, in ${count(data.together.clear_runs)} rows of frees`);
@@ -182,7 +183,7 @@ function verdict() {
 
 const series = [
   {key: "asked", name: "Asked for, and in grey how far it falls in between", title: "Asked for"},
-  {key: "heap", name: "Heap", title: "Heap"},
+  {key: "heap_chunks", name: "Heap, with its headers", title: "Heap"},
   {key: "pools", name: tracedPools > 1 ? "Pools, one a group" : "Pools", title: tracedPools > 1 ? "Pools, one a group" : "Pools"},
   {key: "one_pool", name: "One pool for all", title: "One pool for all"},
 ].filter((line) => line.key !== "one_pool" || tracedPools > 1);
@@ -193,7 +194,7 @@ function timeline() {
   const box = chart("timeline", 320, {left: 62, right: 10, top: 22, bottom: 42},
     "Live bytes over the trace",
     `Asked for at the peak, event ${count(data.peak.event)}: ${bytes(data.peak.asked)}. ` +
-    `Pools hold ${bytes(data.peak.pools)} then, the heap ${bytes(data.peak.heap)}.`);
+    `Pools hold ${bytes(data.peak.pools)} then, the heap ${bytes(data.peak.heap_chunks)}.`);
   const x = d3.scale.linear().domain([0, data.events]).range([0, box.width]);
   const y = d3.scale.linear().domain([0, highest]).nice().range([box.height, 0]);
   axis(box, y, "left", 5, bytesTick);
@@ -445,7 +446,7 @@ function groupsTable() {
 }
 
 function tables() {
-  const names = {asked: "Asked for", pools: "Pools, one a group", one_pool: "One pool for all", heap: "Heap"};
+  const names = {asked: "Asked for", pools: "Pools, one a group", one_pool: "One pool for all", heap: "Heap", heap_chunks: "Heap, with its headers"};
   table("held", ["", "At the peak", "Of the heap", "Most at any time"], Object.keys(names).map((key) =>
     [names[key], bytes(data.peak[key]), percent(data.peak[key], data.peak.heap), bytes(data.most[key])]));
   const rows = data.sizes.slice().sort((a, b) => b.blocks - a.blocks).slice(0, 40);
