@@ -7,11 +7,24 @@
 
 set(gdbDir ${PROJECT_SOURCE_DIR}/tools/gdb)
 set(gdbLinkName $<TARGET_FILE_NAME:MemPool>-gdb.py)
+set(gdbLibraries "")  # Those that gdb finds its script with, and the folders they are installed in.
+set(gdbLibraryDirs "")
+set(gdbComponents "")
 if(MEMPOOL_IS_SHARED)
-    add_custom_command(TARGET MemPool POST_BUILD
-        COMMAND ${CMAKE_COMMAND} -E create_symlink
-            ${gdbDir}/autoload.py $<TARGET_FILE_DIR:MemPool>/${gdbLinkName})
+    list(APPEND gdbLibraries MemPool)
+    list(APPEND gdbLibraryDirs ${CMAKE_INSTALL_LIBDIR})
+    list(APPEND gdbComponents runtime)
 endif()
+if(MEMPOOL_HAS_CHECKED)
+    list(APPEND gdbLibraries MemPoolChecked)
+    list(APPEND gdbLibraryDirs ${CMAKE_INSTALL_LIBDIR}/${checkedDir})
+    list(APPEND gdbComponents tools)
+endif()
+foreach(library IN LISTS gdbLibraries)
+    add_custom_command(TARGET ${library} POST_BUILD
+        COMMAND ${CMAKE_COMMAND} -E create_symlink
+            ${gdbDir}/autoload.py $<TARGET_FILE_DIR:${library}>/${gdbLinkName})
+endforeach()
 
 if(OBR_MEMPOOL_INSTALL)
     # Two major versions of the library can be installed at once, each with its script.
@@ -22,11 +35,13 @@ if(OBR_MEMPOOL_INSTALL)
 endif()
 if(OBR_MEMPOOL_INSTALL AND MEMPOOL_IS_SHARED)
     # The prefix is known when it is installed. A folder that is given by its whole path stays.
-    install(CODE "
-        set(prefix \"\${CMAKE_INSTALL_PREFIX}\")
-        set(script \"${installedGdbDir}/autoload.py\")
-        set(linkDir \"${CMAKE_INSTALL_LIBDIR}\")
-        set(linkName \"${gdbLinkName}\")
-        include(\"${CMAKE_CURRENT_LIST_DIR}/InstallGdbLink.cmake\")"
-        COMPONENT runtime)
+    foreach(dir component IN ZIP_LISTS gdbLibraryDirs gdbComponents)
+        install(CODE "
+            set(prefix \"\${CMAKE_INSTALL_PREFIX}\")
+            set(script \"${installedGdbDir}/autoload.py\")
+            set(linkDir \"${dir}\")
+            set(linkName \"${gdbLinkName}\")
+            include(\"${CMAKE_CURRENT_LIST_DIR}/InstallGdbLink.cmake\")"
+            COMPONENT ${component})
+    endforeach()
 endif()

@@ -7,6 +7,7 @@
 #include <limits>
 #include <new>
 
+#include "MemPool/Checked.hpp"
 #include "diagnostics/text/Messages.hpp"
 #include "diagnostics/text/Trace.hpp"
 
@@ -87,7 +88,8 @@ Group* BucketMgr::GroupFor(std::uint32_t recSize) {
                dataSize + dataAlignment + recHdrSize <= maxRecordSize) {
             dataSize += dataAlignment;
         }
-        groups[index] = new Group(this, dataSize, bucketSize, keepEmptyBuckets);
+        groups[index] = new Group(this, dataSize, Checked::BucketSize(bucketSize, dataSize),
+                                  Checked::KeepsEmptyBuckets(keepEmptyBuckets));
     }
     return groups[index];
 }

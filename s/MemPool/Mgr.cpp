@@ -10,6 +10,7 @@
 #include <string>
 
 #include "MemPool/BucketMgr.hpp"
+#include "MemPool/Checked.hpp"
 #include "MemPool/MgrRegistry.hpp"
 #include "diagnostics/text/Messages.hpp"
 
@@ -54,6 +55,7 @@ Mgr::~Mgr() {
         registry.ForgetHandle(this);
     }
     if (bucketMgr == nullptr) { return; }
+    Checked::BeforeEnd(*bucketMgr);
     registry.Erase(bucketMgr->name);
     delete bucketMgr;
     bucketMgr = nullptr;
@@ -68,14 +70,15 @@ Mgr& Mgr::operator=(const Mgr& other) {
 }
 
 void* Mgr::Alloc(unsigned int size) {
-    return bucketMgr->Alloc(size);
+    return Checked::Taken(*bucketMgr, bucketMgr->Alloc(size), size);
 }
 
 bool Mgr::Free(void* data) {
-    return bucketMgr->Free(data);
+    return Checked::MayRelease(*bucketMgr, data) && bucketMgr->Free(data);
 }
 
 void Mgr::Clear() {
+    Checked::BeforeClear(*bucketMgr);
     bucketMgr->Clear();
 }
 
@@ -84,11 +87,11 @@ bool Mgr::CollectGarbage() {
 }
 
 bool Mgr::Contains(const void* data) const {
-    return bucketMgr->Contains(data);
+    return Checked::MayAskAbout(*bucketMgr, data) && bucketMgr->Contains(data);
 }
 
 unsigned int Mgr::GetSize(const void* data) const {
-    return bucketMgr->GetSize(data);
+    return Checked::MayAskAbout(*bucketMgr, data) ? bucketMgr->GetSize(data) : 0;
 }
 
 BucketMgr* Mgr::GetBucketMgr() const {

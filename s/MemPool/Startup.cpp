@@ -9,6 +9,7 @@
 
 #include <ios>
 
+#include "MemPool/Checked.hpp"
 #include "MemPool/EnvInit.hpp"
 #include "MemPool/MgrRegistry.hpp"
 #include "MemPool/Settings.hpp"
@@ -43,7 +44,10 @@ OBR_FIRST MgrRegistry registry;
 namespace {
 
 struct ExitStep {
-    ~ExitStep() { registry.ReleaseNodes(); }
+    ~ExitStep() {
+        Checked::AtExit();
+        registry.ReleaseNodes();
+    }
 };
 OBR_FIRST const ExitStep exitStep;
 

@@ -26,6 +26,7 @@ void AddReplay(Program& program);
 void AddReport(Program& program);
 void AddAdvise(Program& program);
 void AddText(Program& program);
+void AddCheck(Program& program);
 
 }  // namespace Tool
 

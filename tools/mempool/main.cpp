@@ -34,6 +34,7 @@ int Run(int argc, char** argv) {
     Tool::AddReport(program);
     Tool::AddAdvise(program);
     Tool::AddText(program);
+    Tool::AddCheck(program);
 
     const std::string first = argc > 1 ? argv[1] : "-";
     const auto isFirst = [&](const CLI::App* sub) { return sub->check_name(first); };

@@ -29,21 +29,7 @@ bool IsFile(const std::string& path) {
     return stat(path.c_str(), &status) == 0 && S_ISREG(status.st_mode);
 }
 
-std::string FindInPath(const std::string& name) {
-    if (name.find('/') != std::string::npos) { return name; }
-    const char* const folders = std::getenv("PATH");
-    std::istringstream list(folders != nullptr ? folders : "/bin:/usr/bin");
-    std::string notExecutable;
-    for (std::string folder; std::getline(list, folder, ':');) {
-        const std::string path = (folder.empty() ? "." : folder) + "/" + name;
-        if (!IsFile(path)) { continue; }
-        if (access(path.c_str(), X_OK) == 0) { return path; }
-        notExecutable = path;
-    }
-    return notExecutable.empty() ? name : notExecutable;
-}
-
-void CheckRights(const std::string& name, const std::string& path) {
+void CheckRights(const std::string& name, const std::string& path, const std::string& done) {
     struct stat status = {};
     if (stat(path.c_str(), &status) != 0) {
         throw Refusal(errno == ENOENT || errno == ENOTDIR ? 127 : 126,
@@ -54,10 +40,10 @@ void CheckRights(const std::string& name, const std::string& path) {
     const bool isOthers = (status.st_mode & S_ISUID) != 0 && status.st_uid != geteuid();
     const bool isOtherGroups = (status.st_mode & S_ISGID) != 0 && status.st_gid != getegid();
     if (isOthers || isOtherGroups) {
-        Refuse(name, "runs with the rights of another user or group: cannot be recorded");
+        Refuse(name, "runs with the rights of another user or group: cannot be " + done);
     }
     if (geteuid() != 0 && getxattr(path.c_str(), "security.capability", nullptr, 0) > 0) {
-        Refuse(name, "runs with capabilities of its own: cannot be recorded");
+        Refuse(name, "runs with capabilities of its own: cannot be " + done);
     }
 }
 
@@ -73,7 +59,7 @@ std::string Interpreter(const std::string& path) {
     return interpreter;
 }
 
-void CheckElf(const std::string& name, const std::string& path) {
+void CheckElf(const std::string& name, const std::string& path, const std::string& done) {
     std::ifstream file(path, std::ios::binary);
     if (!file) { return; }  // It may be executed and not read.
     Elf64_Ehdr header = {};
@@ -84,7 +70,7 @@ void CheckElf(const std::string& name, const std::string& path) {
         .read(reinterpret_cast<char*>(&own), sizeof(own));
     if (!file || header.e_ident[EI_CLASS] != own.e_ident[EI_CLASS] ||
         header.e_machine != own.e_machine) {
-        Refuse(name, "is a program for another kind of machine: cannot be recorded");
+        Refuse(name, "is a program for another kind of machine: cannot be " + done);
     }
     for (unsigned int index = 0; index != header.e_phnum; ++index) {
         Elf64_Phdr segment = {};
@@ -92,23 +78,37 @@ void CheckElf(const std::string& name, const std::string& path) {
         file.read(reinterpret_cast<char*>(&segment), sizeof(segment));
         if (file && segment.p_type == PT_INTERP) { return; }
     }
-    Refuse(name, "is statically linked: cannot be recorded");
+    Refuse(name, "is statically linked: cannot be " + done);
 }
 
 }  // namespace
 
-void CheckProgram(const std::string& name) {
-    std::string path = FindInPath(name);
-    CheckRights(name, path);
+std::string FindProgram(const std::string& name) {
+    if (name.find('/') != std::string::npos) { return name; }
+    const char* const folders = std::getenv("PATH");
+    std::istringstream list(folders != nullptr ? folders : "/bin:/usr/bin");
+    std::string notExecutable;
+    for (std::string folder; std::getline(list, folder, ':');) {
+        std::string path = (folder.empty() ? "." : folder) + "/" + name;
+        if (!IsFile(path)) { continue; }
+        if (access(path.c_str(), X_OK) == 0) { return path; }
+        notExecutable = path;
+    }
+    return notExecutable.empty() ? name : notExecutable;
+}
+
+void CheckProgram(const std::string& name, const std::string& done) {
+    std::string path = FindProgram(name);
+    CheckRights(name, path, done);
     constexpr int mostInterpreters =
         4;  // Of scripts that interpret scripts, as many as the kernel takes.
     for (int depth = 0; depth != mostInterpreters; ++depth) {
         const std::string interpreter = Interpreter(path);
         if (interpreter.empty()) { break; }
         path = interpreter;
-        CheckRights(name + ": " + interpreter, path);
+        CheckRights(std::string(name).append(": ").append(interpreter), path, done);
     }
-    CheckElf(name, path);
+    CheckElf(name, path, done);
 }
 
 }  // namespace Record

@@ -1,4 +1,5 @@
-// The program that is to be recorded: where it is, and whether a recorder can be loaded into it.
+// The program that is to be recorded, or checked: where it is, and whether a library can be loaded
+// into it.
 
 #ifndef OBR_TOOLS_RECORD_COMMAND_HPP
 #define OBR_TOOLS_RECORD_COMMAND_HPP
@@ -20,8 +21,11 @@ private:
     int status;
 };
 
-// Finds the program as a shell does and refuses it if it cannot be recorded.
-void CheckProgram(const std::string& name);
+// The file of a program, found as a shell does: the name itself if there is none.
+std::string FindProgram(const std::string& name);
+
+// Refuses a program that no library can be loaded into, so that it cannot be `done`.
+void CheckProgram(const std::string& name, const std::string& done = "recorded");
 
 }  // namespace Record
 

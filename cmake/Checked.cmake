@@ -1,0 +1,39 @@
+# The checked library, which tells a host its faults: the library's own sources once more, with the
+# watch over each block. It has the same name and the same interface, and lies in a folder of its
+# own, by which a host picks it.
+#
+# A sanitizer's own build leaves it out: it may not be instrumented, since it reads what it keeps a
+# host from.
+
+set(MEMPOOL_HAS_CHECKED OFF)
+if(MEMPOOL_IS_SHARED AND NOT CMAKE_CXX_FLAGS MATCHES "-fsanitize")
+    set(MEMPOOL_HAS_CHECKED ON)
+endif()
+set(checkedDir obrmempool-checked)
+
+if(MEMPOOL_HAS_CHECKED)
+    mempool_objects(MemPoolCheckedObjects
+        ${mempoolSources}
+        s/diagnostics/checked/Blocks.cpp
+        s/diagnostics/checked/Checkers.cpp
+        s/diagnostics/checked/Watch.cpp)
+    target_compile_definitions(MemPoolCheckedObjects PRIVATE OBR_MEMPOOL_CHECKED)
+    find_path(VALGRIND_INCLUDE_DIR valgrind/valgrind.h)
+    if(VALGRIND_INCLUDE_DIR)
+        target_compile_definitions(MemPoolCheckedObjects PRIVATE OBR_KNOWS_VALGRIND)
+    else()
+        message(STATUS "Under Valgrind the checked library tells no stacks without the Debian package valgrind")
+    endif()
+    # A checker's record of where a block was taken goes from frame to frame up to the host.
+    target_compile_options(MemPoolCheckedObjects PRIVATE
+        -fno-omit-frame-pointer -fno-optimize-sibling-calls)
+    mempool_library(MemPoolChecked SHARED MemPoolCheckedObjects)
+    mempool_shared(MemPoolChecked)
+    set_target_properties(MemPoolChecked PROPERTIES
+        LIBRARY_OUTPUT_DIRECTORY ${PROJECT_BINARY_DIR}/${checkedDir})
+    if(OBR_MEMPOOL_INSTALL)
+        install(TARGETS MemPoolChecked
+            LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR}/${checkedDir}
+                COMPONENT tools NAMELINK_SKIP)
+    endif()
+endif()

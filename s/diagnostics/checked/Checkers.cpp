@@ -1,0 +1,68 @@
+#include "diagnostics/checked/Checkers.hpp"
+
+#include <cstdint>
+
+#ifdef OBR_KNOWS_VALGRIND
+#include <valgrind/valgrind.h>
+#endif
+
+#include "diagnostics/text/Text.hpp"
+
+// Null where the host has no AddressSanitizer.
+// NOLINTBEGIN(bugprone-reserved-identifier,readability-identifier-naming)
+#define OBR_IF_THERE __attribute__((weak, visibility("default")))
+extern "C" {
+OBR_IF_THERE void __asan_poison_memory_region(const volatile void* start, std::size_t size);
+OBR_IF_THERE void __asan_unpoison_memory_region(const volatile void* start, std::size_t size);
+OBR_IF_THERE void __asan_describe_address(void* address);
+OBR_IF_THERE void __sanitizer_print_stack_trace();
+}
+// NOLINTEND(bugprone-reserved-identifier,readability-identifier-naming)
+
+namespace OBR::MemPool::Checkers {
+
+namespace {
+
+// AddressSanitizer keeps books on 8 bytes at a time.
+std::size_t WholeGranules(std::size_t size) {
+    return size & ~std::size_t{7};
+}
+
+#ifdef OBR_KNOWS_VALGRIND
+void ValgrindStack() {
+    if (RUNNING_ON_VALGRIND) { VALGRIND_PRINTF_BACKTRACE("found\n"); }
+}
+void ValgrindHistory(const void* address) {
+    const std::string command = "v.info location " + PtrText(address);
+    if (RUNNING_ON_VALGRIND) { VALGRIND_MONITOR_COMMAND(command.c_str()); }
+}
+#else
+void ValgrindStack() {}
+void ValgrindHistory(const void*) {}
+#endif
+
+}  // namespace
+
+void Poison(const void* start, std::size_t size) {
+    if (__asan_poison_memory_region != nullptr) {
+        __asan_poison_memory_region(start, WholeGranules(size));
+    }
+}
+
+void Unpoison(const void* start, std::size_t size) {
+    if (__asan_unpoison_memory_region != nullptr) {
+        __asan_unpoison_memory_region(start, WholeGranules(size));
+    }
+}
+
+void TellStack() {
+    if (__sanitizer_print_stack_trace != nullptr) { __sanitizer_print_stack_trace(); }
+    ValgrindStack();
+}
+
+void TellHistory(const void* address) {
+    if (__asan_describe_address != nullptr) { __asan_describe_address(const_cast<void*>(address)); }
+    ValgrindHistory(address);
+}
+
+}  // namespace OBR::MemPool::Checkers

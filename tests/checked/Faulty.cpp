@@ -1,0 +1,113 @@
+// A host with faults: `Faulty bare|heap FAULT...` makes them one after the other, on bare pools or
+// through the layer, and announces each on standard error. A comment marks the line that a report
+// must name.
+
+#include <cstring>
+#include <iostream>
+#include <string>
+
+#include <MemPool>
+#include <MemPoolHeap>
+
+using namespace OBR::MemPool;
+
+namespace {
+
+struct Bare {
+    Mgr pool;
+    explicit Bare(const char* name) : pool(name) {}
+    volatile char* Take(unsigned int size) { return static_cast<char*>(pool.Alloc(size)); }
+    bool Give(volatile char* block) { return pool.Free(const_cast<char*>(block)); }
+    void Drop() { pool.Clear(); }
+    bool Agrees(volatile char* block) {
+        return pool.Contains(const_cast<char*>(block)) &&
+               pool.GetSize(const_cast<char*>(block)) != 0;
+    }
+};
+
+struct Layered {
+    Heap heap;
+    explicit Layered(const char* name) : heap(name) {}
+    volatile char* Take(unsigned int size) { return static_cast<char*>(heap.Malloc(size)); }
+    bool Give(volatile char* block) { return heap.Free(const_cast<char*>(block)); }
+    void Drop() { heap.FreeAll(); }
+    bool Agrees(volatile char* block) {
+        return heap.UsableSize(const_cast<char*>(block)) != 0 && heap.GetStats().bytesUsed != 0;
+    }
+};
+
+template <typename Pool>
+bool Make(const std::string& fault) {
+    Pool nodes("nodes");
+    Pool others("others");
+    const bool isLarge = fault.find(", large") != std::string::npos;
+    const unsigned int size = isLarge ? 2000 : 24;
+    volatile char* const block = nodes.Take(size);  // taken here
+    const auto is = [&](const char* name) { return fault.find(name) == 0; };
+    if (is("none")) {
+        // Everything that looks at a header, and settings that do not reach these buckets.
+        volatile char* const second = nodes.Take(size);
+        std::memset(const_cast<char*>(block), 1, size);
+        GetMgr("nodes")->DbgDetailed();
+        return nodes.Agrees(second) && nodes.Give(block) && nodes.Give(second) &&
+               !nodes.Give(nullptr);
+    }
+    if (is("read after free")) {
+        nodes.Give(block);
+        return block[3] != 100;  // at: read after free
+    } else if (is("write after free")) {
+        nodes.Give(block);
+        block[3] = 1;  // at: write after free
+    } else if (is("use after clear")) {
+        nodes.Drop();
+        block[3] = 1;  // at: use after clear
+    } else if (is("double free")) {
+        nodes.Give(block);
+        return !nodes.Give(block);  // at: double free
+    } else if (is("wrong pool")) {
+        const bool refused = !others.Give(block);  // at: wrong pool
+        return nodes.Give(block) && refused;
+    } else if (is("inner")) {
+        const bool refused = !nodes.Give(block + 16);  // at: inner
+        return nodes.Give(block) && refused;
+    } else if (is("overrun 100")) {
+        block[size + 99] = 1;  // at: overrun 100
+        return nodes.Give(block);
+    } else if (is("overrun 40")) {
+        block[size + 39] = 1;  // at: overrun 40
+        return nodes.Give(block);
+    } else if (is("overrun 1")) {
+        block[size] = 1;  // at: overrun 1
+        return nodes.Give(block);
+    } else if (is("underrun 100")) {
+        block[-100] = 1;  // at: underrun 100
+        return nodes.Give(block);
+    } else if (is("underrun 40")) {
+        block[-40] = 1;            // at: underrun 40
+        return nodes.Give(block);  // at: release after underrun 40
+    } else if (is("underrun 1")) {
+        block[-1] = 1;      // at: underrun 1
+        nodes.Give(block);  // at: release after underrun 1
+    } else if (is("leak at exit")) {
+        static auto* const kept = new Pool("kept");
+        kept->Take(size);  // at: leak at exit
+        return nodes.Give(block);
+    } else if (!is("leak")) {
+        return false;
+    }
+    return true;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS(true);
+    const bool isBare = argv[1] == std::string("bare");
+    for (int i = 2; i < argc; ++i) {
+        std::cerr << "== " << argv[i] << std::endl;
+        if (!(isBare ? Make<Bare>(argv[i]) : Make<Layered>(argv[i]))) {
+            std::cerr << "wrong answer" << std::endl;
+        }
+    }
+    std::cerr << "== exit" << std::endl;
+}
