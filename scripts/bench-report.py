@@ -168,7 +168,8 @@ def write_moving(path, clients):
     begin, end = "<!-- clients: written by scripts/bench.sh -->", "<!-- /clients -->"
     head, rest = path.read_text().split(begin)
     tail = rest.split(end)[1]
-    lines = ["", "", "Seconds, medians, and the ratio within a round:", ""] + list(client_table(clients))
+    lines = ["", "", "Seconds of processor time, medians, and the ratio within a round:", ""]
+    lines += client_table(clients)
     path.write_text(head + begin + "\n".join(lines).rstrip() + "\n\n" + end + tail)
 
 
