@@ -21,6 +21,7 @@ struct Program {
 
 // One line a subcommand, each in the file of its name; main.cpp calls them in the order of the
 // help.
+void AddRun(Program& program);
 void AddRecord(Program& program);
 void AddReplay(Program& program);
 void AddReport(Program& program);

@@ -29,6 +29,7 @@ int Run(int argc, char** argv) {
         return "mempool: " + std::string(error.what()) + "\nSee '" + asked + " --help'.\n";
     });
 
+    Tool::AddRun(program);
     Tool::AddRecord(program);
     Tool::AddReplay(program);
     Tool::AddReport(program);

@@ -1,0 +1,168 @@
+// mempool run: records a program, then reports on it and advises, all in one.
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdlib>
+#include <exception>
+#include <filesystem>
+#include <fstream>
+#include <iostream>
+#include <memory>
+#include <stdexcept>
+#include <string>
+#include <system_error>
+
+#include "mempool/Command.hpp"
+#include "mempool/Print.hpp"
+#include "mempool/Program.hpp"
+#include "mempool/Progress.hpp"
+#include "mempool/Record.hpp"
+#include "mempool/ReportText.hpp"
+#include "mempool/Sweep.hpp"
+#include "report/Analysis.hpp"
+#include "report/Page.hpp"
+#include "trace/OpenTrace.hpp"
+
+namespace Tool {
+
+namespace {
+
+constexpr const char* description =
+    "Run a program, and tell where its memory is and whether it would gain from pools";
+
+constexpr const char* notes =
+    R"(The program runs as under 'mempool record', its trace goes to a file without a name in TMPDIR or
+/tmp, and behind the program's end comes what 'mempool report' and 'mempool advise' tell of it. All
+that goes to standard error: the program's own output stays as it is, and so does its exit status. If
+recording fails or the page cannot be written the status is 125, 126 or 127, as with 'mempool record'.
+Ctrl-C ends the program, and what was recorded is told; once more ends that too.
+)";
+
+struct Options {
+    Record::Order order;
+    std::string html;
+    unsigned int seconds = 15;
+};
+
+// A file that never has a name for longer than it takes to open it: however this process ends,
+// nothing is left. The recorded program does not inherit it.
+class NamelessFile {
+public:
+    NamelessFile()
+        : name(std::filesystem::temp_directory_path() / "mempool.XXXXXX"),
+          descriptor(mkostemp(name.data(), O_CLOEXEC)) {
+        if (descriptor < 0) { throw std::system_error(errno, std::generic_category(), name); }
+        unlink(name.c_str());
+    }
+    NamelessFile(const NamelessFile&) = delete;
+    NamelessFile& operator=(const NamelessFile&) = delete;
+    ~NamelessFile() { close(descriptor); }
+
+    // A path that this process can open it by.
+    std::string Path() const { return "/proc/self/fd/" + std::to_string(descriptor); }
+
+    // The text of an error with its place in place of that path.
+    std::string Named(std::string error) const {
+        const std::string path = Path();
+        const std::size_t place = error.find(path);
+        if (place != std::string::npos) { error.replace(place, path.size(), name); }
+        return error;
+    }
+
+private:
+    std::string name;
+    const int descriptor;
+};
+
+// Ahead of a run that may take long.
+void CheckPage(const std::string& path) {
+    if (path.empty()) { return; }
+    if (!Report::HasPage()) {
+        throw std::runtime_error(
+            "this program was built without the Debian package libjs-d3 and makes no pages");
+    }
+    const bool isNew = !std::filesystem::exists(path);
+    if (!std::ofstream(path, std::ios::app)) {
+        throw std::system_error(errno, std::generic_category(), path);
+    }
+    if (isNew) { std::filesystem::remove(path); }
+}
+
+void WritePage(const std::string& path, const Report::Analysis& analysis) {
+    std::ofstream file(path, std::ios::binary);
+    file << Report::MakePage(analysis);
+    file.close();
+    if (!file) { throw std::system_error(errno, std::generic_category(), path); }
+}
+
+Trace::StepReader Open(const NamelessFile& trace, const Options& options) {
+    return {Trace::OpenTrace(trace.Path()), options.order.command.front()};
+}
+
+void ReportOn(const NamelessFile& trace, const Options& options) {
+    Trace::StepReader reader = Open(trace, options);
+    const Progress progress("mempool");
+    const Report::Analysis analysis =
+        Report::Analyse(reader, Replay::PoolSettings::OfProcess(),
+                        [&](auto position) { progress.Show("event " + std::to_string(position)); });
+    progress.Clear();
+    std::cerr << '\n';
+    PrintAnalysis(std::cerr, analysis, Extent::Short);
+    if (!options.html.empty()) { WritePage(options.html, analysis); }
+}
+
+void AdviseOn(const NamelessFile& trace, const Options& options) {
+    Trace::StepReader reader = Open(trace, options);
+    const Advice advice = TakeAdvice(reader, options.seconds, Progress("mempool"));
+    std::cerr << '\n';
+    PrintTable(std::cerr, advice, false);
+    std::cerr << '\n';
+    PrintVerdict(std::cerr, advice);
+}
+
+int Run(Options options) {
+    try {
+        CheckPage(options.html);
+        const NamelessFile trace;
+        options.order.tracePath = trace.Path();
+        Record::Outcome outcome;
+        try {
+            outcome = Record::RecordProgram(options.order);
+        } catch (const Record::Refusal& refusal) {
+            std::cerr << "mempool: " << trace.Named(refusal.what()) << '\n';
+            return refusal.Status();
+        }
+        ReportOn(trace, options);
+        try {
+            AdviseOn(trace, options);
+        } catch (const std::exception& error) {
+            std::cerr << "mempool: no advice: " << error.what() << '\n';
+        }
+        return EndLike(outcome);
+    } catch (const std::exception& error) {
+        std::cerr << "mempool: " << error.what() << '\n';
+        return ownFailure;
+    }
+}
+
+}  // namespace
+
+void AddRun(Program& program) {
+    CLI::App& run = *program.commandLine.add_subcommand("run", description);
+    run.footer(notes);
+    AddCommand(program, run);
+    const auto options = std::make_shared<Options>();
+    AddRecordOptions(run, options->order);
+    run.add_option("--html", options->html, "Write the page of the report to FILE too")
+        ->type_name("FILE");
+    AddSeconds(run, options->seconds);
+    run.callback([&program, options] {
+        options->order.command = program.command;
+        if (program.command.empty()) { throw CLI::RequiredError("PROGRAM"); }
+        program.job = [options] { return Run(*options); };
+    });
+}
+
+}  // namespace Tool
