@@ -2,7 +2,7 @@
 
 The host is asked for the library's own report; nothing is called. Damage is written into the live
 host and taken back. Environment: HOST; TEST_DIR to write into; STRIP and LIBRARY for a copy
-of the library without symbols. Where gdb cannot run programs the test is skipped.
+of the library without symbols; CHECKED, the folder of the checked library. Where gdb cannot run programs the test is skipped.
 """
 
 import itertools
@@ -333,6 +333,17 @@ class NextHost(unittest.TestCase):
         run("run")
         with self.assertRaisesRegex(gdb.error, "neither\ndebug information nor a symbol table"):
             run("info mempools")
+        run("kill")
+
+    def test_4_buckets_of_one_record_are_sound_in_the_checked_library(self):
+        if not os.environ["CHECKED"]:
+            self.skipTest("a sanitizer's build has no checked library")
+        run(f"set environment LD_LIBRARY_PATH {os.environ['CHECKED']}")
+        run("run")
+        lines = run("mempool check").splitlines()
+        self.assertEqual([line for line in lines if ": sound, " not in line], [])
+        self.assertIn(f"pool {LETTERS}: sound, 9 used and 0 free records in 9 buckets, 3 heap records",
+                      lines)
         run("kill")
 
 

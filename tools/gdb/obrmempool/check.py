@@ -89,9 +89,11 @@ def check_group(pool, group):
     expected = rec_data_size(pool, group.index)
     require(group.recDataSize == expected, group,
             f"a data size of {group.recDataSize}, not {expected}", name)
-    total = (pool.bucketSize - layout.FIRST_OFFSET) // (expected + layout.REC_HDR.size)
-    require((group.bucketSize, group.totalRecs, group.keepEmptyBuckets)
-            == (pool.bucketSize, total, pool.keepEmptyBuckets), group,
+    rec_size = expected + layout.REC_HDR.size
+    total = (pool.bucketSize - layout.FIRST_OFFSET) // rec_size
+    ordinary = (pool.bucketSize, total, pool.keepEmptyBuckets)
+    checked = (layout.FIRST_OFFSET + rec_size, 1, False)  # The checked library's, for each record.
+    require((group.bucketSize, group.totalRecs, group.keepEmptyBuckets) in (ordinary, checked), group,
             "its buckets are not as the pool's settings have them", name)
 
     buckets = []
