@@ -171,6 +171,9 @@ TEST(Record, RefusesWhatCannotBeRecorded) {
               "See 'mempool record --help'.\n");
     EXPECT_EQ(refused("-o trace " STATIC_HOST, 126),
               "mempool: " STATIC_HOST ": is statically linked: cannot be recorded\n");
+    // What fails on the way is told behind the program's end, which does not notice.
+    EXPECT_THAT(refused("-o >(head -c 9 >/dev/null) sh -c 'sleep 0.2; echo on'", 125),
+                ContainsRegex("^on\nmempool: /dev/fd/[0-9]*: Broken pipe\n$"));
     if (geteuid() == 0) {
         Shell::Output("cp " HOST " other && chown 12345 other && chmod u+s other");
         EXPECT_EQ(refused("-o trace ./other", 126),

@@ -128,7 +128,14 @@ public:
     }
     Signals(const Signals&) = delete;
     Signals& operator=(const Signals&) = delete;
-    ~Signals() { Restore(); }
+    ~Signals() {
+        // The write that failed is told as such.
+        sigset_t broken = {};
+        sigaddset(&broken, SIGPIPE);
+        const timespec atOnce = {};
+        sigtimedwait(&broken, nullptr, &atOnce);
+        Restore();
+    }
 
     void Restore() const { sigprocmask(SIG_SETMASK, &former, nullptr); }
 
@@ -296,6 +303,7 @@ void Follow(pid_t program, Collector& collector, Trace::CompactWriter& writer,
 Outcome RecordProgram(const Order& order) {
     CheckProgram(order.command.front());
     const std::string recorder = FindRecorder(order.pools);
+    const Signals signals;
     TraceFile file(order.tracePath);
     Trace::CompactWriter writer([&](std::string_view bytes) { file.Write(bytes); });
     WriteStart(writer, order);
@@ -306,7 +314,6 @@ Outcome RecordProgram(const Order& order) {
     channel->by = order.by;
     Collector collector(*channel, writer);
     if (!order.pools) { writer.WriteOwned(); }
-    const Signals signals;
     const TickRate rate;
     const pid_t program = Start(order, channel, recorder, signals);
     Follow(program, collector, writer, signals);
