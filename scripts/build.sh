@@ -21,3 +21,7 @@ build() {
     fi
     rm -f "$log"
 }
+
+# The targets whose tests are the library's own, without those of examples and tools.
+# shellcheck disable=SC2034  # Used by those who source this.
+coreTests=({Record,Pool,Mgr,RandomWalk,Trace,Report,Heap,HeapContainer,Vector,Process,Settings,Load,PoolsCorpus}Test StaticHost)

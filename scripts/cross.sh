@@ -11,7 +11,7 @@ presets=("$@")
 [ ${#presets[@]} -gt 0 ] || presets=(aarch64 riscv64)
 options=(-DOBR_MEMPOOL_TESTS=ON)
 for preset in "${presets[@]}"; do
-    build "$preset" {Record,Pool,Mgr,RandomWalk,Trace,Report,Heap,HeapContainer,Vector,Process,Settings,Load,PoolsCorpus}Test StaticHost
+    build "$preset" "${coreTests[@]}"
     step "Test preset $preset"
     ctest --preset "$preset" --quiet --output-log "build/$preset/tests.log" || {
         cat "build/$preset/tests.log"
