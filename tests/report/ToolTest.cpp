@@ -110,9 +110,12 @@ TEST(Report, IsAPageUnlessAllIsAskedFor) {
 // Names are text in the page, and its data end where they should.
 TEST(Report, WritesAPage) {
     std::ofstream(Path("small")) << trace;
+    if (HAS_PAGE == 0) {
+        EXPECT_THAT(Tool("--html page.html small", 1), HasSubstr("Debian package libjs-d3"));
+        return;
+    }
     const std::string text = Tool("--html page.html small");
     const std::string page = Bytes(Path("page.html"));
-    if (page.empty()) { GTEST_SKIP() << text; }
     ExpectFile(text, "report.txt");
     EXPECT_EQ(Tool("--html - small"), page);
     const std::string start = "<script type=\"application/json\" id=\"data\">";

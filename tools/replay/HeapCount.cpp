@@ -32,6 +32,12 @@ void* Lend(std::size_t size) {
     return block;
 }
 
+void* LendOrNull(std::size_t size) noexcept {
+    try {
+        return Lend(size);
+    } catch (const std::bad_alloc&) { return nullptr; }
+}
+
 void TakeBack(void* block) noexcept {
     if (counting && block != nullptr) { heldBytes -= Taken(block); }
     std::free(block);
@@ -44,6 +50,13 @@ void* operator new(std::size_t size) {
 }
 void* operator new[](std::size_t size) {
     return Lend(size);
+}
+// Of the C++ library these two may call their own malloc, and a sanitizer's do.
+void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
+    return LendOrNull(size);
+}
+void* operator new[](std::size_t size, const std::nothrow_t&) noexcept {
+    return LendOrNull(size);
 }
 void operator delete(void* block) noexcept {
     TakeBack(block);
