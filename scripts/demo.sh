@@ -1,10 +1,12 @@
 #!/usr/bin/env bash
 # Builds the library and shows what its first host, WordPools, gains from it. With pools on and off,
 # in turns, WordPools counts the words of the files given, or of a text that is made of those on
-# this machine; in the end both stand side by side.
+# this machine; then both stand side by side. In the end `mempool run` tells of a program that knows
+# nothing of pools, Perl, whether it would gain from them.
 #
 # DEMO_MEGABYTES (100) is the size of the text, DEMO_ROUNDS (5) how often each side runs, DEMO_FOLDER
-# (build/demo) where the text and the report go, DEMO_PROGRAM a WordPools that is built already.
+# (build/demo) where the text and the report go. DEMO_PROGRAM is a WordPools that is built already and
+# DEMO_MEMPOOL a mempool: with the first alone, the end is left out.
 if [[ ${1:-} == -h || ${1:-} == --help ]]; then
     echo "usage: scripts/demo.sh [FILE...]   (- is the standard input)"
     exit
@@ -64,12 +66,13 @@ for file in "$@"; do
 done
 if [ $# -gt 0 ] && [ ${#files[@]} -eq 0 ]; then exit 1; fi
 
-program=${DEMO_PROGRAM:-}
+program=${DEMO_PROGRAM:-} mempool=${DEMO_MEMPOOL:-}
 if [ -z "$program" ]; then
     step "Packages"
-    scripts/install-packages.sh build
-    build release WordPools
+    scripts/install-packages.sh build tools
+    build release WordPools mempool mempool-record
     program=build/release/examples/WordPools
+    mempool=build/release/tools/mempool/mempool
 fi
 if [ $# -eq 0 ]; then
     make_text
@@ -97,4 +100,12 @@ done
 
 step "Medians of $rounds rounds; about the same is what the runs do not agree on"
 awk -f scripts/demo-table.awk "$scratch/figures"
+
+if [ -n "$mempool" ]; then
+    step "mempool run perl: the distinct words again, by a program that knows nothing of pools"
+    cat -- "${files[@]}" | head --bytes=3000000 >"$scratch/start" || true
+    # shellcheck disable=SC2016  # The variables are Perl's.
+    "$mempool" run --seconds 10 perl -ne '$n{$_}++ for split; END { print keys(%n) . " words\n" }' \
+        "$scratch/start" 2>&1
+fi
 exit $status
