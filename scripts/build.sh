@@ -24,4 +24,4 @@ build() {
 
 # The targets whose tests are the library's own, without those of examples and tools.
 # shellcheck disable=SC2034  # Used by those who source this.
-coreTests=({Record,Pool,Mgr,RandomWalk,Trace,Report,Heap,HeapContainer,Vector,Process,Settings,Load,PoolsCorpus}Test StaticHost)
+coreTests=({Record,Pool,Mgr,Trace,Report,Heap,HeapContainer,Vector,Process,Settings,Load,PoolsCorpus}Test StaticHost)

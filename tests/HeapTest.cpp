@@ -17,127 +17,6 @@ namespace OBR::MemPool {
 
 namespace {
 
-// The walk's heap has the settings of the process. Live blocks are filled as far as they may be.
-class HeapWalkTest : public PoolFixture, public testing::WithParamInterface<WalkSettings> {
-protected:
-    struct Block {
-        std::uint32_t size, alignment;
-        std::size_t usable;
-        std::uint8_t fill;
-    };
-    using Live = std::map<std::uint8_t*, Block>;
-
-    std::uint32_t Below(std::size_t n) { return static_cast<std::uint32_t>(random() % n); }
-
-    // Runs `request`, for a block that takes the place of `old` if that is one.
-    template <typename Request>
-    void Take(std::uint32_t size, std::uint32_t alignment, Live::iterator old, Request request) {
-        std::uint8_t* data = nullptr;
-        const auto take = [&] {
-            data = static_cast<std::uint8_t*>(request());
-            if (data == nullptr) { throw std::bad_alloc(); }
-        };
-        if (HeapSpy::FailsAt(Below(6) == 0 ? Below(2) : SIZE_MAX - 1, take)) { return; }
-        Block block{size, alignment, heap->UsableSize(data), static_cast<std::uint8_t>(Below(256))};
-        if (old != live.end()) {
-            const Block& was = old->second;
-            const auto kept = std::min<std::size_t>(size, was.usable);
-            EXPECT_EQ(std::count(data, data + kept, was.fill), kept);
-            EXPECT_EQ(data == old->first, size <= was.usable);
-            if (data == old->first) {
-                std::tie(block.size, block.alignment) = std::tie(was.size, was.alignment);
-            }
-            live.erase(old);
-        }
-        ASSERT_GE(block.usable, size);
-        std::memset(data, block.fill, block.usable);
-        ASSERT_TRUE(live.emplace(data, block).second);
-    }
-
-    void Step() {
-        const std::uint32_t bounds[] = {40, GetParam().maximum + 20, 3 * GetParam().maximum};
-        const std::uint32_t size = Below(bounds[Below(3)]);
-        const std::uint32_t alignment = 1u << Below(13);
-        const auto one = std::next(live.begin(), live.empty() ? 0 : Below(live.size()));
-        const std::uint32_t event = Below(100);
-        if (event == 0) {
-            heap->FreeAll();
-            live.clear();
-        } else if (event < 20) {
-            Take(size, 8, live.end(), [&] { return heap->Malloc(size); });
-        } else if (event < 40) {
-            Take(size, alignment, live.end(), [&] { return heap->Allocate(size, alignment); });
-        } else if (event < 50) {
-            Take(size * 3, 8, live.end(), [&] {
-                auto* const data = static_cast<std::uint8_t*>(heap->Calloc(3, size));
-                EXPECT_TRUE(data == nullptr || std::count(data, data + size * 3, 0) == 3L * size);
-                return data;
-            });
-        } else if (event < 70 && size != 0 && one != live.end()) {
-            Take(size, 8, one, [&] { return heap->Realloc(one->first, size); });
-        } else if (event >= 70 && one != live.end()) {
-            const auto [data, block] = *one;
-            live.erase(one);
-            EXPECT_EQ(std::count(data, data + block.usable, block.fill), block.usable);
-            EXPECT_TRUE(heap->Free(data));
-        }
-    }
-
-    // The figures are those of the blocks and of what was asked of the heap below. In a heap that
-    // is on, each block is the end of data of the pool's, which are no more than it takes.
-    void Check(std::size_t arrayBytesIfNew) {
-        const BucketMgr& pool = *heap->GetMgr().GetBucketMgr();
-        const Blocks data = CheckInvariants(pool);
-        ASSERT_EQ(data.size(), pool.enabled ? live.size() : 0);
-        std::size_t bytes = 0;
-        auto at = data.begin();
-        for (const auto& [start, block] : live) {
-            EXPECT_EQ(reinterpret_cast<std::uintptr_t>(start) % block.alignment, 0);
-            EXPECT_EQ(heap->UsableSize(start), block.usable);
-            bytes += pool.enabled ? at->second : std::max(block.size, 1u);
-            if (!pool.enabled) { continue; }
-            EXPECT_TRUE(at->first <= start && start + block.usable == at->first + at->second);
-            const std::uint32_t most =
-                block.alignment < 8 ? block.size : RoundUp(block.size, 8) + block.alignment - 4;
-            EXPECT_LE(at++->second, std::max(RoundUp(most, pool.dataAlignment),
-                                             pool.minRecordSize + pool.dataAlignment));
-        }
-        const HeapStats stats = heap->GetStats();
-        EXPECT_EQ(stats.usedRecords + stats.heapRecords, live.size());
-        EXPECT_EQ(stats.bytesUsed, bytes);
-        EXPECT_EQ(stats.bytesHeld, HeapSpy::arrayBytes - arrayBytesIfNew);
-    }
-
-    std::mt19937 random{4};
-    std::optional<Heap> heap;
-    Live live;
-};
-
-}  // namespace
-
-TEST_P(HeapWalkTest, KeepsEveryBlock) {
-    Use(GetParam());
-    heap.emplace();
-    const std::size_t arrayBytesIfNew = HeapSpy::arrayBytes;
-    for (int step = 0; step < 1500 && !HasFailure(); ++step) {
-        SCOPED_TRACE(step);
-        Step();
-        Check(arrayBytesIfNew);
-    }
-    heap.reset();
-    EXPECT_LT(HeapSpy::arrayBytes, arrayBytesIfNew);
-}
-
-INSTANTIATE_TEST_SUITE_P(Settings, HeapWalkTest,
-                         testing::Values(WalkSettings{"Defaults", 4010, 4, 1000, 8, false},
-                                         WalkSettings{"Off", 4010, 4, 1000, 8, false, false},
-                                         WalkSettings{"AlignedTo1", 203, 1, 101, 7, true},
-                                         WalkSettings{"AlignedTo3", 300, 3, 90, 40, false},
-                                         WalkSettings{"AlignedTo12", 500, 12, 490, 5, true},
-                                         WalkSettings{"OneRecord", 24, 4, 20, 20, false}));
-
-namespace {
-
 class HeapTest : public PoolFixture {};
 
 std::size_t NumBlocks(const Heap& heap) {
@@ -184,6 +63,20 @@ TEST_F(HeapTest, CountsWhatTheReportCounts) {
         const std::size_t number = report.str().find(label) + label.size();
         EXPECT_EQ(std::stoul(report.str().substr(number)), figure) << label;
         EXPECT_NE(figure, 0) << label;
+    }
+}
+
+TEST_F(HeapTest, TellsWhatItHoldsOfTheHeapBelow) {
+    for (const bool off : {false, true}) {
+        Settings::off = off;
+        Heap heap;
+        const std::size_t bytesIfNew = HeapSpy::arrayBytes;
+        for (const std::size_t alignment : {1u, 8u, 64u}) {
+            for (const std::size_t size : {0u, 10u, 2000u}) {
+                heap.Allocate(size, alignment);
+                EXPECT_EQ(heap.GetStats().bytesHeld, HeapSpy::arrayBytes - bytesIfNew);
+            }
+        }
     }
 }
 

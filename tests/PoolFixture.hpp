@@ -22,20 +22,6 @@
 
 namespace OBR::MemPool {
 
-// Settings of a walk, by a name under which its test is listed.
-struct WalkSettings {
-    const char* name;
-    std::uint32_t bucketSize;
-    std::uint16_t alignment;
-    std::uint32_t maximum, minimum;
-    bool keepEmptyBuckets;
-    bool on = true;
-
-    friend std::ostream& operator<<(std::ostream& stream, const WalkSettings& is) {
-        return stream << is.name;
-    }
-};
-
 class PoolFixture : public testing::Test {
 protected:
     PoolFixture() { Use(4010, 4, 1000, 8); }
@@ -56,10 +42,6 @@ protected:
         Settings::minRecordSize = minRecordSize;
         Settings::keepEmptyBuckets = keepEmptyBuckets;
         Settings::off = false;
-    }
-    static void Use(const WalkSettings& is) {
-        Use(is.bucketSize, is.alignment, is.maximum, is.minimum, is.keepEmptyBuckets);
-        Settings::off = !is.on;
     }
 
 private:

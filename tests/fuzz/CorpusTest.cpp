@@ -34,7 +34,7 @@ TEST(Corpus, HasNoFindings) {
 TEST(Corpus, IsNotAllThatHolds) {
     std::mt19937 random(7);
     for (int round = 0; round < 200 && !HasFailure(); ++round) {
-        std::vector<char> input(random() % 600);
+        std::vector<char> input(random() % (round % 10 == 0 ? 20000 : 600));
         for (char& byte : input) { byte = static_cast<char>(random()); }
         Try(input);
     }
