@@ -44,6 +44,7 @@ set(CPACK_DEBIAN_DEV_PACKAGE_DEPENDS "${runtimePackage} (= ${packageVersion})")
 set(CPACK_DEBIAN_TOOLS_PACKAGE_DEPENDS "${runtimePackage} (= ${packageVersion})")
 set(CPACK_DEBIAN_DEV_PACKAGE_SUGGESTS mempool-tools)
 set(CPACK_DEBIAN_RUNTIME_PACKAGE_SUGGESTS gdb)
+set(CPACK_DEBIAN_TOOLS_PACKAGE_SUGGESTS "gdb, valgrind")
 
 # What other packages that link the library depend on, and that the loader is to look again. A change
 # of what is exported since then raises the version here.
@@ -72,7 +73,8 @@ string(JOIN "\n" CPACK_DEBIAN_DEV_DESCRIPTION
     "both libraries.")
 string(JOIN "\n" CPACK_DEBIAN_TOOLS_DESCRIPTION
     "tools for programs and their memory pools"
-    "${about}This package has mempool, which tells from the trace of a program what pools"
-    "do, or would do, for it.")
+    "${about}This package has mempool, which records the allocations of any program and"
+    "tells what pools do, or would do, for it; and the checked library, on which it"
+    "runs a program to find its faults.")
 
 include(CPack)

@@ -52,6 +52,19 @@ mempool text FirstPool.trace | grep -q "^xmpt:a:.*:5024$"
 mempool report FirstPool.trace >report.txt
 echo "mempool records FirstPool, reports on it, and replays its own trace"
 
+cat >Leak.cpp <<'END'
+#include <MemPool>
+int main() {
+    OBR::MemPool::Mgr pool("leaky");
+    pool.Alloc(10);
+}
+END
+# shellcheck disable=SC2046
+g++ -o Leak Leak.cpp $(pkg-config --cflags --libs ObrMemPool)
+mempool check --with nothing ./Leak 2>check.txt
+grep -qx "mempool: pool leaky: 1 block, 10 bytes never freed" check.txt
+echo "mempool check finds a leak by the checked library"
+
 [ "${2:-}" != unpacked ] || exit 0
 # The command comes with the library, and finds the pool by the library's symbol table.
 gdb -batch -nx -ex "break OBR::MemPool::Mgr::Clear" -ex run -ex "info mempools" ./FirstPool \
