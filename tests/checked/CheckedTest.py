@@ -97,7 +97,9 @@ for checker, host in {"nothing": plain, "asan": sanitized, "valgrind": plain}.it
                 at = line_of("at: " + fault.removesuffix(", large"))
                 expect(f"Faulty.cpp:{at}" in told, f"{where} the line", told)
             elif checker != "nothing":
-                expect(not re.search("ERROR: Addr|Invalid write", told), f"{where} no problem", told)
+                # The layer looks for the tag of a block; a pool looks at nothing that is gone.
+                problems = "ERROR: Addr|Invalid write" + ("|Invalid read" if kind == "bare" else "")
+                expect(not re.search(problems, told), f"{where} no problem", told)
             if checker != "nothing" and line and fault != "exit":
                 mark = fault.removesuffix(", large")
                 mark = "release after " + mark if mark.startswith("underrun") else mark

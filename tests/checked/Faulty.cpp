@@ -63,7 +63,7 @@ bool Make(const std::string& fault) {
         block[3] = 1;  // at: use after clear
     } else if (is("double free")) {
         nodes.Give(block);
-        return !nodes.Give(block);  // at: double free
+        return !nodes.Agrees(block) && !nodes.Give(block);  // at: double free
     } else if (is("wrong pool")) {
         const bool refused = !others.Give(block);  // at: wrong pool
         return nodes.Give(block) && refused;
