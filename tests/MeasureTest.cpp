@@ -51,6 +51,10 @@ TEST(Recording, FindsTheFirstOfThePeaksWithTheMostBlocks) {
     EXPECT_EQ(recording.steps.size(), 12U);
 }
 
+TEST(Measure, TakesTheMedian) {
+    EXPECT_EQ(Replay::Median({9, 1, 8, 2, 5}), 5);
+}
+
 // The pools are clocked twice a round, the heap twice more for what it frees at the end of a pool.
 TEST(Measure, ChargesEachSideWithTheTimeOfItsEvents) {
     const Replay::Recording recording = Record("@c:P\n@a:P:X:8\n@x:P\n@a:P:X:8\n@d:P\n");
