@@ -163,7 +163,7 @@ Outcome ForkedMeter::Run(const Side& side, const std::function<double()>& work) 
             std::max(leastLimit, mostOfHeapTime * heapSeconds));
     }
     const auto before = std::chrono::steady_clock::now();
-    const Outcome outcome = InChild(work, limitOfHeap);
+    Outcome outcome = InChild(work, limitOfHeap);
     const std::chrono::duration<double> taken = std::chrono::steady_clock::now() - before;
     heapSeconds = std::max(heapSeconds, taken.count());
     return outcome;
