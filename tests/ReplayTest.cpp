@@ -18,6 +18,7 @@
 #include <gtest/gtest.h>
 
 #include "Child.hpp"
+#include "Folder.hpp"
 #include "TraceLines.hpp"
 
 #if defined(__has_feature)
@@ -30,24 +31,6 @@ using testing::HasSubstr;
 using testing::Not;
 
 namespace {
-
-// A folder of this test run, which goes with it.
-class Folder {
-public:
-    Folder() : path(testing::TempDir() + "ReplayTest.XXXXXX") {
-        if (mkdtemp(path.data()) == nullptr) { std::abort(); }
-    }
-    Folder(const Folder&) = delete;
-    Folder& operator=(const Folder&) = delete;
-    ~Folder() { std::filesystem::remove_all(path); }
-
-    std::string path;
-};
-
-const std::string& FolderPath() {
-    static const Folder folder;
-    return folder.path;
-}
 
 // Writes a file and returns its name.
 std::string File(const std::string& name, const std::string& content, const char* mode = "wbT") {

@@ -13,6 +13,7 @@
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 
+#include "Folder.hpp"
 #include "TraceLines.hpp"
 
 using nlohmann::json;
@@ -31,7 +32,7 @@ std::string Command(const std::string& command, int exitStatus = 0) {
 }
 
 std::string TraceFile(const std::string& name, const std::string& lines) {
-    const std::string path = testing::TempDir() + "AdviseTest." + name;
+    const std::string path = FolderPath() + "/" + name;
     std::ofstream(path) << Lines(lines);
     return path;
 }
@@ -59,7 +60,7 @@ TEST(Advise, FiguresVerdictAndEnvironmentAgree) {
     EXPECT_EQ(advice["allocation_share"], 0.25);
     const json& heap = advice["heap"];
     const json& settings = advice["settings"];
-    ASSERT_GT(settings.size(), 2U);
+    ASSERT_GE(settings.size(), 2U);
     EXPECT_EQ(heap.size(), 3U);
     const json fastest = settings[advice["fastest"].get<std::size_t>()];
     const json smallest = settings[advice["smallest"].get<std::size_t>()];

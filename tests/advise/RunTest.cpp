@@ -13,6 +13,8 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "Folder.hpp"
+
 using testing::HasSubstr;
 
 namespace {
@@ -30,9 +32,9 @@ std::string Content(const std::string& path) {
 
 // In a folder of its own for traces, which is empty behind the run as it was ahead of it.
 Ended Mempool(const std::string& arguments, const std::string& ahead = "") {
-    const std::string folder = testing::TempDir() + "RunTest.traces";
-    const std::string errors = testing::TempDir() + "RunTest.errors";
-    std::filesystem::create_directories(folder);
+    const std::string folder = FolderPath() + "/traces";
+    const std::string errors = FolderPath() + "/errors";
+    std::filesystem::create_directory(folder);
     const std::string command =
         "export TMPDIR=" + folder + "; " + ahead + " " MEMPOOL " run --seconds 1 " + arguments;
     std::FILE* const tool = popen(("(" + command + ") 2>" + errors).c_str(), "r");
@@ -46,7 +48,7 @@ Ended Mempool(const std::string& arguments, const std::string& ahead = "") {
 }
 
 TEST(Run, TellsBehindAProgramThatRunsAsEver) {
-    const std::string page = testing::TempDir() + "RunTest.html";
+    const std::string page = FolderPath() + "/page.html";
     const Ended sorted =
         Mempool((HAS_PAGE ? "--html " + page : "") + " sort -r", "printf 'a\\nb\\n' |");
     EXPECT_EQ(sorted.status, 0);

@@ -25,7 +25,7 @@ struct Recorded {
 };
 
 Recorded ReadTrace(const std::string& name) {
-    Trace::StepReader reader(Shell::FolderPath() + "/" + name);
+    Trace::StepReader reader(FolderPath() + "/" + name);
     Recorded recorded;
     std::ostringstream story;
     Trace::Step step = {};
@@ -128,8 +128,9 @@ TEST(Record, EstimatesTheShareOfTheAllocations) {
     const auto spin = Record("spin").facts;
     EXPECT_LT(std::stod(spin.at("allocation_share")), 0.05);
     EXPECT_NEAR(std::stod(spin.at("cpu_seconds")), 0.1, 0.03);
-    // Half of the time is the recorder's, which does not count.
-    EXPECT_GT(std::stod(Record("allocate").facts.at("allocation_share")), 0.5);
+    // Half of the time is the recorder's, which does not count. A sanitizer's host does more
+    // beside.
+    EXPECT_GT(std::stod(Record("allocate").facts.at("allocation_share")), 0.25);
 }
 
 TEST(Record, PassesTheProgramOn) {

@@ -6,32 +6,15 @@
 #include <sys/wait.h>
 
 #include <cstdio>
-#include <cstdlib>
-#include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <string>
 
 #include <gtest/gtest.h>
 
+#include "Folder.hpp"
+
 namespace Shell {
-
-class Folder {
-public:
-    Folder() : path(testing::TempDir() + "mempool.XXXXXX") {
-        if (mkdtemp(path.data()) == nullptr) { std::abort(); }
-    }
-    Folder(const Folder&) = delete;
-    Folder& operator=(const Folder&) = delete;
-    ~Folder() { std::filesystem::remove_all(path); }
-
-    std::string path;
-};
-
-inline const std::string& FolderPath() {
-    static const Folder folder;
-    return folder.path;
-}
 
 inline void WriteFile(const std::string& name, const std::string& bytes) {
     std::ofstream(FolderPath() + "/" + name, std::ios::binary) << bytes;

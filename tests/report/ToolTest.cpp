@@ -15,27 +15,15 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "Folder.hpp"
+
 using testing::HasSubstr;
 using testing::Not;
 
 namespace {
 
-// A folder of this test run, which goes with it.
-class Folder {
-public:
-    Folder() : path(testing::TempDir() + "ReportTest.XXXXXX") {
-        if (mkdtemp(path.data()) == nullptr) { std::abort(); }
-    }
-    Folder(const Folder&) = delete;
-    Folder& operator=(const Folder&) = delete;
-    ~Folder() { std::filesystem::remove_all(path); }
-
-    std::string path;
-};
-
 std::string Path(const std::string& name) {
-    static const Folder folder;
-    return folder.path + "/" + name;
+    return FolderPath() + "/" + name;
 }
 
 std::string Bytes(const std::string& path) {

@@ -14,7 +14,8 @@
 namespace {
 
 constexpr const char* description =
-    R"(Tells from the trace of a program's allocations what memory pools would do for it.)";
+    R"(Tells what memory pools do, or would do, for a program: where its memory is, which settings suit it,
+and the faults that it makes with them. 'mempool run PROGRAM' is where to start.)";
 
 int Run(int argc, char** argv) {
     Tool::Program program;
