@@ -70,7 +70,7 @@ auto Key(const PoolSettings& s) {
 
 Advise::Findings Find(MadeMeter& meter, double seconds) {
     std::size_t numTried = 0;
-    const auto findings = Advise::Search(meter, seconds, [&](std::size_t n) { numTried = n; });
+    auto findings = Advise::Search(meter, seconds, [&](std::size_t n) { numTried = n; });
     EXPECT_EQ(numTried, findings.settings.size() + findings.givenUp.size());
     std::set<decltype(Key({}))> tried;
     for (const auto& each : findings.settings) {
