@@ -136,6 +136,11 @@ TEST(Advise, RefusesWhatIsNoTraceAndGoesAsFarAsABrokenOneDoes) {
     const std::string pool = TraceFile("pool", "@c:P\n");
     EXPECT_THAT(Command(MEMPOOL " advise " + pool + " 2>&1", 1),
                 HasSubstr("/pool: no block was allocated\n"));
+    for (const std::string lost : {"advise --seconds 1 ", "replay --rounds 1 "}) {
+        EXPECT_EQ(
+            Command(MEMPOOL " " + lost + TraceFile("lost", Blocks("")) + " 2>&1 >/dev/full", 1),
+            "mempool: standard output cannot be written to\n");
+    }
     const std::string cut =
         "gzip -c " + TraceFile("whole", Blocks("")) + " | head -c 5000 | " MEMPOOL;
     const std::string advice = Command(cut + " advise --json --seconds 1 - 2>&1", 1);

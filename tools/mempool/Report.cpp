@@ -57,11 +57,6 @@ struct Options {
     bool all = false;
 };
 
-void Flush() {
-    std::cout << std::flush;
-    if (!std::cout) { throw std::runtime_error("standard output cannot be written to"); }
-}
-
 void WriteFile(const std::string& path, const std::string& text) {
     std::ofstream file(path, std::ios::binary);
     file << text;
@@ -98,7 +93,6 @@ int WriteReport(Trace::StepReader& reader, const ReportOptions& options) {
 
     if (options.html == "-") {
         std::cout << Report::MakePage(analysis);
-        Flush();
         return WarnOfBrokenTrace(reader);
     }
     if (options.json) {
@@ -108,7 +102,7 @@ int WriteReport(Trace::StepReader& reader, const ReportOptions& options) {
         PrintBadLines(badLines, reader);
         PrintAnalysis(std::cout, analysis, options.extent, badLines.str());
     }
-    Flush();
+    std::cout << std::flush;
     if (!options.html.empty()) { WriteFile(options.html, Report::MakePage(analysis)); }
     return WarnOfBrokenTrace(reader);
 }

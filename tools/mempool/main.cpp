@@ -1,6 +1,7 @@
 // Reads the command line and does what the subcommand asks for.
 
 #include <algorithm>
+#include <cstdio>
 #include <cstdlib>
 #include <exception>
 #include <iostream>
@@ -16,6 +17,20 @@ namespace {
 constexpr const char* description =
     R"(Tells what memory pools do, or would do, for a program: where its memory is, which settings suit it,
 and the faults that it makes with them. 'mempool run PROGRAM' is where to start.)";
+
+// Whether all that went to the standard output has got there, which only a flush can tell. The C
+// streams are asked too: who writes through them does not change the state of the other.
+bool IsOutputWritten() {
+    std::cout.flush();
+    return std::cout.good() && std::ferror(stdout) == 0;
+}
+
+// The status to end with: that of a failure, told in a line, if output is lost.
+int Checked(int status, int failure) {
+    if (IsOutputWritten()) { return status; }
+    std::cerr << "mempool: standard output cannot be written to\n";
+    return failure;
+}
 
 int Run(int argc, char** argv) {
     Tool::Program program;
@@ -49,8 +64,10 @@ int Run(int argc, char** argv) {
     try {
         std::reverse(words.begin(), words.end());  // As the parser takes them.
         app.parse(std::move(words));
-    } catch (const CLI::ParseError& error) { return app.exit(error) == 0 ? EXIT_SUCCESS : failure; }
-    return program.job();
+    } catch (const CLI::ParseError& error) {
+        return Checked(app.exit(error) == 0 ? EXIT_SUCCESS : failure, failure);
+    }
+    return Checked(program.job(), failure);
 }
 
 }  // namespace
