@@ -21,7 +21,7 @@ if(MEMPOOL_HAS_CHECKED)
     find_path(VALGRIND_INCLUDE_DIR valgrind/valgrind.h)
     if(VALGRIND_INCLUDE_DIR)
         target_compile_definitions(MemPoolCheckedObjects PRIVATE OBR_KNOWS_VALGRIND)
-    else()
+    elseif(PROJECT_IS_TOP_LEVEL)
         message(STATUS "Under Valgrind the checked library tells no stacks without the Debian package valgrind")
     endif()
     # A checker's record of where a block was taken goes from frame to frame up to the host.
@@ -35,5 +35,7 @@ if(MEMPOOL_HAS_CHECKED)
         install(TARGETS MemPoolChecked
             LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR}/${checkedDir}
                 COMPONENT tools NAMELINK_SKIP)
+    elseif(NOT PROJECT_IS_TOP_LEVEL)  # A host that has the sources builds it if it asks for it.
+        set_target_properties(MemPoolChecked MemPoolCheckedObjects PROPERTIES EXCLUDE_FROM_ALL ON)
     endif()
 endif()

@@ -206,7 +206,7 @@ def machine():
         ["dpkg-query", "-W", "-f=${Package} ${Version}, ", "libc6", "libmimalloc2.0",
          "libjemalloc2", "libtcmalloc-minimal4", "libboost-dev"],
         capture_output=True, text=True, check=False).stdout.rstrip(", ")
-    return (f"Measured on {cpu}, {cores} cores, {platform.system()} {platform.release()}; "
+    return (f"Measured on {cpu}, {cores} cores, {platform.system()}; "
             f"{compiler}; {packages}.")
 
 

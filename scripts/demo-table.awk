@@ -1,6 +1,7 @@
 # Reads runs, a line each: "on" or "off", then seconds to read, seconds to drop, KiB at the peak.
 # Prints the medians of both sides as a table, and what they say in one sentence. A difference counts
-# where all runs of one side are below all of the other, and where it does not round to nothing.
+# where all runs of one side, two or more, are below all of the other, and where it does not round to
+# nothing.
 
 {
     ++runs[$1]
@@ -29,6 +30,7 @@ function row(field, name, short,    on, off, percent) {
         (off > 0 ? sprintf("%.2f", on / off) : "-")
 
     clause[field] = "about the same " short
+    if (runs["on"] < 2) { return }
     if (percent < 0 && values["on", field, runs["on"]] < values["off", field, 1]) {
         clause[field] = -percent " % less " short
         better = 1

@@ -98,7 +98,11 @@ for ((round = 1; round <= rounds; ++round)); do
     turn=("${turn[1]}" "${turn[0]}")
 done
 
-step "Medians of $rounds rounds; about the same is what the runs do not agree on"
+if [ "$rounds" -gt 1 ]; then
+    step "Medians of $rounds rounds; about the same is what the runs do not agree on"
+else
+    step "One round, which shows no difference that another would bear out"
+fi
 awk -f scripts/demo-table.awk "$scratch/figures"
 
 if [ -n "$mempool" ]; then
