@@ -16,6 +16,7 @@ if(MEMPOOL_HAS_CHECKED)
         ${mempoolSources}
         s/diagnostics/checked/Blocks.cpp
         s/diagnostics/checked/Checkers.cpp
+        s/diagnostics/checked/EndStatus.cpp
         s/diagnostics/checked/Watch.cpp)
     target_compile_definitions(MemPoolCheckedObjects PRIVATE OBR_MEMPOOL_CHECKED)
     find_path(VALGRIND_INCLUDE_DIR valgrind/valgrind.h)

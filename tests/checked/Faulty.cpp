@@ -2,6 +2,11 @@
 // through the layer, and announces each on standard error. A comment marks the line that a report
 // must name.
 
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <iostream>
 #include <string>
@@ -61,6 +66,18 @@ bool Make(const std::string& fault) {
     } else if (is("use after clear")) {
         nodes.Drop();
         block[3] = 1;  // at: use after clear
+    } else if (is("double free, then a child")) {
+        nodes.Give(block);
+        nodes.Give(block);
+        if (fork() == 0) { std::exit(0); }
+        int status = -1;
+        wait(&status);
+        if (status != 0) { std::exit(4); }
+    } else if (is("ends with 3")) {
+        std::exit(3);
+    } else if (is("heap leak")) {
+        static_cast<void>(new int[1000]);
+        return nodes.Give(block);  // NOLINT(clang-analyzer-cplusplus.NewDeleteLeaks)
     } else if (is("double free")) {
         nodes.Give(block);
         return !nodes.Agrees(block) && !nodes.Give(block);  // at: double free
@@ -110,4 +127,5 @@ int main(int argc, char** argv) {
         }
     }
     std::cerr << "== exit" << std::endl;
+    std::fputs("all", stdout);  // Stays in the buffer.
 }

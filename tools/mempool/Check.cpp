@@ -46,7 +46,10 @@ heeded, before the default red zones of 128 bytes in the first. MEMPOOL_ABORT=1 
 abort at a release that it refuses, for a debugger to stand there.
 
 Exit status: the program's, or of the checker where it found something: 1 of AddressSanitizer, 99 of
-Valgrind. 125 if nothing was run, 126 if the program cannot be, 127 if there is none of that name.
+Valgrind. Where only the library told something, 99 in place of 0; MEMPOOL_CHECK_STATUS is another
+number for it, and 0 leaves the program's. It is for ends by exit or of main, and each process that
+the program starts has its own. 125 if nothing was run, 126 if the program cannot be, 127 if there
+is none of that name.
 )";
 
 enum class With { asan, valgrind, nothing };
@@ -112,6 +115,7 @@ void SetEnvironment(const Options& options) {
     }
     Default("NUV_OBR_MEMPOOL_DATA_ALIGNMENT", "1");
     Default("NUV_OBR_MEMPOOL_MIN_RECORD_SIZE", "4");
+    Default("MEMPOOL_CHECK_STATUS", "99");
     // A program may say itself where its libraries are, against which only a preload helps;
     // AddressSanitizer else wants to be the first library.
     Prepend("LD_LIBRARY_PATH", library.parent_path());

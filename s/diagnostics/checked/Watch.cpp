@@ -16,6 +16,7 @@
 #include "MemPool/Checked.hpp"
 #include "diagnostics/checked/Blocks.hpp"
 #include "diagnostics/checked/Checkers.hpp"
+#include "diagnostics/checked/EndStatus.hpp"
 #include "diagnostics/text/Text.hpp"
 #include "diagnostics/text/Trace.hpp"
 
@@ -39,6 +40,7 @@ void Tell(const BucketMgr& pool, const std::string& what) {
     const std::string line = "mempool: pool " + pool.name + ": " + what + "\n";
     std::fputs(line.c_str(), stderr);
     std::fflush(stderr);
+    EndStatus::NoteFault();
 }
 
 // The names of the fields of a header that differ from what they must be, the first ones first.
