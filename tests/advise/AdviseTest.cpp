@@ -54,9 +54,11 @@ TEST(Advise, FiguresVerdictAndEnvironmentAgree) {
 
     std::set<std::string> keys;
     for (const auto& [key, value] : advice.items()) { keys.insert(key); }
-    EXPECT_EQ(keys, (std::set<std::string>{"events", "heap", "settings", "fastest", "smallest",
-                                           "best", "verdict", "environment", "allocation_share"}));
+    EXPECT_EQ(keys, (std::set<std::string>{"events", "events_left_out", "heap", "settings",
+                                           "fastest", "smallest", "advised", "best", "verdict",
+                                           "environment", "allocation_share"}));
     EXPECT_EQ(advice["events"], 6001);
+    EXPECT_EQ(advice["events_left_out"], 0);
     EXPECT_EQ(advice["allocation_share"], 0.25);
     const json& heap = advice["heap"];
     const json& settings = advice["settings"];
@@ -82,6 +84,7 @@ TEST(Advise, FiguresVerdictAndEnvironmentAgree) {
 
     // With the environment that is advised a pool has the settings of one of the rows.
     ASSERT_EQ(advice["environment"].empty(), advice["verdict"] == "none") << advice;
+    ASSERT_EQ(advice["advised"].is_null(), advice["verdict"] == "none") << advice;
     if (advice["verdict"] == "none") { return; }
     std::string variables = "env";
     for (const auto& [name, value] : advice["environment"].items()) {
@@ -101,6 +104,7 @@ TEST(Advise, FiguresVerdictAndEnvironmentAgree) {
             std::to_string(each["min_record_size"].get<unsigned int>()) ==
                 advice["environment"]["NUV_OBR_MEMPOOL_MIN_RECORD_SIZE"]) {
             ++numMatches;
+            EXPECT_EQ(&each, &settings[advice["advised"].get<std::size_t>()]);
             const bool isFaster = each["ns_per_event"] < heap["ns_per_event"];
             const bool isSmaller = each["bytes_held"] < heap["bytes_held"];
             EXPECT_TRUE(advice["verdict"] == "smaller" || isFaster) << advice;

@@ -54,7 +54,7 @@ TEST(Run, TellsBehindAProgramThatRunsAsEver) {
     EXPECT_EQ(sorted.status, 0);
     EXPECT_EQ(sorted.output, "b\na\n");
     for (const char* text : {"   program               sort -r\n", "BYTES HELD", "\n   heap ",
-                             "\nPools would ", "of the program's processor time"}) {
+                             " would ", "of the program's processor time"}) {
         EXPECT_THAT(sorted.errors, HasSubstr(text));
     }
     if (HAS_PAGE) { EXPECT_THAT(Content(page), HasSubstr("</html>")); }

@@ -114,6 +114,11 @@ TEST(Search, KeepsToItsTime) {
     }
 }
 
+TEST(Search, TakesLongTracesWhole) {
+    EXPECT_GE(Advise::MaxSteps(15), 8000000U);
+    EXPECT_GE(Advise::MaxSteps(1), 4000000U);
+}
+
 TEST(Search, GivesUpWhatFails) {
     MadeMeter meter;
     meter.fails = [](const Side& side) { return side && side->keepEmptyBuckets; };

@@ -239,10 +239,11 @@ private:
 
 }  // namespace
 
-// At 20 to 100 nanoseconds an event these are 50 to 250 replays.
+// At 10 to 30 nanoseconds an event these are 30 to 100 replays, which do for a coarse look. Fewer
+// steps would make more replays of what may be another program: its peak tends to come late.
 std::size_t MaxSteps(double seconds) {
-    constexpr double perSecond = 200000;
-    constexpr double least = 1000000;
+    constexpr double perSecond = 1000000;
+    constexpr double least = 4000000;
     return static_cast<std::size_t>(std::max(least, perSecond * seconds));
 }
 

@@ -29,10 +29,14 @@ ns an event   The median of some replays. A time of pools is taken beside those 
               before and after it.
 spread        Between the lower and the upper quartile of the replays. A gain within it is none.
 of heap       The figure divided by that of the heap.
+events        A trace of more than --seconds times 1,000,000 events, at least 4,000,000, is judged by
+              its start. The verdict says so then, and --json how many are left out.
 best          Of the settings that are neither slower nor larger than the heap the one with the least
               time x bytes; of those as good within its spread that with the fewest changes.
 at a price    There is no such gain, but one that is greater than what it costs: time x bytes is less
               than that of the heap.
+advised       What the verdict is about, with the lines to paste: the best, if it gains anything. At
+              a price it is chosen like the best, among those that gain more than they cost.
 the program   What it can win as a whole is bounded by the share of its time that its allocation
               calls take. 'mempool record' estimates that and writes it into the trace.
 
@@ -80,11 +84,13 @@ nlohmann::ordered_json JsonOf(const Advice& advice) {
     ordered_json share;
     if (advice.allocationShare.has_value()) { share = *advice.allocationShare; }
     return {{"events", advice.numEvents},
+            {"events_left_out", advice.numLeftOut},
             {"heap", heap},
             {"settings", settings},
             {"fastest", IndexOrNull(advice.verdict.fastest)},
             {"smallest", IndexOrNull(advice.verdict.smallest)},
             {"best", IndexOrNull(advice.verdict.best)},
+            {"advised", IndexOrNull(advice.verdict.advised)},
             {"verdict", advice.verdict.Name()},
             {"environment", environment},
             {"allocation_share", share}};

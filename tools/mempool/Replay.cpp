@@ -30,8 +30,8 @@ constexpr const char* description =
     "Replay traces of a program through the pools and through the heap, and compare";
 
 constexpr const char* notes =
-    R"(A TRACE is the output of a program that ran with NUV_OBR_MEMPOOL_TRACE=1, plain or compressed by
-gzip. Its lines "xmpt:..." count, all others are passed over.
+    R"(A TRACE is what 'mempool record' has written, or the output of a program that ran with
+NUV_OBR_MEMPOOL_TRACE=1, plain or compressed by gzip. Of text only lines "xmpt:..." count.
 
 Settings without an option here come from the variables NUV_OBR_MEMPOOL_... as ever.
 

@@ -57,6 +57,7 @@ std::string NamesOf(const Advice& advice, std::size_t index) {
     if (verdict.fastest == index) { names += ", fastest"; }
     if (verdict.smallest == index) { names += ", smallest"; }
     if (verdict.best == index) { names += ", best"; }
+    if (verdict.advised == index) { names += ", advised"; }
     if (Advise::NumDifferences(advice.findings.settings[index].settings,
                                Advise::LibraryDefaults()) == 0) {
         names += ", default";
@@ -83,14 +84,34 @@ void PrintGivenUp(std::ostream& out, const Advice& advice) {
     }
 }
 
-// What the settings that are advised do, in a sentence.
-std::string Sentence(const Advice& advice) {
+// Why the program as a whole would not notice what it gains, with the end of a line; or nothing.
+std::string WhyNotNoticed(const Advice& advice, const Figures& pools) {
+    constexpr std::uint64_t few = 1000;
+    constexpr double littleTime = 0.01;
+    if (advice.numEvents < few) {
+        return "The program would not notice: " + std::to_string(advice.numEvents) +
+               " events are few.\n";
+    }
+    if (!advice.allocationShare.has_value() || !advice.verdict.isFaster) { return ""; }
+    const double saved = *advice.allocationShare * (1 - TimeRatio(advice, pools));
+    if (saved >= littleTime) { return ""; }
+    return (advice.verdict.isSmaller ? "The program would notice less memory, but not the time: "
+                                     : "The program would not notice: ") +
+           ("pools would save " + Percent(saved) + " of its time.\n");
+}
+
+// What the settings that are advised do.
+std::string Sentences(const Advice& advice) {
     const Figures& heap = advice.findings.heap;
     const Figures& pools = advice.findings.settings[*advice.verdict.advised].figures;
     const bool isPaid = pools.nsPerEvent > heap.nsPerEvent || pools.bytesHeld > heap.bytesHeld;
-    std::string text = "Pools would help";
-    if (isPaid) { text += ", at a price"; }
-    text += ": they take " + Fixed(TimeRatio(advice, pools), 2) + " of the heap's time";
+    std::string text = WhyNotNoticed(advice, pools);
+    if (text.empty()) {
+        text = isPaid ? "Pools would help, at a price: they take " : "Pools would help: they take ";
+    } else {
+        text += "By themselves they take ";
+    }
+    text += Fixed(TimeRatio(advice, pools), 2) + " of the heap's time";
     if (!Advise::TimesDiffer(pools, heap)) { text += " (the same, within the spread of the runs)"; }
     return text + " and\n" + Fixed(BytesRatio(advice, pools), 2) +
            " of its bytes with these settings.";
@@ -161,8 +182,7 @@ void PrintTable(std::ostream& out, const Advice& advice, bool all) {
 
     out << "   Events: " << advice.numEvents;
     if (advice.numLeftOut != 0) {
-        out << ", the first of " << advice.numEvents + advice.numLeftOut
-            << "; a longer search looks at more";
+        out << ", the first of " << advice.numEvents + advice.numLeftOut;
     }
     out << "\n   bucket     max     min  align  empty       ns an              of        bytes     "
            " of"
@@ -184,6 +204,12 @@ void PrintTable(std::ostream& out, const Advice& advice, bool all) {
 }
 
 void PrintVerdict(std::ostream& out, const Advice& advice) {
+    if (advice.numLeftOut != 0) {
+        out << "Judged by its start alone: " << advice.numLeftOut << " of "
+            << advice.numEvents + advice.numLeftOut
+            << " events were left out, the peak perhaps among\nthem. With more --seconds fewer "
+               "are.\n";
+    }
     if (!advice.verdict.advised.has_value()) {
         out << "Pools would not help: none of the settings gains anything that is more than the "
                "spread "
@@ -192,7 +218,7 @@ void PrintVerdict(std::ostream& out, const Advice& advice) {
         return;
     }
     const Measured& advised = advice.findings.settings[*advice.verdict.advised];
-    out << Sentence(advice) << '\n';
+    out << Sentences(advice) << '\n';
     PrintShare(out, advice, TimeRatio(advice, advised.figures));
     out << "\n";
     for (const auto& [name, value] : Advise::EnvironmentOf(advised.settings)) {
