@@ -18,7 +18,7 @@ Input::Input(std::unique_ptr<ByteSource> byteSource)
     : source(std::move(byteSource)), buffer(blockSize) {}
 
 bool Input::ReadMore() {
-    std::memmove(buffer.data(), buffer.data() + first, last - first);
+    if (first != 0) { std::memmove(buffer.data(), buffer.data() + first, last - first); }
     last -= first;
     first = 0;
     if (last == buffer.size()) { buffer.resize(2 * buffer.size()); }

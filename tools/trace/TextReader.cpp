@@ -12,6 +12,9 @@ namespace Trace {
 
 namespace {
 
+// Of a line, from its mark on; a longer one is malformed.
+constexpr std::size_t maxSize = std::size_t{1} << 20;
+
 // The fields of a line, taken from the front. Once one is missing, the line is malformed.
 class Fields {
 public:
@@ -100,32 +103,52 @@ bool TextReader::Next(Event& event) {
     std::string_view line;
     while (NextLine(line)) {
         const std::size_t start = line.find(mark);
-        if (start == std::string_view::npos) { continue; }
-        Parse(line.substr(start + mark.size()), event);
+        if (start == std::string_view::npos && !isTooLong) { continue; }
+        if (isTooLong || line.size() - start > maxSize) {
+            event.kind = Kind::Malformed;
+        } else {
+            Parse(line.substr(start + mark.size()), event);
+        }
         return true;
     }
     return false;
 }
 
-// Gives the next line without its end. The last one needs none, but where the bytes break off, so
-// may its last number: such a line is none.
+// Gives the next line without its end, or what matters of it: see Shorten. The last one needs no
+// end, but where the bytes break off, so may its last number: such a line is none.
 bool TextReader::NextLine(std::string_view& line) {
     input.Skip(lineSize);
     lineSize = 0;
+    isTooLong = false;
     std::size_t size = input.Ahead().find('\n');
+    std::size_t endSize = 1;
     while (size == std::string_view::npos) {
+        Shorten();
         const std::size_t searched = input.Ahead().size();
         if (!input.ReadMore()) {
-            if (searched == 0 || !input.Problem().empty()) { return false; }
-            size = lineSize = searched;
+            if ((searched == 0 && !isTooLong) || !input.Problem().empty()) { return false; }
+            size = searched;
+            endSize = 0;
             break;
         }
         size = input.Ahead().find('\n', searched);
     }
-    if (lineSize == 0) { lineSize = size + 1; }
+    lineSize = size + endSize;
     line = input.Ahead().substr(0, size);
     ++number;
     return true;
+}
+
+// Bounds the memory that a line takes whose end is not read yet: what stands in front of its mark,
+// or of the first part of one, goes, and so does all of a line that is too long.
+void TextReader::Shorten() {
+    const std::string_view begin = input.Ahead();
+    const std::size_t start = begin.find(mark);
+    if (start != std::string_view::npos && begin.size() - start > maxSize) { isTooLong = true; }
+    const std::size_t kept = isTooLong                         ? 0
+                             : start != std::string_view::npos ? begin.size() - start
+                                                               : mark.size() - 1;
+    input.Skip(begin.size() - std::min(begin.size(), kept));
 }
 
 }  // namespace Trace

@@ -1,5 +1,6 @@
 // Reads a trace of lines. A program writes them among other output: a line without the mark is
-// passed over, and so is what stands in front of the mark.
+// passed over, and so is what stands in front of the mark. A line takes a few MiB of memory at
+// most.
 
 #ifndef OBR_TOOLS_TRACE_TEXTREADER_HPP
 #define OBR_TOOLS_TRACE_TEXTREADER_HPP
@@ -24,9 +25,11 @@ public:
 
 private:
     bool NextLine(std::string_view& line);
+    void Shorten();
 
     Input input;
     std::size_t lineSize = 0;  // Bytes of the last line, its end included, which are still ahead.
+    bool isTooLong = false;    // The last line; its bytes are gone.
     std::uint64_t number = 0;  // Of the last line.
 };
 
