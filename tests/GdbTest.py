@@ -115,8 +115,11 @@ class LiveHost(unittest.TestCase):
     def test_reports_to_the_character(self):
         for name in self.pools.keys() - {"left"}:  # It has no handle that could report it.
             for words in ("", " detailed"):
-                self.assertEqual(run(f'mempool report "{name}"{words}'),
-                                 own_report(name, words != ""))
+                report = own_report(name, words != "")
+                self.assertEqual(run(f"mempool report {name}{words}"), report)
+                if not set(name) & set("\"'\\"):
+                    self.assertEqual(run(f'mempool report "{name}"{words}'), report)
+            self.assertRegex(run(f"mempool check {name} "), "^pool " + re.escape(name))
         self.assertEqual(run("mempool report fifteen letters detailed"), own_report(LETTERS, True))
         self.assertRegex(self.told("mempool report"), "^Usage: mempool report NAME")
         self.assertRegex(self.told("mempool report four short"), "^There is no pool four short")

@@ -78,6 +78,8 @@ int main() {
     const Mgr right("right");
     left = right;
     const Mgr withUmlaut("\xC3\xA4");
+    const Mgr withQuote("o t'hers");
+    const Mgr withBackslash("a\\b  \"c");
     NUV_OBR_MEMPOOL_ON(false);
     const Mgr off("off");
     OBR::vector<int> numbers;

@@ -1,5 +1,7 @@
 """The commands: what is typed, and where each is told in full. Importing this defines them."""
 
+import re
+
 import gdb
 
 from . import check, layout, memory, pools, report, whois
@@ -15,13 +17,14 @@ def write(lines):
         gdb.write(text.encode("ascii", "backslashreplace").decode("ascii"))
 
 
-def pool_named(words):
-    """The pool whose name consists of these words."""
-    name = " ".join(words)
+def pool_named(text):
+    """The pool whose name is this text as it stands, or else what is left of it without its quotes."""
+    name = text.strip()
     found, fault = pools.all_pools()
-    for pool in found:
-        if pool.title == name:
-            return pool
+    for candidate in (name, " ".join(gdb.string_to_argv(text))):
+        for pool in found:
+            if pool.title == candidate:
+                return pool
     if fault is not None:
         raise gdb.GdbError(f"No pool {name} is found, but not all are known: {fault}")
     raise gdb.GdbError(f"There is no pool {name}. \"info mempools\" lists them.")
@@ -91,8 +94,7 @@ class MempoolReport(PoolCommand):
     """Print the report of a pool, as its Dbg does.
 Usage: mempool report NAME [detailed]
 
-With "detailed" as its DbgDetailed does: every bucket and record. Quote a name that ends in "detailed"
-or has quotes or several blanks in a row."""
+With "detailed" as its DbgDetailed does: every bucket and record. Quote a name that ends in "detailed"."""
 
     def __init__(self):
         super().__init__("mempool report", gdb.COMMAND_DATA)
@@ -101,8 +103,8 @@ or has quotes or several blanks in a row."""
         words = gdb.string_to_argv(text)
         if not words:
             raise gdb.GdbError("Usage: mempool report NAME [detailed]")
-        detailed = len(words) > 1 and words[-1] == "detailed"
-        pool = pool_named(words[:-1] if detailed else words)
+        detailed = len(words) > 1 and re.search(r"\sdetailed\s*$", text) is not None
+        pool = pool_named(re.sub(r"\sdetailed\s*$", "", text) if detailed else text)
         pieces = []
         try:
             for piece in report.report(pool, detailed):
@@ -154,8 +156,7 @@ The first that is broken is told with its address."""
         super().__init__("mempool check", gdb.COMMAND_DATA)
 
     def invoke(self, text, from_tty):
-        words = gdb.string_to_argv(text)
-        found = [pool_named(words)] if words else pools.all_pools()[0]
+        found = [pool_named(text)] if text.strip() else pools.all_pools()[0]
         for address in memory.registry_addresses():
             try:
                 check.check_registry(pools.Registry(address))
