@@ -66,7 +66,7 @@ TEST(TraceForm, HasRoomForALineWithoutAnEnd) {
     const std::size_t most = (1 << 20) - 24;  // Of a name, with "xmpt:n:", the address and a colon.
     const std::string noise(much, 'x');
     // The bytes come in two pieces at each place in the mark that follows the noise.
-    for (const std::size_t shift : {0, 1, 2, 3, 4, 5}) {
+    for (const std::size_t shift : {0U, 1U, 2U, 3U, 4U, 5U}) {
         std::size_t room = 0;
         std::string text = noise + "\n" + noise.substr(shift) + Lines("@c:P") + "\n";
         text += Lines("@n:P:") + noise.substr(0, most) + "\n";
