@@ -147,7 +147,7 @@ void Signals() {
 void Spin() {
     const std::clock_t end = std::clock() + CLOCKS_PER_SEC / 10;
     while (std::clock() < end) {}
-    for (int count = 0; count != 1000; ++count) { Use(200); }
+    for (int count = 0; count != 50000; ++count) { Use(200); }
 }
 
 void Environment() {
@@ -181,7 +181,7 @@ int main(int argc, char** argv) {
     if (what == "signals") { Signals(); }
     if (what == "spin") { Spin(); }
     if (what == "allocate") {
-        for (int count = 0; count != 200000; ++count) { Use(200); }
+        for (int count = 0; count != 1000000; ++count) { Use(200); }
     }
     if (what == "environment") { Environment(); }
     if (what == "callers") {

@@ -13,6 +13,7 @@
 #include <cerrno>
 #include <cstddef>
 #include <cstring>
+#include <ctime>
 #include <initializer_list>
 
 namespace Record {
@@ -158,6 +159,14 @@ __attribute__((noinline)) std::uint64_t Unwind(Channel& channel, std::uint64_t a
     return IndexOf(channel, *caller);
 }
 
+// Of this thread. Asking for it takes a system call, which is little beside unwinding.
+std::uint64_t ProcessorNanoseconds() {
+    timespec time = {};
+    clock_gettime(CLOCK_THREAD_CPUTIME_ID, &time);
+    return static_cast<std::uint64_t>(time.tv_sec) * 1000000000U +
+           static_cast<std::uint64_t>(time.tv_nsec);
+}
+
 }  // namespace
 
 std::uint64_t FindCaller(Channel& channel, const void* returnAddress, const void* frame) {
@@ -176,7 +185,10 @@ std::uint64_t FindCaller(Channel& channel, const void* returnAddress, const void
         stack += caller.frameSize;
         std::memcpy(&address, Pointer(stack) - sizeof(address), sizeof(address));
     }
-    return Unwind(channel, first, reinterpret_cast<std::uint64_t>(frame));
+    const std::uint64_t start = ProcessorNanoseconds();
+    const std::uint64_t index = Unwind(channel, first, reinterpret_cast<std::uint64_t>(frame));
+    channel.unwindNanoseconds.fetch_add(ProcessorNanoseconds() - start, std::memory_order_relaxed);
+    return index;
 }
 
 }  // namespace Record

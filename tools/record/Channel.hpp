@@ -71,6 +71,13 @@ struct Module {
 };
 constexpr std::size_t numModules = 1024;  // The first stands for code outside of any.
 
+// The timed calls of about the same length.
+struct Samples {
+    std::atomic<std::uint64_t> number;
+    std::atomic<std::uint64_t> ticks;
+};
+constexpr std::size_t numSampleLengths = 20;
+
 struct Channel {
     // Read at every event and seldom written.
     alignas(64) std::uint64_t magic;
@@ -84,18 +91,25 @@ struct Channel {
     std::atomic<std::uint32_t> modulesUsed;  // The index of the last one.
     std::atomic<std::uint32_t> modulesLock;
 
-    // Written at every event. A sample of the calls is timed: in the allocator itself, and in the
-    // recorder around it.
+    // Written at every event.
     alignas(64) std::atomic<std::uint64_t> head;  // Slots taken.
-    std::atomic<std::uint64_t> allocatorTicks;
-    std::atomic<std::uint64_t> recorderTicks;
     std::atomic<std::uint32_t> numThreads;
+
+    // What the recorder itself takes: the ticks of so many events, measured at its start, and the
+    // processor time of all unwinding.
+    alignas(64) std::atomic<std::uint64_t> calibrationTicks;
+    std::atomic<std::uint64_t> unwindNanoseconds;
+
+    // The calls of the allocator that were timed, by the power of two of their ticks.
+    Samples samples[numSampleLengths];
 
     alignas(64) Slot slots[numSlots];
     Caller callers[numCallers];
     Module modules[numModules];
 };
-constexpr std::uint64_t channelMagic = 0x3130'4C4E'4843'504D;
+constexpr std::uint64_t channelMagic = 0x3131'4C4E'4843'504D;
+
+constexpr std::uint64_t numCalibrationEvents = 1024;
 
 // One call in so many is timed, on average.
 constexpr std::uint32_t samplePeriod = 64;

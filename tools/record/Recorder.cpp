@@ -84,6 +84,27 @@ std::uint64_t TicksOfTimer() {
 }
 std::uint64_t ticksOfTimer = 0;
 
+// What an event costs, from a channel that nobody drains: the least of a few rounds, which is one
+// that was not interrupted. Its memory is touched for the first time, as that of the true channel.
+std::uint64_t CalibrationTicks() {
+    void* const memory = mmap(nullptr, sizeof(Channel), PROT_READ | PROT_WRITE,
+                              MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
+    if (memory == MAP_FAILED) { return 0; }
+    auto* const channel = static_cast<Channel*>(memory);
+    const ThreadState state = threadState;
+    std::uint64_t least = ~std::uint64_t{0};
+    for (int round = 0; round != 5; ++round) {
+        const std::uint64_t start = Ticks();
+        for (std::uint64_t event = 0; event != numCalibrationEvents; ++event) {
+            Put(*channel, Op::Released, memory, 0, 0);
+        }
+        least = std::min(least, Ticks() - start);
+    }
+    threadState = state;
+    munmap(memory, sizeof(Channel));
+    return least;
+}
+
 }  // namespace
 
 void Attach() {
@@ -96,7 +117,10 @@ void Attach() {
         close(descriptor);
         RestoreEnvironment();
         ticksOfTimer = TicksOfTimer();
-        if (channel != nullptr) { Activate(channel); }
+        if (channel != nullptr) {
+            channel->calibrationTicks.store(CalibrationTicks());
+            Activate(channel);
+        }
     }
     errno = oldErrno;
 }
@@ -135,9 +159,9 @@ bool WaitForRoom(Channel& channel, std::uint64_t index) {
 }
 
 // A thread that is interrupted within a call seems to spend a long time there. A call that long is
-// counted as no longer than most that really are, and one outside of the allocator not at all.
-void Sample::End(std::uint64_t end) {
-    constexpr std::uint64_t longest = 1U << 19;
+// counted as no longer than most that really are.
+void Sample::End() {
+    constexpr std::uint64_t longest = (std::uint64_t{1} << numSampleLengths) - 1;
     ThreadState& state = threadState;
     state.isWarm = !state.isWarm;
     if (state.isWarm) { return; }
@@ -145,13 +169,11 @@ void Sample::End(std::uint64_t end) {
     state.random = state.random * 1664525U + 1013904223U;
     state.countdown = samplePeriod / 2 + (state.random >> 26) - 1;
 
-    const auto without = [](std::uint64_t ticks, std::uint64_t timer) {
-        return ticks > timer ? ticks - timer : 0;
-    };
-    const std::uint64_t outside = without(end - start - inside, 2 * ticksOfTimer);
-    channel.allocatorTicks.fetch_add(std::min(without(inside, ticksOfTimer), longest),
-                                     std::memory_order_relaxed);
-    if (outside < longest) { channel.recorderTicks.fetch_add(outside, std::memory_order_relaxed); }
+    const std::uint64_t ticks = inside > ticksOfTimer ? inside - ticksOfTimer : 0;
+    const std::uint64_t counted = std::min(ticks, longest);
+    Samples& samples = channel.samples[63 - __builtin_clzll(counted | 1)];
+    samples.number.fetch_add(1, std::memory_order_relaxed);
+    samples.ticks.fetch_add(counted, std::memory_order_relaxed);
 }
 
 }  // namespace Record

@@ -248,20 +248,51 @@ void WriteStart(Trace::CompactWriter& writer, const Order& order) {
     WriteInfo(writer, "by", order.pools ? "pools" : names[static_cast<std::size_t>(order.by)]);
 }
 
-// The recorder's part of the processor time, which the sample tells, is not the program's own.
+// What the timed calls took together. Of few of them a single one that was interrupted would be
+// the most: the longest three are taken for as long as those next to them.
+struct TimedCalls {
+    explicit TimedCalls(const Channel& channel) {
+        double numLongest = 3;
+        double numReplaced = 0;
+        for (std::size_t length = numSampleLengths; length-- != 0;) {
+            const auto inLength = static_cast<double>(channel.samples[length].number.load());
+            if (inLength == 0) { continue; }
+            const double mean =
+                static_cast<double>(channel.samples[length].ticks.load()) / inLength;
+            const double left = std::min(inLength, numLongest);
+            numLongest -= left;
+            numReplaced += left;
+            number += inLength;
+            if (inLength == left) { continue; }
+            ticks += mean * (inLength - left + numReplaced);
+            numReplaced = 0;
+        }
+    }
+
+    double number = 0;
+    double ticks = 0;
+};
+
+// The recorder's part of the processor time is not the program's own. It is known to a fraction,
+// so that no more than half of the whole is taken for it. The share is left out where it would
+// be a guess.
 void WriteTimes(Trace::CompactWriter& writer, const Channel& channel, double whole,
                 const TickRate& rate) {
+    constexpr double leastCalls = 200;
+    constexpr double leastSeconds = 0.01;
     const double perSecond = rate.PerSecond();
-    const auto seconds = [&](std::uint64_t ticks) {
-        return perSecond > 0 ? static_cast<double>(ticks) * samplePeriod / perSecond : 0;
-    };
-    // Timed apart, two steps take longer than one behind the other: the estimates may exceed the
-    // whole in a program that does nothing else.
-    const double allocator = std::min(seconds(channel.allocatorTicks), whole);
-    const double own = std::max(whole - seconds(channel.recorderTicks), allocator);
-    const double share = own > 0 ? allocator / own : 0;
+    const auto seconds = [&](double ticks) { return perSecond > 0 ? ticks / perSecond : 0; };
+    const double numEvents = static_cast<double>(channel.head.load()) / numCalibrationEvents;
+    const double events = static_cast<double>(channel.calibrationTicks.load()) * numEvents;
+    const double recorder =
+        seconds(events) + static_cast<double>(channel.unwindNanoseconds.load()) / 1e9;
+    const double own = std::max(whole - recorder, whole / 2);
     WriteInfo(writer, "cpu_seconds", Text(own));
-    WriteInfo(writer, "allocation_share", Text(share));
+    const TimedCalls timed(channel);
+    if (timed.number >= leastCalls && whole >= leastSeconds) {
+        const double allocator = seconds(timed.ticks * samplePeriod);
+        WriteInfo(writer, "allocation_share", Text(std::min(allocator / own, 1.0)));
+    }
     WriteInfo(writer, "threads", std::to_string(channel.numThreads));
 }
 
