@@ -6,7 +6,7 @@
 # shellcheck source=scripts/build.sh
 source "$(dirname "$0")/build.sh"
 
-rounds=5 seconds=0.1
+rounds=3 seconds=0.1
 case "${1:-}" in
     "") ;;
     --quick) rounds=2 seconds=0.02 ;;
