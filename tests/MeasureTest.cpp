@@ -51,6 +51,19 @@ TEST(Recording, FindsTheFirstOfThePeaksWithTheMostBlocks) {
     EXPECT_EQ(recording.steps.size(), 12U);
 }
 
+TEST(Recording, MergesGroupsButNoPools) {
+    Replay::Recording heap = Record("@c:P\n@a:P:X:64\n@c:Q\n@a:Q:Y:8\n@c:R\n@f:Q:Y:\n");
+    Replay::MergePools(heap);
+    EXPECT_EQ(heap.pools.size(), 1U);
+    EXPECT_EQ(heap.steps.size(), 4U);
+    EXPECT_EQ(heap.peakSteps, 3U);
+    for (const Trace::Step& step : heap.steps) { EXPECT_EQ(step.pool, 0U); }
+    Replay::Recording pools = Record("@c:P\n@a:P:X:64\n@c:Q\n@a:Q:Y:8\n@x:Q\n");
+    Replay::MergePools(pools);
+    EXPECT_EQ(pools.pools.size(), 2U);
+    EXPECT_EQ(pools.steps.size(), 5U);
+}
+
 TEST(Measure, TakesTheMedian) {
     EXPECT_EQ(Replay::Median({9, 1, 8, 2, 5}), 5);
 }

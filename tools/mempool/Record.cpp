@@ -5,6 +5,7 @@
 #include <sys/resource.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <csignal>
 #include <iostream>
 #include <map>
@@ -69,7 +70,11 @@ void AddRecordOptions(CLI::App& subcommand, Record::Order& order) {
     CLI::Option* const by = subcommand.add_option_function<std::string>(
         "--by", [&order](const std::string& name) { order.by = names.at(name); },
         "What makes a group, a traced pool of its own: all, caller, module or thread");
-    by->type_name("GROUP")->check(CLI::IsMember(names).description(""))->default_str("all");
+    by->type_name("GROUP")
+        ->check(CLI::IsMember(names).description(""))
+        ->default_str(std::find_if(names.begin(), names.end(), [&](const auto& each) {
+                          return each.second == order.by;
+                      })->first);
     subcommand.add_flag("--pools", order.pools, "Record the pools of libObrMemPool, not the heap")
         ->excludes(by);
 }

@@ -187,8 +187,9 @@ std::string Shown(std::size_t shown, std::size_t all) {
     return shown == all ? "" : " (" + Count(shown) + " of " + Count(all) + ")";
 }
 
-void PrintSizes(std::ostream& out, const Analysis& analysis, bool all) {
-    constexpr std::size_t most = 6;
+void PrintSizes(std::ostream& out, const Analysis& analysis, Extent extent) {
+    const bool all = extent == Extent::All;
+    const std::size_t most = extent == Extent::Short ? 4 : 6;
     std::vector<const Report::SizeRow*> rows;
     for (const Report::SizeRow& row : analysis.sizes) { rows.push_back(&row); }
     if (!all && rows.size() > most) {
@@ -252,7 +253,7 @@ void PrintLifetimes(std::ostream& out, const Analysis& analysis) {
 }
 
 void PrintGroups(std::ostream& out, const Analysis& analysis, Extent extent) {
-    constexpr std::size_t most = 7;
+    const std::size_t most = extent == Extent::Short ? 5 : 7;
     const std::size_t shown =
         extent == Extent::All ? analysis.groups.size() : std::min(analysis.groups.size(), most);
     out << "\n   GROUPS" << (shown < analysis.groups.size() ? " LARGEST AT THE PEAK" : "")
@@ -279,11 +280,9 @@ void PrintAnalysis(std::ostream& out, const Analysis& analysis, Extent extent,
     out << SafeText(analysis.trace) << '\n' << heading;
     PrintFacts(out, analysis);
     PrintTotals(out, analysis);
-    if (extent != Extent::Short) {
-        PrintGraph(out, analysis);
-        PrintSizes(out, analysis, extent == Extent::All);
-        PrintLifetimes(out, analysis);
-    }
+    if (extent != Extent::Short) { PrintGraph(out, analysis); }
+    PrintSizes(out, analysis, extent);
+    if (extent != Extent::Short) { PrintLifetimes(out, analysis); }
     PrintGroups(out, analysis, extent);
 }
 

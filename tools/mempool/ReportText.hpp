@@ -12,7 +12,7 @@
 namespace Tool {
 
 enum class Extent : std::uint8_t {
-    Short,  // The totals and the largest groups.
+    Short,  // The totals, and a few sizes and groups.
     Page,   // About 40 lines.
     All,    // Every size and every group.
 };

@@ -37,10 +37,13 @@ constexpr const char* notes =
 /tmp, and behind the program's end comes what 'mempool report' and 'mempool advise' tell of it. All
 that goes to standard error: the program's own output stays as it is, and so does its exit status. If
 recording fails or the page cannot be written the status is 125, 126 or 127, as with 'mempool record'.
+The report has groups by caller, unless --by has others; the advice is that for one pool for them all.
 Ctrl-C ends the program, and what was recorded is told; once more ends that too.
 )";
 
 struct Options {
+    Options() { order.by = Record::By::Caller; }
+
     Record::Order order;
     std::string html;
     unsigned int seconds = 15;
@@ -115,7 +118,8 @@ void ReportOn(const NamelessFile& trace, const Options& options) {
 
 void AdviseOn(const NamelessFile& trace, const Options& options) {
     Trace::StepReader reader = Open(trace, options);
-    const Advice advice = TakeAdvice(reader, options.seconds, Progress("mempool"));
+    const Advice advice = TakeAdvice(reader, options.seconds, Progress("mempool"),
+                                     options.order.pools ? Pools::AsTraced : Pools::One);
     std::cerr << '\n';
     PrintTable(std::cerr, advice, false);
     std::cerr << '\n';

@@ -133,13 +133,16 @@ void PrintShare(std::ostream& out, const Advice& advice, double ratio) {
 
 }  // namespace
 
-Advice TakeAdvice(Trace::StepReader& reader, unsigned int seconds, const Progress& progress) {
+Advice TakeAdvice(Trace::StepReader& reader, unsigned int seconds, const Progress& progress,
+                  Pools pools) {
     // In a thread of its own, which has an arena of its own in the C library: the heap of this one,
     // which the replays inherit, stays as fresh as that of a program that starts.
     const auto read = [&] {
-        return Replay::ReadRecording(
+        Replay::Recording whole = Replay::ReadRecording(
             reader, [&](auto position) { progress.Show("event " + std::to_string(position)); },
             Advise::MaxSteps(seconds));
+        if (pools == Pools::One) { Replay::MergePools(whole); }
+        return whole;
     };
     const Replay::Recording recording = std::async(std::launch::async, read).get();
     if (recording.peakBlocks == 0) {

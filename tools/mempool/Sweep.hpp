@@ -3,6 +3,7 @@
 #ifndef OBR_TOOLS_MEMPOOL_SWEEP_HPP
 #define OBR_TOOLS_MEMPOOL_SWEEP_HPP
 
+#include <cstdint>
 #include <iostream>
 #include <optional>
 
@@ -26,7 +27,9 @@ struct Advice {
 
 // Reads the trace, and searches for that many seconds. Shows progress, which it leaves empty. A
 // trace without an allocation is a std::runtime_error.
-Advice TakeAdvice(Trace::StepReader& reader, unsigned int seconds, const Progress& progress);
+enum class Pools : std::uint8_t { AsTraced, One };  // One for all groups of a heap.
+Advice TakeAdvice(Trace::StepReader& reader, unsigned int seconds, const Progress& progress,
+                  Pools pools = Pools::AsTraced);
 
 // Adds --seconds.
 void AddSeconds(CLI::App& subcommand, unsigned int& seconds);

@@ -2,6 +2,7 @@
 
 #include "replay/Recording.hpp"
 
+#include <algorithm>
 #include <tuple>
 #include <utility>
 
@@ -91,6 +92,26 @@ Recording ReadRecording(Trace::StepReader& reader,
         if (number % interval == 0) { atEvent(reader.Position()); }
     }
     return recorder.Finish(reader.Blocks());
+}
+
+void MergePools(Recording& recording) {
+    std::vector<Trace::Step>& steps = recording.steps;
+    const auto drops = [](const Trace::Step& step) {
+        return step.kind == Trace::Kind::Cleared || step.kind == Trace::Kind::Destroyed;
+    };
+    if (recording.pools.size() < 2 || std::any_of(steps.begin(), steps.end(), drops)) { return; }
+    std::size_t kept = 0;
+    std::size_t keptToPeak = 0;
+    for (std::size_t i = 0; i < steps.size(); ++i) {
+        Trace::Step step = steps[i];
+        const bool isAnotherPool = step.kind == Trace::Kind::Created && kept > 0;
+        step.pool = 0;
+        if (!isAnotherPool) { steps[kept++] = step; }
+        if (i + 1 == recording.peakSteps) { keptToPeak = kept; }
+    }
+    steps.resize(kept);
+    recording.peakSteps = keptToPeak;
+    recording.pools.resize(1);
 }
 
 }  // namespace Replay

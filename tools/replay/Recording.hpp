@@ -39,6 +39,10 @@ Recording ReadRecording(Trace::StepReader& reader,
                         const std::function<void(std::uint64_t position)>& atEvent,
                         std::size_t maxSteps = std::numeric_limits<std::size_t>::max());
 
+// Makes one pool of all, as if nothing told groups apart. A recording in which a pool is cleared or
+// destroyed stays as it is: these are pools, not groups of a heap.
+void MergePools(Recording& recording);
+
 }  // namespace Replay
 
 #endif
