@@ -95,12 +95,14 @@ struct Channel {
     alignas(64) std::atomic<std::uint64_t> head;  // Slots taken.
     std::atomic<std::uint32_t> numThreads;
 
-    // What the recorder itself takes: the ticks of so many events, measured at its start, and the
-    // processor time of all unwinding.
-    alignas(64) std::atomic<std::uint64_t> calibrationTicks;
+    // What the recorder itself takes: the ticks of so many events and of so many timed calls beside
+    // the call, measured at its start, and the processor time of all unwinding.
+    alignas(64) std::atomic<std::uint64_t> eventTicks;
+    std::atomic<std::uint64_t> timerTicks;
     std::atomic<std::uint64_t> unwindNanoseconds;
 
-    // The calls of the allocator that were timed, by the power of two of their ticks.
+    // The calls of the allocator that were timed, by the power of two of their ticks, those of the
+    // timer among them.
     Samples samples[numSampleLengths];
 
     alignas(64) Slot slots[numSlots];

@@ -73,33 +73,41 @@ void Activate(Channel* channel) {
     active = static_cast<Active*>(page);
 }
 
-std::uint64_t TicksOfTimer() {
+// The ticks of the shortest of a few rounds, which is one that was not interrupted.
+template <typename Round>
+std::uint64_t LeastTicks(Round round) {
     std::uint64_t least = ~std::uint64_t{0};
-    for (int round = 0; round != 100; ++round) {
-        const std::uint64_t start = Ticks();
-        const std::uint64_t ticks = Ticks() - start;
-        least = ticks < least ? ticks : least;
-    }
+    for (int number = 0; number != 5; ++number) { least = std::min(least, round()); }
     return least;
 }
-std::uint64_t ticksOfTimer = 0;
 
-// What an event costs, from a channel that nobody drains: the least of a few rounds, which is one
-// that was not interrupted. Its memory is touched for the first time, as that of the true channel.
-std::uint64_t CalibrationTicks() {
+// What it takes to time nothing at all, so many times.
+std::uint64_t TimerTicks() {
+    return LeastTicks([] {
+        std::uint64_t ticks = 0;
+        for (std::uint64_t reading = 0; reading != numCalibrationEvents; ++reading) {
+            const std::uint64_t start = Ticks();
+            ticks += TicksWhenDone() - start;
+        }
+        return ticks;
+    });
+}
+
+// What so many events cost, from a channel that nobody drains. Its memory is touched for the first
+// time, as that of the true channel.
+std::uint64_t EventTicks() {
     void* const memory = mmap(nullptr, sizeof(Channel), PROT_READ | PROT_WRITE,
                               MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
     if (memory == MAP_FAILED) { return 0; }
     auto* const channel = static_cast<Channel*>(memory);
     const ThreadState state = threadState;
-    std::uint64_t least = ~std::uint64_t{0};
-    for (int round = 0; round != 5; ++round) {
+    const std::uint64_t least = LeastTicks([channel, memory] {
         const std::uint64_t start = Ticks();
         for (std::uint64_t event = 0; event != numCalibrationEvents; ++event) {
             Put(*channel, Op::Released, memory, 0, 0);
         }
-        least = std::min(least, Ticks() - start);
-    }
+        return Ticks() - start;
+    });
     threadState = state;
     munmap(memory, sizeof(Channel));
     return least;
@@ -116,9 +124,9 @@ void Attach() {
         Channel* const channel = TakeChannel(descriptor);
         close(descriptor);
         RestoreEnvironment();
-        ticksOfTimer = TicksOfTimer();
         if (channel != nullptr) {
-            channel->calibrationTicks.store(CalibrationTicks());
+            channel->timerTicks.store(TimerTicks());
+            channel->eventTicks.store(EventTicks());
             Activate(channel);
         }
     }
@@ -169,8 +177,7 @@ void Sample::End() {
     state.random = state.random * 1664525U + 1013904223U;
     state.countdown = samplePeriod / 2 + (state.random >> 26) - 1;
 
-    const std::uint64_t ticks = inside > ticksOfTimer ? inside - ticksOfTimer : 0;
-    const std::uint64_t counted = std::min(ticks, longest);
+    const std::uint64_t counted = std::min(inside, longest);
     Samples& samples = channel.samples[63 - __builtin_clzll(counted | 1)];
     samples.number.fetch_add(1, std::memory_order_relaxed);
     samples.ticks.fetch_add(counted, std::memory_order_relaxed);

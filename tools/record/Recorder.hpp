@@ -106,7 +106,7 @@ public:
     ~Sample() { End(); }
 
     void EnterAllocator() { entered = Ticks(); }
-    void LeaveAllocator() { inside = Ticks() - entered; }
+    void LeaveAllocator() { inside = TicksWhenDone() - entered; }
 
 private:
     void End();

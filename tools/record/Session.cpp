@@ -267,6 +267,8 @@ struct TimedCalls {
             ticks += mean * (inLength - left + numReplaced);
             numReplaced = 0;
         }
+        const auto timer = static_cast<double>(channel.timerTicks.load()) / numCalibrationEvents;
+        ticks = std::max(ticks - number * timer, 0.0);
     }
 
     double number = 0;
@@ -283,7 +285,7 @@ void WriteTimes(Trace::CompactWriter& writer, const Channel& channel, double who
     const double perSecond = rate.PerSecond();
     const auto seconds = [&](double ticks) { return perSecond > 0 ? ticks / perSecond : 0; };
     const double numEvents = static_cast<double>(channel.head.load()) / numCalibrationEvents;
-    const double events = static_cast<double>(channel.calibrationTicks.load()) * numEvents;
+    const double events = static_cast<double>(channel.eventTicks.load()) * numEvents;
     const double recorder =
         seconds(events) + static_cast<double>(channel.unwindNanoseconds.load()) / 1e9;
     const double own = std::max(whole - recorder, whole / 2);

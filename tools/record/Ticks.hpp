@@ -1,4 +1,5 @@
-// A clock that is cheap to read, in ticks of its own.
+// A clock that is cheap to read, in ticks of its own. Some processors count several of them at
+// once, so that one reading more or less says little, and only a mean over many does.
 
 #ifndef OBR_TOOLS_RECORD_TICKS_HPP
 #define OBR_TOOLS_RECORD_TICKS_HPP
@@ -26,6 +27,17 @@ inline std::uint64_t Ticks() {
     return static_cast<std::uint64_t>(now.tv_sec) * 1000000000U +
            static_cast<std::uint64_t>(now.tv_nsec);
 #endif
+}
+
+// The time at which the code ahead of this is done. A processor that runs instructions out of order
+// reads a counter before a short call that it stands behind has returned.
+inline std::uint64_t TicksWhenDone() {
+#if defined(__x86_64__)
+    _mm_lfence();
+#elif defined(__aarch64__)
+    asm volatile("isb" ::: "memory");
+#endif
+    return Ticks();
 }
 
 }  // namespace Record
