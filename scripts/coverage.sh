@@ -13,7 +13,7 @@ if [ -d build/coverage ]; then find build/coverage -name '*.gcda' -delete; fi
 options=(-DOBR_MEMPOOL_TESTS=ON)
 build coverage "${coreTests[@]}"
 step "Test preset coverage"
-ctest --preset coverage --quiet --output-log build/coverage/tests.log || {
+ctest --preset coverage --tests-regex "$coreNames" --quiet --output-log build/coverage/tests.log || {
     cat build/coverage/tests.log
     exit 1
 }

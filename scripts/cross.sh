@@ -13,7 +13,9 @@ options=(-DOBR_MEMPOOL_TESTS=ON)
 for preset in "${presets[@]}"; do
     build "$preset" "${coreTests[@]}"
     step "Test preset $preset"
-    ctest --preset "$preset" --quiet --output-log "build/$preset/tests.log" || {
+    ctest --preset "$preset" --tests-regex "$coreNames" \
+        --exclude-regex "TheLoadShowsTheBanner|RecordSizesThatCannotWork" \
+        --quiet --output-log "build/$preset/tests.log" || {
         cat "build/$preset/tests.log"
         exit 1
     }

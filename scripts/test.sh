@@ -1,11 +1,21 @@
 #!/usr/bin/env bash
-# Builds and runs all tests: optimised and under the sanitizers, with g++ and clang++.
+# Builds and runs all tests twice: optimised by g++, and under the sanitizers of clang++. --whole: the
+# other way round as well, as the CI does.
 # shellcheck source=scripts/build.sh
 source "$(dirname "$0")/build.sh"
 
+presets=(release clang-asan-ubsan)
+case "${1:-}" in
+    "") ;;
+    --whole) presets+=(asan-ubsan clang-release) ;;
+    *)
+        echo "usage: scripts/test.sh [--whole]" >&2
+        exit 2
+        ;;
+esac
+
 step "Packages"
 scripts/install-packages.sh build test
-presets=(release asan-ubsan clang-release clang-asan-ubsan)
 # No part may be missing here, and no test with it.
 options=(-DOBR_MEMPOOL_EXAMPLES=ON -DOBR_MEMPOOL_TOOLS=ON -DOBR_MEMPOOL_TESTS=ON)
 for preset in "${presets[@]}"; do
