@@ -31,6 +31,8 @@ TEST(RecordPools, TellsWhatTheLibraryTellsAndMore) {
               "xmpt:n::__OBR_MEMPOOL_00001\nxmpt:n::\n");
     EXPECT_EQ(Shell::Output(HOST, 3), "");
     EXPECT_EQ(Shell::Output(MEMPOOL " record --pools -o trace " HOST, 3), "");
+    EXPECT_EQ(Shell::Output(MEMPOOL " record --pools -o trace true"),
+              "mempool: true has made no pool of the shared library, libObrMemPool.so\n");
 }
 
 }  // namespace

@@ -47,7 +47,7 @@ Exit status: the program's own; 125 if recording fails, 126 if the program canno
 
 int Run(const Record::Order& order) {
     try {
-        const Record::Outcome outcome = Record::RecordProgram(order);
+        const Record::Outcome outcome = RecordAsOrdered(order);
         if (isatty(STDERR_FILENO) != 0) {
             std::cerr << "mempool: " << outcome.numEvents << " events of " << outcome.numThreads
                       << (outcome.numThreads == 1 ? " thread, " : " threads, ") << outcome.traceSize
@@ -77,6 +77,15 @@ void AddRecordOptions(CLI::App& subcommand, Record::Order& order) {
                       })->first);
     subcommand.add_flag("--pools", order.pools, "Record the pools of libObrMemPool, not the heap")
         ->excludes(by);
+}
+
+Record::Outcome RecordAsOrdered(const Record::Order& order) {
+    Record::Outcome outcome = Record::RecordProgram(order);
+    if (order.pools && outcome.numEvents == 0) {
+        std::cerr << "mempool: " << order.command.front()
+                  << " has made no pool of the shared library, libObrMemPool.so\n";
+    }
+    return outcome;
 }
 
 int EndLike(const Record::Outcome& outcome) {

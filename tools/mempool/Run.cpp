@@ -133,7 +133,7 @@ int Run(Options options) {
         options.order.tracePath = trace.Path();
         Record::Outcome outcome;
         try {
-            outcome = Record::RecordProgram(options.order);
+            outcome = RecordAsOrdered(options.order);
         } catch (const Record::Refusal& refusal) {
             std::cerr << "mempool: " << trace.Named(refusal.what()) << '\n';
             return refusal.Status();
