@@ -32,7 +32,7 @@ execute_process(COMMAND awk -v version=${CPACK_PACKAGE_VERSION}-${CPACK_DEBIAN_P
     OUTPUT_VARIABLE changelog COMMAND_ERROR_IS_FATAL ANY)
 
 # What of others is compiled into a component, each told by the Debian package that it comes from.
-set(others_tools libcli11-dev nlohmann-json3-dev libjs-d3)
+set(others_tools libcli11-dev libfmt-dev nlohmann-json3-dev libjs-d3)
 
 # What there is to read.
 set(texts_dev README.md docs/moving.md)

@@ -117,7 +117,7 @@ TEST(Advise, FiguresVerdictAndEnvironmentAgree) {
 TEST(Advise, PrintsATableAndAVerdict) {
     const std::string path = TraceFile("plain", Blocks("@i:allocation_share:0.25\n"));
     const std::string advice = Command(MEMPOOL " advise --seconds 1 " + path);
-    EXPECT_THAT(advice, HasSubstr("\n   heap "));
+    EXPECT_THAT(advice, HasSubstr("\n     heap "));
     EXPECT_THAT(advice, HasSubstr("\nPools would "));
     EXPECT_THAT(advice, HasSubstr("Allocation takes 25 % of the program's processor time"));
     EXPECT_THAT(advice, HasSubstr("if allocation cost nothing 75 %"));

@@ -3,7 +3,6 @@
 #include <cstdint>
 #include <cstdlib>
 #include <exception>
-#include <iomanip>
 #include <iostream>
 #include <memory>
 #include <new>
@@ -17,6 +16,7 @@
 #include "mempool/Progress.hpp"
 #include "mempool/Settings.hpp"
 #include "mempool/Sweep.hpp"
+#include "mempool/Table.hpp"
 #include "replay/Measure.hpp"
 #include "replay/PoolSettings.hpp"
 #include "replay/Recording.hpp"
@@ -58,27 +58,10 @@ struct Options {
     bool dbg = false;
 };
 
-template <typename Value>
-void WriteCells(const char* label, Value pool, Value heap) {
-    std::cout << "   " << std::left << std::setw(24) << label << std::right << std::setw(12) << pool
-              << std::setw(12) << heap;
-}
-
-void WriteSame(const char* label, std::uint64_t value) {
-    WriteCells(label, value, value);
-    std::cout << '\n';
-}
-
-template <typename Value>
-void WriteCompared(const char* label, const Replay::Compared<Value>& figures) {
-    std::cout << std::fixed << std::setprecision(1);
-    WriteCells(label, figures.pool, figures.heap);
-    std::cout << std::setw(12) << std::setprecision(2);
-    if (figures.heap > 0) {
-        std::cout << static_cast<double>(figures.pool) / static_cast<double>(figures.heap) << '\n';
-    } else {
-        std::cout << "-" << '\n';
-    }
+// A row of the table; a ratio only if there is one.
+void AddRow(Table& table, const char* label, double pool, double heap, int digits) {
+    table.AddRow(label, fmt::format("{:.{}f}", pool, digits), fmt::format("{:.{}f}", heap, digits),
+                 heap > 0 ? fmt::format("{:.2f}", pool / heap) : "-");
 }
 
 // Returns the exit status.
@@ -95,25 +78,28 @@ int Compare(const std::string& path, const Options& options) {
         if (options.dbg) { OBR::MemPool::Dbg(); }
     });
 
-    WriteCells("", "pool", "heap");
-    std::cout << std::setw(12) << "pool/heap" << '\n';
-    WriteSame("pools", recording.pools.size());
-    WriteSame("events", recording.steps.size());
-    WriteSame("blocks at the peak", recording.peakBlocks);
-    WriteSame("bytes at the peak", recording.peakBytes);
-    WriteSame("blocks cleared", recording.numCleared);
-    WriteSame("blocks never freed", recording.numNeverFreed);
-    WriteCompared("bytes held at the peak", held);
+    Table table({{"", 0, Align::Left}, {"pool", 10}, {"heap", 10}, {"pool/heap", 10}});
+    const auto addSame = [&](const char* label, std::uint64_t value) {
+        table.AddRow(label, value, value);
+    };
+    addSame("pools", recording.pools.size());
+    addSame("events", recording.steps.size());
+    addSame("blocks at the peak", recording.peakBlocks);
+    addSame("bytes at the peak", recording.peakBytes);
+    addSame("blocks cleared", recording.numCleared);
+    addSame("blocks never freed", recording.numNeverFreed);
+    AddRow(table, "bytes held at the peak", static_cast<double>(held.pool),
+           static_cast<double>(held.heap), 0);
+    if (!recording.steps.empty()) {
+        const auto times = Replay::NanosecondsPerEvent(recording, options.rounds, [&](auto round) {
+            progress.Show(fmt::format("round {} of {}", round, options.rounds));
+        });
+        progress.Clear();
+        AddRow(table, "ns an event", times.pool, times.heap, 1);
+    }
+    table.Write(std::cout);
     std::cout << std::flush;
-    const int status = WarnOfBrokenTrace(reader);
-    if (recording.steps.empty()) { return status; }
-    const auto times = Replay::NanosecondsPerEvent(recording, options.rounds, [&](auto round) {
-        progress.Show("round " + std::to_string(round) + " of " + std::to_string(options.rounds));
-    });
-    progress.Clear();
-    WriteCompared("ns an event", times);
-    std::cout << std::flush;
-    return status;
+    return WarnOfBrokenTrace(reader);
 }
 
 // Likewise, with the settings that a search tries.

@@ -4,16 +4,18 @@
 #include <cstddef>
 #include <cstdint>
 #include <future>
-#include <iomanip>
 #include <map>
-#include <sstream>
 #include <stdexcept>
 #include <string>
+#include <utility>
 #include <vector>
+
+#include <fmt/ostream.h>
 
 #include "advise/ForkedMeter.hpp"
 #include "advise/Search.hpp"
 #include "advise/Space.hpp"
+#include "mempool/Table.hpp"
 #include "trace/StepReader.hpp"
 
 namespace Tool {
@@ -26,14 +28,8 @@ using Advise::Measured;
 // How many of the best the short table has, beside those that are named.
 constexpr std::size_t numShown = 8;
 
-std::string Fixed(double value, int digits) {
-    std::ostringstream text;
-    text << std::fixed << std::setprecision(digits) << value;
-    return text.str();
-}
-
 std::string Percent(double share) {
-    return Fixed(100 * share, share < 0.1 ? 1 : 0) + " %";
+    return fmt::format("{:.{}f} %", 100 * share, share < 0.1 ? 1 : 0);
 }
 
 double TimeRatio(const Advice& advice, const Figures& figures) {
@@ -41,14 +37,6 @@ double TimeRatio(const Advice& advice, const Figures& figures) {
 }
 double BytesRatio(const Advice& advice, const Figures& figures) {
     return figures.bytesHeld / advice.findings.heap.bytesHeld;
-}
-
-void PrintFigures(std::ostream& out, const Advice& advice, const Figures& figures) {
-    out << std::right << std::setw(9) << Fixed(figures.nsPerEvent, 1) << std::setw(8)
-        << (figures.rounds > 1 ? Fixed(figures.nsSpread, 1) : "-") << std::setw(8)
-        << Fixed(TimeRatio(advice, figures), 2) << std::setw(13)
-        << static_cast<std::int64_t>(figures.bytesHeld) << std::setw(8)
-        << Fixed(BytesRatio(advice, figures), 2);
 }
 
 std::string NamesOf(const Advice& advice, std::size_t index) {
@@ -62,25 +50,35 @@ std::string NamesOf(const Advice& advice, std::size_t index) {
                                Advise::LibraryDefaults()) == 0) {
         names += ", default";
     }
-    return names.empty() ? "" : names.substr(1);
+    return names.empty() ? "" : names.substr(2);
 }
 
-void PrintRow(std::ostream& out, const Advice& advice, std::size_t index) {
-    const Measured& row = advice.findings.settings[index];
-    out << "   " << std::right << std::setw(6) << row.settings.bucketSize << std::setw(8)
-        << row.settings.maxRecordSize << std::setw(8) << row.settings.minRecordSize << std::setw(7)
-        << row.settings.dataAlignment << "  " << std::left << std::setw(9)
-        << (row.settings.keepEmptyBuckets ? "kept" : "released");
-    PrintFigures(out, advice, row.figures);
-    out << ' ' << NamesOf(advice, index) << '\n';
+void AddRow(Table& table, const Advice& advice, std::vector<std::string> cells,
+            const Figures& figures, const std::string& names) {
+    cells.push_back(fmt::format("{:.1f}", figures.nsPerEvent));
+    cells.push_back(figures.rounds > 1 ? fmt::format("{:.1f}", figures.nsSpread) : "-");
+    cells.push_back(fmt::format("{:.2f}", TimeRatio(advice, figures)));
+    cells.push_back(fmt::format("{:.0f}", figures.bytesHeld));
+    cells.push_back(fmt::format("{:.2f}", BytesRatio(advice, figures)));
+    cells.push_back(names);
+    table.AddCells(std::move(cells));
+}
+
+void AddRow(Table& table, const Advice& advice, std::size_t index) {
+    const auto& [settings, figures] = advice.findings.settings[index];
+    AddRow(table, advice,
+           {std::to_string(settings.bucketSize), std::to_string(settings.maxRecordSize),
+            std::to_string(settings.minRecordSize), std::to_string(settings.dataAlignment),
+            settings.keepEmptyBuckets ? "kept" : "released"},
+           figures, NamesOf(advice, index));
 }
 
 void PrintGivenUp(std::ostream& out, const Advice& advice) {
     std::map<std::string, unsigned int> problems;
     for (const auto& each : advice.findings.givenUp) { ++problems[each.problem]; }
     for (const auto& [problem, number] : problems) {
-        out << "   " << number << (number == 1 ? " setting was" : " settings were")
-            << " given up: " << problem << '\n';
+        fmt::print(out, "   {} {} given up: {}\n", number,
+                   number == 1 ? "setting was" : "settings were", problem);
     }
 }
 
@@ -111,9 +109,9 @@ std::string Sentences(const Advice& advice) {
     } else {
         text += "By themselves they take ";
     }
-    text += Fixed(TimeRatio(advice, pools), 2) + " of the heap's time";
+    text += fmt::format("{:.2f}", TimeRatio(advice, pools)) + " of the heap's time";
     if (!Advise::TimesDiffer(pools, heap)) { text += " (the same, within the spread of the runs)"; }
-    return text + " and\n" + Fixed(BytesRatio(advice, pools), 2) +
+    return text + " and\n" + fmt::format("{:.2f}", BytesRatio(advice, pools)) +
            " of its bytes with these settings.";
 }
 
@@ -126,7 +124,7 @@ void PrintShare(std::ostream& out, const Advice& advice, double ratio) {
     }
     const double share = *advice.allocationShare;
     out << "Allocation takes " << Percent(share) << " of the program's processor time: at "
-        << Fixed(ratio, 2) << " of the heap's time the\nprogram would take "
+        << fmt::format("{:.2f}", ratio) << " of the heap's time the\nprogram would take "
         << Percent(Advise::TimeOfProgram(share, ratio)) << ", and if allocation cost nothing "
         << Percent(Advise::TimeOfProgram(share, 0)) << ".\n";
 }
@@ -157,8 +155,9 @@ Advice TakeAdvice(Trace::StepReader& reader, unsigned int seconds, const Progres
 
     Advise::ForkedMeter meter(recording);
     advice.findings = Advise::Search(meter, seconds, [&](std::size_t numTried) {
-        progress.Show(std::to_string(numTried) + " settings tried, " + Fixed(meter.Elapsed(), 0) +
-                      " s of at most " + std::to_string(seconds));
+        progress.Show(std::to_string(numTried) + " settings tried, " +
+                      fmt::format("{:.0f}", meter.Elapsed()) + " s of at most " +
+                      std::to_string(seconds));
     });
     progress.Clear();
     advice.verdict = Advise::Judge(advice.findings);
@@ -187,21 +186,28 @@ void PrintTable(std::ostream& out, const Advice& advice, bool all) {
     if (advice.numLeftOut != 0) {
         out << ", the first of " << advice.numEvents + advice.numLeftOut;
     }
-    out << "\n   bucket     max     min  align  empty       ns an              of        bytes     "
-           " of"
-           "\n     size  record  record   ment  buckets     event  spread    heap         held    "
-           "heap\n";
-    out << "   " << std::left << std::setw(40) << "heap";
-    PrintFigures(out, advice, advice.findings.heap);
     out << '\n';
+    Table table({{"bucket\nsize"},
+                 {"max\nrecord"},
+                 {"min\nrecord"},
+                 {"align-\nment"},
+                 {"empty\nbuckets", 0, Align::Left},
+                 {"ns an\nevent"},
+                 {"spread"},
+                 {"of\nheap"},
+                 {"bytes\nheld"},
+                 {"of\nheap"},
+                 {"", 0, Align::Left}});
+    AddRow(table, advice, {"heap", "", "", "", ""}, advice.findings.heap, "");
     std::size_t numLeftOut = 0;
     for (std::size_t place = 0; place < order.size(); ++place) {
         if (all || place < numShown || !NamesOf(advice, order[place]).empty()) {
-            PrintRow(out, advice, order[place]);
+            AddRow(table, advice, order[place]);
         } else {
             ++numLeftOut;
         }
     }
+    table.Write(out);
     if (numLeftOut != 0) { out << "   and " << numLeftOut << " more settings that were tried\n"; }
     PrintGivenUp(out, advice);
 }
