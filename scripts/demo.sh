@@ -4,9 +4,8 @@
 # this machine; then both stand side by side. In the end `mempool run` tells of a program that knows
 # nothing of pools, Perl, whether it would gain from them.
 #
-# DEMO_MEGABYTES (100) is the size of the text, DEMO_ROUNDS (5) how often each side runs, DEMO_FOLDER
-# (build/demo) where the text and the report go. DEMO_PROGRAM is a WordPools that is built already and
-# DEMO_MEMPOOL a mempool: with the first alone, the end is left out.
+# DEMO_MEGABYTES (100) is the size of the text, DEMO_ROUNDS (5) how often each side runs. The text and
+# the report stay in build/demo.
 if [[ ${1:-} == -h || ${1:-} == --help ]]; then
     echo "usage: scripts/demo.sh [FILE...]   (- is the standard input)"
     exit
@@ -14,7 +13,7 @@ fi
 # shellcheck source=scripts/build.sh
 source "$(dirname "$0")/build.sh"
 
-megabytes=${DEMO_MEGABYTES:-100} rounds=${DEMO_ROUNDS:-5} folder=${DEMO_FOLDER:-build/demo}
+megabytes=${DEMO_MEGABYTES:-100} rounds=${DEMO_ROUNDS:-5} folder=build/demo
 mkdir -p "$folder"
 scratch=$(mktemp -d "$folder/scratch.XXXXXX")
 trap 'rm -rf "$scratch"' EXIT
@@ -66,14 +65,10 @@ for file in "$@"; do
 done
 if [ $# -gt 0 ] && [ ${#files[@]} -eq 0 ]; then exit 1; fi
 
-program=${DEMO_PROGRAM:-} mempool=${DEMO_MEMPOOL:-}
-if [ -z "$program" ]; then
-    step "Packages"
-    scripts/install-packages.sh build tools
-    build release WordPools mempool mempool-record
-    program=build/release/examples/WordPools
-    mempool=build/release/tools/mempool/mempool
-fi
+step "Packages"
+scripts/install-packages.sh build tools
+build release WordPools mempool mempool-record
+program=build/release/examples/WordPools
 if [ $# -eq 0 ]; then
     make_text
     files=("$text")
@@ -105,11 +100,9 @@ else
 fi
 awk -f scripts/demo-table.awk "$scratch/figures"
 
-if [ -n "$mempool" ]; then
-    step "mempool run perl: the distinct words again, by a program that knows nothing of pools"
-    cat -- "${files[@]}" | head --bytes=3000000 >"$scratch/start" || true
-    # shellcheck disable=SC2016  # The variables are Perl's.
-    "$mempool" run --seconds 10 perl -ne '$n{$_}++ for split; END { print keys(%n) . " words\n" }' \
-        "$scratch/start" 2>&1
-fi
+step "mempool run perl: the distinct words again, by a program that knows nothing of pools"
+cat -- "${files[@]}" | head --bytes=3000000 >"$scratch/start" || true
+# shellcheck disable=SC2016  # The variables are Perl's.
+build/release/tools/mempool/mempool run --seconds 10 \
+    perl -ne '$n{$_}++ for split; END { print keys(%n) . " words\n" }' "$scratch/start" 2>&1
 exit $status

@@ -1,4 +1,4 @@
-// WordPools and the demo as their users run them: commands in a folder of made texts, each with its
+// WordPools as its users run it: commands in a folder of made texts, each with its
 // output, its standard error and its exit status, against expected/wordpools.txt. Times and memory
 // are no fixed figures: they are held against bounds. OBR_MEMPOOL_APPROVE makes the test write the
 // text anew.
@@ -115,31 +115,6 @@ TEST_F(WordPools, MeasuresItself) {
     EXPECT_TRUE(dropping < reading && reading < 60 && 2500 < peak && peak < 1e6) << figures.str();
     EXPECT_THAT(Run("script -qec 'WordPools --figures large' /dev/null"),
                 ContainsRegex("\n1 MB read\r\x1b\\[K2 MB read\r\x1b\\[K[0-9. ]+\r\n$"));
-}
-
-TEST_F(WordPools, AreShownByTheDemo) {
-    Write("spy", "#!/bin/sh\necho $1 $2 >>${0%spy}spied\nexec WordPools \"$@\"\n");
-    const std::string demo =
-        "chmod +x spy && DEMO_PROGRAM=$PWD/spy DEMO_FOLDER=$PWD/demo "
-        "DEMO_ROUNDS=1 DEMO_MEGABYTES=1 $SCRIPTS/demo.sh";
-    const std::string table =
-        "\n +pools on +pools off +ratio\n"
-        "time to read and keep( +[0-9.]+ m?s){2} +[0-9.]+\n"
-        "time to drop( +[0-9.]+ [um]?s){2} +[0-9.-]+\n"
-        "peak memory, resident( +[0-9.]+ MiB){2} +[0-9.]+\n\n"
-        "Pools [a-z ]+ here: [^\n]+\\.\n--- standard error\n";
-    EXPECT_THAT(Run(demo), ContainsRegex(table + "Round 1 of 1, pools on: .*[0-9] s to drop\n$"));
-    EXPECT_EQ(std::filesystem::file_size(folder + "demo/text"), 1000000U);
-    EXPECT_THAT(Content(folder + "spied"),
-                ContainsRegex("^--report .*/text\n--figures .*/text\n--figures --heap\n$"));
-
-    const std::string text = Run(demo + " nowhere mixed - <large");
-    EXPECT_THAT(text, ContainsRegex(table + ".*nowhere.*\n--- exit 1\n$"));
-    const std::string report = Content(folder + "demo/report.txt");
-    EXPECT_THAT(report, HasSubstr("\nMemPool::Mgr " + folder + "mixed\n"));
-    std::size_t end = 0;
-    for (int line = 0; line < 40; ++line) { end = report.find('\n', end) + 1; }
-    EXPECT_THAT(text, HasSubstr("\n" + report.substr(0, end) + "\n== "));
 }
 
 }  // namespace
