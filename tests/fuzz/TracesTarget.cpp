@@ -256,7 +256,7 @@ std::string CompactOf(std::string_view records, std::size_t firstSize) {
         }
         file += packed;
     }
-    return file.append(Trace::blockHeaderSize, '\0');
+    return file.append(Trace::chunkHeaderSize, '\0');
 }
 
 }  // namespace

@@ -144,7 +144,7 @@ TEST(Compact, IsReadAsFarAsItGoes) {
         EXPECT_EQ(text.lines, everyKind.substr(0, text.lines.size())) << size;
         if (size > file.size() - 20) { EXPECT_GE(text.lines.size(), firstBlock) << size; }
     }
-    EXPECT_EQ(ReadText(file + "x").problem, "there is more behind its end");
+    EXPECT_EQ(ReadText(file + "x").problem, "there is more after its end");
     for (std::size_t bit = 8 * Trace::compactMagic.size(); bit != 8 * file.size(); ++bit) {
         std::string damaged = file;
         damaged[bit / 8] = static_cast<char>(damaged[bit / 8] ^ 1 << bit % 8);

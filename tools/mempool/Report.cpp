@@ -81,10 +81,7 @@ int ReportOn(const Options& options) {
 int WriteReport(Trace::StepReader& reader, const ReportOptions& options) {
     const std::string problem = options.settings.Problem();
     if (!problem.empty()) { throw std::runtime_error("these settings make no pool: " + problem); }
-    if (!options.html.empty() && !Report::HasPage()) {
-        throw std::runtime_error(
-            "this program was built without the Debian package libjs-d3 and makes no pages");
-    }
+    if (!options.html.empty()) { Report::CheckCanMakePage(); }
     const Progress progress(reader.Name());
     const Report::Analysis analysis = Report::Analyse(reader, options.settings, [&](auto position) {
         progress.Show("line " + std::to_string(position));

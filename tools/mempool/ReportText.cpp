@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "mempool/SafeText.hpp"
+#include "trace/CutText.hpp"
 
 namespace Tool {
 
@@ -53,14 +54,6 @@ std::string Percent(std::uint64_t part, std::uint64_t whole) {
 std::string Tight(std::uint64_t part, std::uint64_t whole) {
     const std::string percent = Percent(part, whole);
     return whole == 0 ? percent : percent.substr(0, percent.size() - 2) + "%";
-}
-
-// At most so many bytes, to the start of a character of UTF-8, and dots for the rest.
-std::string Cut(const std::string& text, std::size_t bytes) {
-    if (text.size() <= bytes) { return text; }
-    std::size_t end = bytes - 3;
-    while (end > 0 && (static_cast<unsigned char>(text[end]) & 0xC0) == 0x80) { --end; }
-    return text.substr(0, end) + "...";
 }
 
 // Right-aligned cells.
@@ -268,7 +261,8 @@ void PrintGroups(std::ostream& out, const Analysis& analysis, Extent extent) {
             << Tight(tally.lifetimes[0] + tally.lifetimes[1], blocks) << std::setw(7)
             << Tight(tally.never, blocks) << std::setw(9) << Tight(group.runs.together, blocks)
             << std::setw(7) << Tight(group.runs.clearable, blocks) << "  "
-            << (extent == Extent::All ? SafeText(group.name) : Cut(SafeText(group.name), 36))
+            << (extent == Extent::All ? SafeText(group.name)
+                                      : Trace::CutText(SafeText(group.name), 36))
             << '\n';
     }
 }

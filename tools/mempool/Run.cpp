@@ -82,10 +82,7 @@ private:
 // Ahead of a run that may take long.
 void CheckPage(const std::string& path) {
     if (path.empty()) { return; }
-    if (!Report::HasPage()) {
-        throw std::runtime_error(
-            "this program was built without the Debian package libjs-d3 and makes no pages");
-    }
+    Report::CheckCanMakePage();
     const bool isNew = !std::filesystem::exists(path);
     if (!std::ofstream(path, std::ios::app)) {
         throw std::system_error(errno, std::generic_category(), path);

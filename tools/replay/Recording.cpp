@@ -32,7 +32,10 @@ public:
             case Trace::Kind::Freed:
                 Forget(step.block);
                 break;
-            default:
+            case Trace::Kind::Created:
+            case Trace::Kind::Allocated:
+            case Trace::Kind::Info:
+            case Trace::Kind::Malformed:
                 break;
         }
         recording.steps.push_back(step);

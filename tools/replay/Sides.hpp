@@ -100,8 +100,10 @@ void Run(Side& side, const Recording& recording, std::size_t numSteps) {
             case Trace::Kind::Destroyed:
                 side.Destroy(*step);
                 break;
-            default:
-                break;
+            case Trace::Kind::Named:
+            case Trace::Kind::Info:
+            case Trace::Kind::Malformed:
+                break;  // In no recording.
         }
     }
 }

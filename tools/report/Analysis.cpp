@@ -1,4 +1,4 @@
-// The one pass over a trace, and what is summed up behind it.
+// The pass over a trace, and what is summed up after it.
 
 #include "report/Analysis.hpp"
 
@@ -22,7 +22,7 @@ public:
         onePool.Create(0);
     }
 
-    // Takes a step behind which `blocks` stands.
+    // `blocks` is as the step has left it.
     void Take(const Trace::Step& step, const Trace::Resolver& blocks) {
         if (step.kind == Trace::Kind::Named) { return; }
         ++result.events;
@@ -48,8 +48,10 @@ public:
                 Drop(step.pool, blocks.Dropped(), End::Destroyed);
                 pools.Destroy(step.pool);
                 break;
-            default:
-                break;
+            case Trace::Kind::Named:
+            case Trace::Kind::Info:
+            case Trace::Kind::Malformed:
+                return;
         }
         Look();
     }
@@ -103,7 +105,7 @@ private:
                               onePool.Allocate(0, block.size)};
     }
 
-    // A block goes. Its own pool is told by the caller.
+    // For each block that goes. The caller updates the model of its own pool.
     void Release(std::uint32_t pool, const Trace::Block& block, End end) {
         const Alive& was = alive[block.index];
         onePool.Free(0, was.placeInOne, block.size);
@@ -128,7 +130,7 @@ private:
         if (result.total.live.blocks == 0) { onePool.Clear(0); }
     }
 
-    // What there is to see behind an event.
+    // After each event.
     void Look() {
         const BlockSum& live = result.total.live;
         const Moment now = {result.events,
@@ -178,8 +180,8 @@ private:
     PoolModel pools;
     PoolModel onePool;
     Sizes sizes;
-    std::vector<PoolRow> rows;  // By the index of the traced pool.
-    std::vector<Alive> alive;   // By the index of the block.
+    std::vector<PoolRow> rows;  // By index of the traced pool.
+    std::vector<Alive> alive;   // By index of the block.
     std::uint64_t heapBytes = 0;
     Timeline timeline;
     FillMap fill;

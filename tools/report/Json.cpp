@@ -1,4 +1,4 @@
-// The keys of the JSON, and what stands under each.
+// The keys of the JSON and their values.
 
 #include "report/Json.hpp"
 
@@ -11,6 +11,8 @@
 
 #include <nlohmann/json.hpp>
 
+#include "trace/CutText.hpp"
+
 namespace Report {
 
 namespace {
@@ -21,7 +23,7 @@ Json ToJson(const BlockSum& sum) {
     return {{"blocks", sum.blocks}, {"bytes", sum.bytes}};
 }
 
-// Adds the figures of a set of blocks to those that `json` has.
+// Adds the figures of a set of blocks.
 void AddTally(Json& json, const Tally& tally) {
     json["blocks"] = tally.all.blocks;
     json["bytes"] = tally.all.bytes;
@@ -45,7 +47,7 @@ Json ToJson(const Moment& moment) {
             {"heap_chunks", moment.chunks}};
 }
 
-// A fact that is nothing but a number is one; a fact that the trace does not tell is null.
+// A number if the fact is one, null if the trace does not have it.
 Json FactValue(const std::map<std::string, std::string>& facts, const char* key) {
     const auto fact = facts.find(key);
     if (fact == facts.end()) { return nullptr; }
@@ -59,7 +61,7 @@ void AddFacts(Json& json, const Analysis& analysis) {
          {"program", "by", "cpu_seconds", "allocation_share", "threads", "foreign_frees"}) {
         json[key] = FactValue(analysis.facts, key);
     }
-    // A program may be called as it likes, a number too.
+    // The name of a program may be a number.
     if (!json["program"].is_null()) { json["program"] = analysis.facts.at("program"); }
     json["facts"] = analysis.facts;
 
@@ -104,19 +106,13 @@ void AddSizes(Json& json, const Analysis& analysis) {
     }
 }
 
-// Cuts a text at the start of a character of UTF-8.
-std::string Cut(const std::string& text, std::size_t bytes) {
-    if (text.size() <= bytes) { return text; }
-    while (bytes > 0 && (static_cast<unsigned char>(text[bytes]) & 0xC0) == 0x80) { --bytes; }
-    return text.substr(0, bytes) + "...";
-}
-
 void AddGroups(Json& json, const Analysis& analysis, const JsonLimits& limits) {
     json["num_groups"] = analysis.groups.size();
     json["groups"] = Json::array();
     for (const GroupRow& row : analysis.groups) {
         if (json["groups"].size() == limits.groups) { break; }
-        Json group = {{"name", Cut(row.name, limits.nameBytes)}, {"pools", row.numPools}};
+        Json group = {{"name", Trace::CutText(row.name, limits.nameBytes)},
+                      {"pools", row.numPools}};
         AddTally(group, row.tally);
         group["together"] = ToJson(row.runs);
         json["groups"].push_back(std::move(group));
@@ -137,7 +133,7 @@ void AddTimeline(Json& json, const Analysis& analysis) {
     json["timeline"] = std::move(lines);
 }
 
-// A row for each size class that ever has a bucket, those of most bytes if they are too many.
+// A row per size class that ever has a bucket; those with the most bytes if they are too many.
 void AddFill(Json& json, const Analysis& analysis, const JsonLimits& limits) {
     struct Row {
         std::vector<std::uint64_t> used;

@@ -1,4 +1,4 @@
-// An analysis as JSON, with every figure under a key that stays. docs/report.md tells the keys.
+// An analysis as JSON. docs/report.md lists the keys, which stay as they are.
 
 #ifndef OBR_TOOLS_REPORT_JSON_HPP
 #define OBR_TOOLS_REPORT_JSON_HPP
@@ -11,14 +11,14 @@
 
 namespace Report {
 
-// What is left out where the whole would be too long. The keys are the same.
+// The most that is written of each, for where the whole would be too long.
 struct JsonLimits {
     std::size_t groups = std::numeric_limits<std::size_t>::max();
     std::size_t nameBytes = std::numeric_limits<std::size_t>::max();
     std::size_t fillRows = std::numeric_limits<std::size_t>::max();
 };
 
-// One line, in UTF-8; what is no UTF-8 in a name stands as the sign for that.
+// One line in UTF-8, with the replacement character for bytes of a name that are not UTF-8.
 std::string ToJson(const Analysis& analysis, const JsonLimits& limits = {});
 
 }  // namespace Report

@@ -1,6 +1,5 @@
-// An analysis as one page of HTML that needs nothing else: style, scripts and figures are in it.
-// The parts that are the same for all pages are put together when the tools are built, if the
-// library for the charts is there then.
+// An analysis as one self-contained page of HTML, with its style, scripts and figures. The build of
+// the tools puts the fixed parts together, if the library for the charts is installed then.
 
 #ifndef OBR_TOOLS_REPORT_PAGE_HPP
 #define OBR_TOOLS_REPORT_PAGE_HPP
@@ -12,13 +11,14 @@
 
 namespace Report {
 
-// Whether pages can be made.
-bool HasPage();
+// Throws a std::runtime_error if the tools were built without the library for the charts, and can
+// make no page.
+void CheckCanMakePage();
 
-// The largest groups alone, if there are very many: the page stays below 5 MB.
+// Only the largest groups, if there are very many: the page stays below 5 MB.
 std::string MakePage(const Analysis& analysis);
 
-// The page ahead of the data and behind, from a file that the build makes.
+// The page before and after the data, from a file that the build makes.
 std::string_view PageHead();
 std::string_view PageTail();
 

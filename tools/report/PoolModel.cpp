@@ -1,4 +1,4 @@
-// The lists of buckets, as the library keeps them.
+// The lists of buckets as the library keeps them.
 
 #include "report/PoolModel.hpp"
 
@@ -14,7 +14,7 @@ constexpr std::uint32_t recHdrSize = 4;
 constexpr std::uint32_t bucketHeadSize = 48;
 constexpr std::uint32_t extRecHeadSize = 24;
 constexpr std::uint32_t maxBucketSize = 65535;
-constexpr std::uint32_t firstOffset = 2;  // What a bucket's size counts beside its records.
+constexpr std::uint32_t firstOffset = 2;  // Bytes of a bucket's size that no record uses.
 constexpr std::uint64_t poolBytes = MallocBytes(88);
 constexpr std::uint64_t groupBytes = MallocBytes(48);
 
@@ -33,7 +33,7 @@ PoolModel::PoolModel(const Replay::PoolSettings& settings)
     const std::uint32_t largestRecord = settings.maxRecordSize / alignment * alignment;
     const std::uint32_t bucketSize = std::min(settings.bucketSize, maxBucketSize);
     classes.resize((largestRecord - smallestRecord) / alignment + 1);
-    // Where several sizes share a class, its records have room for the largest of them.
+    // If several sizes share a class, its records have room for the largest.
     for (std::uint32_t data = alignment; data + recHdrSize <= largestRecord; data += alignment) {
         SizeClass& sizeClass = classes[ClassOf(data)];
         sizeClass.dataSize = data;
@@ -140,7 +140,7 @@ std::uint32_t PoolModel::AddBucket(Group& group, SizeClass& sizeClass) {
     return index;
 }
 
-// A bucket with room enters in front.
+// A bucket that gains room becomes the first.
 void PoolModel::LinkFree(Group& group, std::uint32_t index) {
     buckets[index].prevFree = 0;
     buckets[index].nextFree = group.freeHead;

@@ -1,11 +1,11 @@
-// What pools hold while a trace runs, worked out without their memory: which bucket each block
-// would lie in, and how many buckets there are. The rules are those of the library: a size class
-// takes records from the bucket that most recently gained room, a bucket goes with its last record
-// unless it is kept, what is too large is a heap record. So millions of blocks of a program of any
-// size are followed in a few bytes each.
+// What pools would hold over the course of a trace, computed without their memory: which bucket
+// each block would be in, and how many buckets there are. The rules are those of the library: a
+// size class takes records from the bucket that most recently gained room, a bucket is released
+// with its last record unless it is kept, and a block that is too large is a heap record. Each
+// block takes a few bytes, whatever its size.
 //
 // Bytes are counted as a replay counts them: what malloc lends for buckets, heap records and the
-// pools' own tables, their names left out.
+// pools' own tables. The names of pools are not counted.
 
 #ifndef OBR_TOOLS_REPORT_POOLMODEL_HPP
 #define OBR_TOOLS_REPORT_POOLMODEL_HPP
@@ -17,23 +17,23 @@
 
 namespace Report {
 
-// Where a block lies: a bucket, or none for a heap record.
+// The bucket of a block, or heapRecord.
 using Place = std::uint32_t;
 constexpr Place heapRecord = 0;
 
 struct SizeClass {
-    std::uint32_t dataSize = 0;  // Bytes of its records without their header of 4.
+    std::uint32_t dataSize = 0;  // Bytes of a record without its header of 4.
     std::uint32_t recsPerBucket = 0;
     std::uint64_t usedRecords = 0;  // Now, in all pools.
-    std::uint64_t records = 0;      // Now, in all buckets of it.
+    std::uint64_t records = 0;      // Now, in all its buckets.
 };
 
 class PoolModel {
 public:
-    // The settings must be such that a pool can be built.
+    // A pool must be possible with the settings.
     explicit PoolModel(const Replay::PoolSettings& settings);
 
-    // Pools are told by numbers that the caller gives, small ones and each once.
+    // The caller numbers the pools: small numbers, each created once.
     void Create(std::uint32_t pool);
     Place Allocate(std::uint32_t pool, std::uint32_t size);
     void Free(std::uint32_t pool, Place place, std::uint32_t size);
@@ -43,16 +43,16 @@ public:
     std::uint64_t BytesHeld() const { return bytesHeld; }
     const std::vector<SizeClass>& Classes() const { return classes; }
 
-    // Whether a block of that size lies in a bucket, and what it then takes: its size rounded up.
+    // Whether a block of that size goes into a bucket, and if so, its size rounded up.
     bool IsRecord(std::uint32_t size) const { return size < sizesInBuckets; }
     std::uint32_t RecordBytes(std::uint32_t size) const { return classes[ClassOf(size)].dataSize; }
 
 private:
-    // In one vector, so that 0 stands for none, and no bucket costs a request to the heap.
+    // All in one vector, linked by index; 0 is none.
     struct Bucket {
         std::uint32_t next = 0;  // In the group's list of all buckets.
         std::uint32_t prev = 0;
-        std::uint32_t nextFree = 0;  // In its list of those with room.
+        std::uint32_t nextFree = 0;  // In the list of those with room.
         std::uint32_t prevFree = 0;
         std::uint32_t used = 0;
     };
@@ -62,7 +62,7 @@ private:
         bool exists = false;
     };
     struct Pool {
-        std::vector<Group> groups;    // One a size class.
+        std::vector<Group> groups;    // One per size class.
         std::uint64_t heapBytes = 0;  // Lent for its heap records.
     };
 
@@ -76,12 +76,12 @@ private:
 
     std::uint32_t alignment;
     std::uint32_t smallestRecord;
-    std::uint32_t sizesInBuckets = 0;  // Sizes below it go into buckets.
+    std::uint32_t sizesInBuckets = 0;  // Smaller sizes go into buckets.
     bool keepEmptyBuckets;
 
     std::vector<SizeClass> classes;
     std::vector<Pool> pools;
-    std::vector<Bucket> buckets;  // The first is none.
+    std::vector<Bucket> buckets;  // The first is unused.
     std::vector<std::uint32_t> unusedBuckets;
     std::uint64_t bytesHeld = 0;
 };

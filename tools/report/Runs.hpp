@@ -1,6 +1,6 @@
-// How blocks of a group of the recording die: a *run* is a row of releases without an allocation of
-// that group between. Blocks of a run of two or more die together. If the run leaves nothing of the
-// group alive, one Clear of a pool of its own would do instead.
+// Which blocks of a group die together: a *run* is a series of releases without an allocation of
+// that group in between, and the blocks of a run of two or more die together. If the run leaves no
+// block of the group alive, one Clear of a pool of its own would replace it.
 
 #ifndef OBR_TOOLS_REPORT_RUNS_HPP
 #define OBR_TOOLS_REPORT_RUNS_HPP
@@ -12,7 +12,7 @@
 
 namespace Report {
 
-// Runs of 2 to 9 blocks, of 10 to 99, and so on, and in the last all that are longer.
+// Bins for runs of 2 to 9 blocks, of 10 to 99, and so on; the last one has all that are longer.
 constexpr std::size_t numLengths = 7;
 constexpr std::size_t LengthBin(std::uint64_t numBlocks) {
     std::size_t bin = 0;
@@ -26,7 +26,7 @@ class Runs {
 public:
     void Release(std::uint64_t numBlocks) { current += numBlocks; }
 
-    // The next allocation, or the end. `numLive` are the blocks of the group that the run has left.
+    // At the next allocation and at the end. `numLive`: blocks of the group that are still alive.
     void End(std::uint64_t numLive) {
         if (current >= 2) {
             ++numRuns;
@@ -41,7 +41,7 @@ public:
         current = 0;
     }
 
-    // Those of another group, of which none goes on.
+    // Adds the runs of another group, all of which have ended.
     void Add(const Runs& other) {
         numRuns += other.numRuns;
         together += other.together;
@@ -51,15 +51,15 @@ public:
         clearable += other.clearable;
     }
 
-    std::uint64_t numRuns = 0;                            // Of two blocks or more.
+    std::uint64_t numRuns = 0;                            // With two blocks or more.
     std::uint64_t together = 0;                           // Their blocks.
     std::uint64_t longest = 0;                            // Blocks of the longest.
     std::array<std::uint64_t, numLengths> byLength = {};  // Blocks by the length of their run.
-    std::uint64_t numClears = 0;  // Those of the runs that leave nothing alive.
-    std::uint64_t clearable = 0;  // Their blocks.
+    std::uint64_t numClears = 0;                          // Those that leave no block alive.
+    std::uint64_t clearable = 0;                          // Their blocks.
 
 private:
-    std::uint64_t current = 0;  // Blocks of the run that goes on.
+    std::uint64_t current = 0;  // Blocks of the run that has not ended.
 };
 
 }  // namespace Report

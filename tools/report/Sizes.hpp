@@ -1,5 +1,5 @@
-// The blocks by their size. Sizes up to 1024 stand for themselves; above that an eighth of a power
-// of two shares a row, so that a trace of any sizes makes a table of bounded length.
+// The blocks by size. Each size up to 1024 has a row; above that the sizes within an eighth of a
+// power of two share one, so that the table is of bounded length.
 
 #ifndef OBR_TOOLS_REPORT_SIZES_HPP
 #define OBR_TOOLS_REPORT_SIZES_HPP
@@ -13,7 +13,7 @@
 namespace Report {
 
 struct SizeRow {
-    std::uint32_t smallest = 0;  // That occurs.
+    std::uint32_t smallest = 0;  // Of those that occur.
     std::uint32_t largest = 0;
     Tally tally;
 };
@@ -26,11 +26,11 @@ public:
         return rows[place];
     }
 
-    // With those that no block has.
+    // Rows without a block included.
     const std::vector<SizeRow>& Rows() const { return rows; }
 
 private:
-    // Ranges end with a power of two or an eighth of it, which real sizes often are.
+    // A range ends with a power of two or a multiple of its eighth, which real sizes often are.
     static std::size_t PlaceOf(std::uint32_t size) {
         constexpr std::uint32_t exact = 1024;
         if (size <= exact) { return size; }

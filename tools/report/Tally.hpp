@@ -1,5 +1,4 @@
-// The figures of a set of blocks: all of them, those of one size, or those of one group of the
-// recording. A tally is told of each block that comes and goes.
+// The figures of a set of blocks: all of them, those of one size, or those of one group.
 
 #ifndef OBR_TOOLS_REPORT_TALLY_HPP
 #define OBR_TOOLS_REPORT_TALLY_HPP
@@ -28,8 +27,8 @@ struct BlockSum {
     }
 };
 
-// Lifetimes in events of the trace, from the allocation to the release, in bins: within 10, above
-// that within 100, and so on, and in the last all that are longer.
+// Bins for lifetimes, in events from the allocation to the release: up to 10, up to 100, and so on;
+// the last one has all that are longer.
 constexpr std::size_t numLifetimes = 10;
 constexpr std::size_t LifetimeBin(std::uint64_t events) {
     std::size_t bin = 0;
@@ -39,18 +38,17 @@ constexpr std::size_t LifetimeBin(std::uint64_t events) {
 
 struct Tally {
     BlockSum all;
-    BlockSum inRecords;  // Of these, those that go into buckets. The others are heap records.
-    std::uint64_t padding = 0;  // Bytes that rounding adds to those in buckets.
+    BlockSum inRecords;         // Those that go into buckets. The others are heap records.
+    std::uint64_t padding = 0;  // Bytes that rounding adds to those.
     BlockSum live;
-    std::array<std::uint64_t, numLifetimes> lifetimes = {};  // Blocks that were released.
-    std::uint64_t dropped = 0;  // Of these, those that went when their pool was cleared.
-    std::uint64_t never = 0;    // Alive when their pool was destroyed, or at the end.
+    std::array<std::uint64_t, numLifetimes> lifetimes = {};  // Of released blocks.
+    std::uint64_t dropped = 0;  // Released blocks that went when their pool was cleared.
+    std::uint64_t never = 0;    // Blocks alive when their pool was destroyed, or at the end.
 
-    BlockSum atPeak;  // What lived at the peak of the trace, once that is finished.
+    BlockSum atPeak;  // Alive at the peak of the trace. Set by Finish.
 
-    // Ahead of each change of `live`, at the event with this number. `peak` is that of the peak so
-    // far. What lives there is kept when the first change behind it comes, so that a new peak costs
-    // nothing.
+    // Before each change of `live`, with the event of the change and that of the peak so far. The
+    // first change after a peak keeps what was alive at it, so that a new peak costs nothing.
     void Change(std::uint64_t event, std::uint64_t peak) {
         if (changed <= peak) { atPeak = live; }
         changed = event;

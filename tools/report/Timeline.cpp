@@ -1,9 +1,8 @@
-// Points and columns are joined in pairs each time that there are too many.
+// Joins the points in pairs whenever there are too many.
 
 #include "report/Timeline.hpp"
 
 #include <algorithm>
-#include <utility>
 
 namespace Report {
 
@@ -18,25 +17,6 @@ void Timeline::EndInterval() {
     }
     points.resize(maxPoints / 2);
     interval *= 2;
-}
-
-void FillMap::AddColumn(std::uint64_t event, const PoolModel& pools) {
-    if (columns.size() == maxColumns) {
-        for (std::size_t i = 0; i < maxColumns / 2; ++i) {
-            columns[i] = std::move(columns[2 * i + 1]);
-        }
-        columns.resize(maxColumns / 2);
-        interval *= 2;
-        if (event % interval != 0) { return; }
-    }
-    FillColumn column = {event, {}};
-    const std::vector<SizeClass>& classes = pools.Classes();
-    for (std::uint32_t number = 0; number < classes.size(); ++number) {
-        const SizeClass& sizeClass = classes[number];
-        if (sizeClass.records == 0) { continue; }
-        column.cells.push_back({number, sizeClass.usedRecords, sizeClass.records});
-    }
-    columns.push_back(std::move(column));
 }
 
 }  // namespace Report

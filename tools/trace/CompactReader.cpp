@@ -1,8 +1,9 @@
-// From compressed blocks to records, and from records to events.
+// From compressed chunks to entries, and from entries to events.
 
 #include "trace/CompactReader.hpp"
 
 #include <cstddef>
+#include <utility>
 
 #include <zstd.h>
 
@@ -37,13 +38,12 @@ std::string CompactReader::Problem() const {
 }
 
 bool CompactReader::ReadEvent(Event& event) {
-    if (hasKept) {
-        hasKept = false;
-        event = kept;
+    if (next) {
+        event = *std::exchange(next, std::nullopt);
         return true;
     }
-    while (!rest.empty() || NextBlock()) {
-        const bool isEvent = ReadRecord(event);
+    while (!rest.empty() || NextChunk()) {
+        const bool isEvent = ReadEntry(event);
         if (!isSound) {
             End(damaged);
             break;
@@ -59,77 +59,76 @@ bool CompactReader::ReadEvent(Event& event) {
     return true;
 }
 
-// Reads a record; true if it makes an event.
-bool CompactReader::ReadRecord(Event& event) {
+// Reads an entry; true if it makes an event.
+bool CompactReader::ReadEntry(Event& event) {
     const auto tag = static_cast<std::uint8_t>(rest.front());
     rest.remove_prefix(1);
-    switch (static_cast<Record>(tag & recordMask)) {
-        case Record::Pool:
+    switch (static_cast<Entry>(tag & entryMask)) {
+        case Entry::Pool:
             if (pools.size() == maxPools) { isSound = false; }
             pools.push_back(TakeNumber());
             return false;
-        case Record::NoPools:
+        case Entry::NoPools:
             pools.clear();
             return false;
-        case Record::Created:
+        case Entry::Created:
             event.kind = Kind::Created;
             TakePool(tag, event);
             return true;
-        case Record::Destroyed:
+        case Entry::Destroyed:
             event.kind = Kind::Destroyed;
             TakePool(tag, event);
             return true;
-        case Record::Cleared:
+        case Entry::Cleared:
             event.kind = Kind::Cleared;
             TakePool(tag, event);
             return true;
-        case Record::Allocated:
+        case Entry::Allocated:
             event.kind = Kind::Allocated;
             TakePool(tag, event);
             TakeBlock(tag, event);
             event.size = TakeNumber();
             return Own(event);
-        case Record::Freed:
+        case Entry::Freed:
             event.kind = Kind::Freed;
             TakePool(tag, event);
             TakeBlock(tag, event);
             return true;
-        case Record::Owned:
+        case Entry::Owned:
             isOwned = true;
             return false;
-        case Record::Released:
+        case Entry::Released:
             TakeBlock(tag, event);
             return Release(event);
-        case Record::Thread:
+        case Entry::Thread:
             thread = TakeNumber();
             return false;
-        case Record::Named:
+        case Entry::Named:
             event.kind = Kind::Named;
             TakePool(tag, event);
             event.text = TakeText();
             return true;
-        case Record::Info:
+        case Entry::Info:
             event.kind = Kind::Info;
             event.key = TakeText();
             event.text = TakeText();
             return true;
-        default:
-            isSound = false;
-            return false;
     }
+    isSound = false;
+    return false;
 }
 
-// Unpacks the next block; false at the end of the trace.
-bool CompactReader::NextBlock() {
+// Decompresses the next chunk; false at the end of the trace.
+bool CompactReader::NextChunk() {
     if (atEnd) { return false; }
     if (atStart) { input.Skip(compactMagic.size()); }
     atStart = false;
-    if (!HasAhead(blockHeaderSize)) { return End(brokenOff); }
+    if (!HasAhead(chunkHeaderSize)) { return End(brokenOff); }
     const std::size_t packedSize = Size(input.Ahead());
-    const std::size_t plainSize = Size(input.Ahead().substr(blockHeaderSize / 2));
-    input.Skip(blockHeaderSize);
+    const std::size_t plainSize = Size(input.Ahead().substr(chunkHeaderSize / 2));
+    input.Skip(chunkHeaderSize);
     if (packedSize == 0 && plainSize == 0) {
-        return End(HasAhead(1) ? "there is more behind its end" : "");
+        return End(HasAhead(1) ? "there is more after its end" : "");
     }
     if (plainSize == 0 || plainSize > maxPlainSize ||
         packedSize > ZSTD_compressBound(maxPlainSize)) {
@@ -159,15 +158,15 @@ bool CompactReader::End(const char* why) {
     return false;
 }
 
-// Notes whose block it is. A recorder may have missed how an earlier one at its address went.
+// Keeps whose block it is. A recorder may have missed the release of an earlier one at its address,
+// which then precedes it.
 bool CompactReader::Own(Event& event) {
     if (!isOwned || !isSound) { return true; }
     const auto [place, isNew] = owners.try_emplace(event.block);
     const std::uint64_t formerPool = place->second.pool;
     place->second = {event.pool, thread};
     if (isNew) { return true; }
-    kept = event;
-    hasKept = true;
+    next = event;
     event.kind = Kind::Freed;
     event.pool = formerPool;
     return true;

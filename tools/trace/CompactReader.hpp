@@ -1,9 +1,10 @@
-// Reads a trace in its compact form. A damaged one is read as far as it goes.
+// Reads a trace in its compact form, a damaged one up to the damage.
 
 #ifndef OBR_TOOLS_TRACE_COMPACTREADER_HPP
 #define OBR_TOOLS_TRACE_COMPACTREADER_HPP
 
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <unordered_map>
@@ -17,11 +18,12 @@ namespace Trace {
 
 class CompactReader final : public EventSource {
 public:
-    // The input begins with the magic.
+    // The input must begin with the magic.
     explicit CompactReader(Input bytes) : input(std::move(bytes)) {}
 
     bool Next(Event& event) override;
-    std::uint64_t Position() const override { return number; }  // As in the trace's text.
+    // The line that `mempool text` prints for the event.
+    std::uint64_t Position() const override { return number; }
     std::string Problem() const override;
 
 private:
@@ -31,8 +33,8 @@ private:
     };
 
     bool ReadEvent(Event& event);
-    bool ReadRecord(Event& event);
-    bool NextBlock();
+    bool ReadEntry(Event& event);
+    bool NextChunk();
     bool HasAhead(std::size_t size);
     bool End(const char* why);
 
@@ -45,25 +47,24 @@ private:
     void TakeBlock(std::uint8_t tag, Event& event);
 
     Input input;
-    std::vector<char> plain;  // The block that is read.
-    std::string_view rest;    // What is still to be read of it.
-    bool isSound = true;      // No record of it was cut.
+    std::vector<char> plain;  // The current chunk.
+    std::string_view rest;    // Its entries that are not read yet.
+    bool isSound = true;      // Whether all entries so far made sense.
     bool atStart = true;
     bool atEnd = false;
     const char* problem = "";
     std::uint64_t number = 0;
 
-    std::vector<std::uint64_t> pools;  // Their addresses, by their indices.
+    std::vector<std::uint64_t> pools;  // Addresses, by index.
     std::uint64_t lastPool = 0;
     std::uint64_t lastBlock = 0;
     std::uint64_t thread = 0;
 
     bool isOwned = false;
-    std::unordered_map<std::uint64_t, Owner> owners;  // Of the blocks that live.
+    std::unordered_map<std::uint64_t, Owner> owners;  // Of live blocks, by address.
     std::uint64_t numForeignFrees = 0;
-    std::string foreignFrees;  // Its text.
-    Event kept;                // An event that another one had to go ahead of.
-    bool hasKept = false;
+    std::string foreignFrees;   // The same as text.
+    std::optional<Event> next;  // An event read already, if another one had to precede it.
 };
 
 }  // namespace Trace

@@ -1,4 +1,4 @@
-// From events to records, and from records to compressed blocks.
+// From events to entries, and from entries to compressed chunks.
 
 #include "trace/CompactWriter.hpp"
 
@@ -8,11 +8,13 @@
 #include <stdexcept>
 #include <utility>
 
+#include "trace/CutText.hpp"
+
 namespace Trace {
 
 namespace {
 
-constexpr int compressionLevel = 1;  // The program that is recorded shares its processors with us.
+constexpr int compressionLevel = 1;  // The recorded program shares the processors.
 
 }  // namespace
 
@@ -22,34 +24,34 @@ CompactWriter::CompactWriter(Sink byteSink)
     ZSTD_CCtx_setParameter(context.get(), ZSTD_c_compressionLevel, compressionLevel);
     ZSTD_CCtx_setParameter(context.get(), ZSTD_c_checksumFlag, 1);
     plain.reserve(maxPlainSize);
-    packed.resize(blockHeaderSize + ZSTD_compressBound(maxPlainSize));
+    packed.resize(chunkHeaderSize + ZSTD_compressBound(maxPlainSize));
     sink(compactMagic);
 }
 
 void CompactWriter::Write(const Event& event) {
     switch (event.kind) {
         case Kind::Created:
-            TagWithPool(Record::Created, event.pool);
+            TagWithPool(Entry::Created, event.pool);
             break;
         case Kind::Destroyed:
-            TagWithPool(Record::Destroyed, event.pool);
+            TagWithPool(Entry::Destroyed, event.pool);
             break;
         case Kind::Cleared:
-            TagWithPool(Record::Cleared, event.pool);
+            TagWithPool(Entry::Cleared, event.pool);
             break;
         case Kind::Allocated:
-            TagWithBlock(Record::Allocated, PoolFlag(event.pool), event.block);
+            TagWithBlock(Entry::Allocated, PoolFlag(event.pool), event.block);
             AppendNumber(event.size);
             break;
         case Kind::Freed:
-            TagWithBlock(Record::Freed, PoolFlag(event.pool), event.block);
+            TagWithBlock(Entry::Freed, PoolFlag(event.pool), event.block);
             break;
         case Kind::Named:
-            TagWithPool(Record::Named, event.pool);
+            TagWithPool(Entry::Named, event.pool);
             AppendText(event.text);
             break;
         case Kind::Info:
-            Tag(Record::Info, 0);
+            Tag(Entry::Info, 0);
             AppendText(event.key);
             AppendText(event.text);
             break;
@@ -60,39 +62,38 @@ void CompactWriter::Write(const Event& event) {
 }
 
 void CompactWriter::WriteThread(std::uint64_t number) {
-    Tag(Record::Thread, 0);
+    Tag(Entry::Thread, 0);
     AppendNumber(number);
 }
 
 void CompactWriter::Flush() {
     if (plain.empty()) { return; }
     const std::size_t size =
-        ZSTD_compress2(context.get(), packed.data() + blockHeaderSize,
-                       packed.size() - blockHeaderSize, plain.data(), plain.size());
+        ZSTD_compress2(context.get(), packed.data() + chunkHeaderSize,
+                       packed.size() - chunkHeaderSize, plain.data(), plain.size());
     if (ZSTD_isError(size) != 0) { throw std::runtime_error(ZSTD_getErrorName(size)); }
     WriteHeader(size);
     plain.clear();
-    sink({packed.data(), blockHeaderSize + size});
+    sink({packed.data(), chunkHeaderSize + size});
 }
 
 void CompactWriter::Finish() {
     Flush();
     WriteHeader(0);
-    sink({packed.data(), blockHeaderSize});
+    sink({packed.data(), chunkHeaderSize});
 }
 
-// Finds the index of the pool, gives it one if it has none, and returns the flag that tells whether
-// it is the last one again.
+// Finds the index of the pool, or gives it one. Returns samePool if it is the last one again, or 0.
 std::uint8_t CompactWriter::PoolFlag(std::uint64_t address) {
     if (address == lastPool && !poolIndices.empty()) { return samePool; }
     auto place = poolIndices.find(address);
     if (place == poolIndices.end()) {
         if (poolIndices.size() == maxPools) {
             poolIndices.clear();
-            Tag(Record::NoPools, 0);
+            Tag(Entry::NoPools, 0);
         }
         place = poolIndices.emplace(address, poolIndices.size()).first;
-        Tag(Record::Pool, 0);
+        Tag(Entry::Pool, 0);
         AppendNumber(address);
     }
     lastPool = address;
@@ -100,15 +101,15 @@ std::uint8_t CompactWriter::PoolFlag(std::uint64_t address) {
     return 0;
 }
 
-void CompactWriter::TagWithPool(Record record, std::uint64_t pool) {
+void CompactWriter::TagWithPool(Entry entry, std::uint64_t pool) {
     const std::uint8_t flag = PoolFlag(pool);
-    Tag(record, flag);
+    Tag(entry, flag);
     if (flag == 0) { AppendNumber(lastPoolIndex); }
 }
 
-// The tag, the pool that PoolFlag has found, if the record tells one, and the block.
-void CompactWriter::TagWithBlock(Record record, std::uint8_t flags, std::uint64_t block) {
-    const bool tellsPool = record != Record::Released && (flags & samePool) == 0;
+// The tag, the index that PoolFlag has found, if the entry has one, and the block.
+void CompactWriter::TagWithBlock(Entry entry, std::uint8_t flags, std::uint64_t block) {
+    const bool hasPool = entry != Entry::Released && (flags & samePool) == 0;
     std::uint64_t distance = block - lastBlock;
     lastBlock = block;
     if (distance >> 63 != 0) {
@@ -120,8 +121,8 @@ void CompactWriter::TagWithBlock(Record record, std::uint8_t flags, std::uint64_
         distance >>= unitShift;
         flags |= inUnits;
     }
-    Tag(record, flags);
-    if (tellsPool) { AppendNumber(lastPoolIndex); }
+    Tag(entry, flags);
+    if (hasPool) { AppendNumber(lastPoolIndex); }
     AppendNumber(distance);
 }
 
@@ -134,7 +135,7 @@ void CompactWriter::AppendNumber(std::uint64_t number) {
 }
 
 void CompactWriter::AppendText(std::string_view text) {
-    text = text.substr(0, maxTextSize);
+    text = WholeCharacters(text, maxTextSize);
     AppendNumber(text.size());
     plain.insert(plain.end(), text.begin(), text.end());
 }

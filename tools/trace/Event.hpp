@@ -1,6 +1,5 @@
-// An *event* is what a trace tells at one place: something happened to a pool or to a block, each
-// named by its address. An *event source* gives them one after the other, whatever form the trace
-// has.
+// An *event* is one thing that a trace reports: what happened to a pool or to a block, each named
+// by its address. An *event source* reads the events of a trace in order, whatever its form.
 
 #ifndef OBR_TOOLS_TRACE_EVENT_HPP
 #define OBR_TOOLS_TRACE_EVENT_HPP
@@ -11,24 +10,26 @@
 
 namespace Trace {
 
+// No switch over the kinds has a `default`, so that a new kind does not compile until every reader
+// has decided what to do with it. tools/README.md lists the files.
 enum class Kind : std::uint8_t {
-    Created,    // A pool begins.
-    Destroyed,  // A pool ends, with all that it holds.
+    Created,    // A pool is created.
+    Destroyed,  // A pool is destroyed, with all its blocks.
     Allocated,
     Freed,
-    Cleared,    // A pool drops all that it holds.
-    Named,      // What a pool is called.
+    Cleared,    // A pool drops all its blocks.
+    Named,      // The name of a pool.
     Info,       // A fact about the whole recording.
-    Malformed,  // It looks like an event but has no known form.
+    Malformed,  // A line that begins like an event and has no known form. The last kind.
 };
 
-// Only the fields that its kind has mean anything. Both texts live until the next event is read.
+// Only the fields of its kind are set. Both texts live until the next event is read.
 struct Event {
     Kind kind = Kind::Malformed;
     std::uint64_t pool = 0;
     std::uint64_t block = 0;
-    std::uint64_t size = 0;  // Bytes asked for. The largest number where 64 bits do not hold it.
-    std::string_view key;    // Of Info, whose value is the text.
+    std::uint64_t size = 0;  // Bytes asked for; the largest number if 64 bits do not hold them.
+    std::string_view key;    // Of Info; its value is in `text`.
     std::string_view text;
 };
 
@@ -39,13 +40,13 @@ public:
     EventSource& operator=(const EventSource&) = delete;
     virtual ~EventSource() = default;
 
-    // Reads the next event; false at the end, after which nothing more comes.
+    // Reads the next event; false at the end.
     virtual bool Next(Event& event) = 0;
 
-    // Where the last event stands, for messages: the number of its line, from 1 on.
+    // The line number of the last event, from 1 on, for messages.
     virtual std::uint64_t Position() const = 0;
 
-    // Behind the end: why it is not that of the whole trace, or empty if it is.
+    // After the end: why the trace is not complete, or empty if it is.
     virtual std::string Problem() const = 0;
 };
 

@@ -1,4 +1,4 @@
-// Reads through zlib, which tells a compressed file by its first bytes.
+// Reads through zlib, which knows a compressed file by its first bytes and passes on any other.
 
 #include "trace/GzSource.hpp"
 
@@ -41,7 +41,7 @@ std::string GzSource::Problem() const {
     int code = Z_OK;
     const std::string text = gzerror(file.get(), &code);
     if (code == Z_OK) { return ""; }
-    const std::size_t colon = text.find(": ");  // Of the descriptor, which zlib puts in front.
+    const std::size_t colon = text.find(": ");  // zlib puts the descriptor before it.
     return colon == std::string::npos ? text : text.substr(colon + 2);
 }
 

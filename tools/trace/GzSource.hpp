@@ -1,5 +1,4 @@
-// A file or the standard input as a byte source. What gzip has compressed is unpacked on the way,
-// anything else passes as it is.
+// A file or the standard input as a byte source. Data compressed by gzip is decompressed.
 
 #ifndef OBR_TOOLS_TRACE_GZSOURCE_HPP
 #define OBR_TOOLS_TRACE_GZSOURCE_HPP
@@ -15,7 +14,7 @@ namespace Trace {
 
 class GzSource final : public ByteSource {
 public:
-    // "-" is the standard input. A file that cannot be opened is a std::system_error.
+    // "-" is the standard input. Throws std::system_error if the file cannot be opened.
     explicit GzSource(const std::string& path);
 
     std::size_t Read(char* bytes, std::size_t size) override;

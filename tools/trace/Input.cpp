@@ -1,5 +1,5 @@
-// The buffer of an Input: what is ahead moves to its front before more is read, and it grows once
-// that fills it.
+// The buffer of an Input. The bytes ahead move to its front before more are read, and it grows when
+// they fill it.
 
 #include "trace/Input.hpp"
 

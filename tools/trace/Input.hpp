@@ -1,5 +1,5 @@
-// The bytes of a trace. A *byte source* gives them block by block; an Input keeps those that are
-// read and not yet used side by side, so that a reader looks at a line or a record as a whole.
+// The bytes of a trace. A *byte source* reads them piece by piece; an Input keeps those that are
+// not yet used side by side, so that a reader sees a line or a chunk as a whole.
 
 #ifndef OBR_TOOLS_TRACE_INPUT_HPP
 #define OBR_TOOLS_TRACE_INPUT_HPP
@@ -19,10 +19,10 @@ public:
     ByteSource& operator=(const ByteSource&) = delete;
     virtual ~ByteSource() = default;
 
-    // Reads up to `size` bytes and returns their number; 0 at the end.
+    // Reads up to `size` bytes and returns their number, 0 at the end.
     virtual std::size_t Read(char* bytes, std::size_t size) = 0;
 
-    // Behind the end: why it is not that of the whole, or empty if it is.
+    // After the end: why the bytes are not complete, or empty if they are.
     virtual std::string Problem() const = 0;
 };
 
@@ -30,13 +30,13 @@ class Input {
 public:
     explicit Input(std::unique_ptr<ByteSource> byteSource);
 
-    // The bytes read and not yet used, as long as nothing more is read.
+    // The bytes read and not yet used. Valid until the next ReadMore.
     std::string_view Ahead() const { return {buffer.data() + first, last - first}; }
 
-    // Reads on; false at the end. What was ahead stays so, at another place.
+    // Appends to the bytes ahead; false at the end.
     bool ReadMore();
 
-    // Uses up the first `number` bytes of those ahead.
+    // Drops the first `number` of the bytes ahead.
     void Skip(std::size_t number) { first += number; }
 
     std::string Problem() const { return source->Problem(); }

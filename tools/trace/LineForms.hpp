@@ -1,5 +1,5 @@
-// The forms of a trace line. Each begins with the mark and the letter of its kind; then come its
-// fields, each behind a colon. The library writes the first four, the others are a recorder's.
+// The forms of a trace line: the mark, the letter of the kind, then the fields, each after a colon.
+// The library writes the four on the left, a recorder all of them.
 //
 //     xmpt:c:POOL               xmpt:x:POOL
 //     xmpt:d:POOL               xmpt:n:POOL:TEXT
@@ -7,13 +7,15 @@
 //     xmpt:f:POOL:BLOCK:
 //
 // POOL and BLOCK are addresses of 16 hexadecimal digits, SIZE is decimal. A KEY has no colon. A
-// TEXT ends with the line.
+// TEXT ends with the line, and a free ends with an empty field.
 
 #ifndef OBR_TOOLS_TRACE_LINEFORMS_HPP
 #define OBR_TOOLS_TRACE_LINEFORMS_HPP
 
 #include <array>
 #include <cstddef>
+#include <cstdint>
+#include <iterator>
 #include <string_view>
 
 #include "trace/Event.hpp"
@@ -23,7 +25,7 @@ namespace Trace {
 constexpr std::string_view mark = "xmpt:";
 constexpr std::size_t addressDigits = 16;
 
-enum class Field : std::uint8_t { None, Pool, Block, Size, Nothing, Key, Text };
+enum class Field : std::uint8_t { None, Pool, Block, Size, Empty, Key, Text };
 
 struct LineForm {
     Kind kind;
@@ -31,16 +33,18 @@ struct LineForm {
     std::array<Field, 3> fields;  // Up to the first None.
 };
 
-// In the order of Kind.
-inline constexpr std::array<LineForm, 7> lineForms = {{
+// In the order of Kind; all but Malformed have one.
+inline constexpr LineForm lineForms[] = {
     {Kind::Created, 'c', {Field::Pool}},
     {Kind::Destroyed, 'd', {Field::Pool}},
     {Kind::Allocated, 'a', {Field::Pool, Field::Block, Field::Size}},
-    {Kind::Freed, 'f', {Field::Pool, Field::Block, Field::Nothing}},
+    {Kind::Freed, 'f', {Field::Pool, Field::Block, Field::Empty}},
     {Kind::Cleared, 'x', {Field::Pool}},
     {Kind::Named, 'n', {Field::Pool, Field::Text}},
     {Kind::Info, 'i', {Field::Key, Field::Text}},
-}};
+};
+static_assert(std::size(lineForms) == static_cast<std::size_t>(Kind::Malformed),
+              "Every kind of event has the form of its line.");
 
 }  // namespace Trace
 

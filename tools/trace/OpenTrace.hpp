@@ -1,4 +1,4 @@
-// Opens a trace in whatever form it has.
+// Opens a trace of any form.
 
 #ifndef OBR_TOOLS_TRACE_OPENTRACE_HPP
 #define OBR_TOOLS_TRACE_OPENTRACE_HPP
@@ -11,11 +11,11 @@
 
 namespace Trace {
 
-// Chooses the reader by the first bytes.
+// Chooses the reader by the first bytes of the input.
 std::unique_ptr<EventSource> MakeReader(Input input);
 
-// The trace in the file, plain or compressed; "-" is the standard input. A file that cannot be read
-// at all is a std::runtime_error, whose text begins with the path.
+// Opens a file, plain or compressed by gzip; "-" is the standard input. Throws a
+// std::runtime_error, whose text begins with the path, if the file cannot be read.
 std::unique_ptr<EventSource> OpenTrace(const std::string& path);
 
 }  // namespace Trace

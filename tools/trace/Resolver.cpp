@@ -1,24 +1,16 @@
-// Which pools and blocks live, by their addresses.
+// Which pools and blocks are alive, by address.
 
 #include "trace/Resolver.hpp"
 
 #include <algorithm>
-#include <iomanip>
-#include <sstream>
 
-#include "trace/LineForms.hpp"
+#include "trace/TextWriter.hpp"
 
 namespace Trace {
 
 namespace {
 
-constexpr std::uint64_t maxBlockSize = 0x3FFFFFFF;  // The largest that a pool takes.
-
-std::string AddressText(std::uint64_t address) {
-    std::ostringstream text;
-    text << std::hex << std::setw(addressDigits) << std::setfill('0') << address;
-    return text.str();
-}
+constexpr std::uint64_t maxBlockSize = 0x3FFFFFFF;  // Of any pool.
 
 }  // namespace
 
@@ -47,8 +39,10 @@ std::optional<Fault> Resolver::Resolve(const Event& event, Step& step) {
         case Kind::Named:
             pools[pool.index].name = event.text;
             break;
-        default:
-            break;
+        case Kind::Created:
+        case Kind::Info:
+        case Kind::Malformed:
+            break;  // Handled above.
     }
     return std::nullopt;
 }
@@ -65,7 +59,7 @@ std::optional<Fault> Resolver::Create(std::uint64_t address, Step& step) {
     if (!livePools.try_emplace(address, LivePool{step.pool, {}}).second) {
         return Fault::PoolTwice;
     }
-    pools.push_back({AddressText(address), {}});
+    AppendAddress(pools.emplace_back().address, address);
     return std::nullopt;
 }
 

@@ -1,6 +1,6 @@
-// Follows the events of a trace and tells which pool and which block each is about: a *step*, with
-// the pool and the block as indices in place of addresses, which come again for others. What makes
-// no sense after the events before it is a *fault*, and changes nothing.
+// Follows the events of a trace and finds the pool and the block of each: a *step* has them as
+// indices, since other pools and blocks reuse an address. An event that makes no sense after those
+// before it is a *fault*, and changes nothing.
 
 #ifndef OBR_TOOLS_TRACE_RESOLVER_HPP
 #define OBR_TOOLS_TRACE_RESOLVER_HPP
@@ -17,7 +17,7 @@
 namespace Trace {
 
 struct Block {
-    std::uint32_t index;  // Below NumBlocks, given anew once the block is gone.
+    std::uint32_t index;  // Below NumBlocks; used again once the block is gone.
     std::uint32_t size;   // Bytes asked for.
 };
 
@@ -28,8 +28,8 @@ struct Step {
 };
 
 struct Pool {
-    std::string address;  // As the trace shows it.
-    std::string name;     // What the trace calls it, empty if it does not.
+    std::string address;  // As in the trace.
+    std::string name;     // Empty if the trace has none.
 };
 
 enum class Fault : std::uint8_t {
@@ -47,24 +47,24 @@ inline constexpr std::array faultNames = {
 
 class Resolver {
 public:
-    // Fills `step`, or tells why there is none. That of an Info has a kind and nothing else.
+    // Sets `step`, of which an Info has only the kind, or returns why there is none.
     std::optional<Fault> Resolve(const Event& event, Step& step);
 
-    // The blocks that went with the last step, a Cleared or a Destroyed, in the order of their
-    // indices, which is about that of the allocations.
+    // The blocks that the last step, a Cleared or a Destroyed, has dropped, by index, which is
+    // roughly the order of the allocations.
     const std::vector<Block>& Dropped() const { return dropped; }
 
-    // Ends the pools that still live, one a call, as if the trace destroyed them: Dropped tells
-    // their blocks. False once none is left.
+    // Ends one of the live pools as if the trace destroyed it; Dropped has its blocks. False if
+    // none is left.
     bool EndPool();
 
-    const std::vector<Pool>& Pools() const { return pools; }  // Each one ever created.
-    std::uint32_t NumBlocks() const { return numBlocks; }     // Most blocks alive at a time.
+    const std::vector<Pool>& Pools() const { return pools; }  // All ever created.
+    std::uint32_t NumBlocks() const { return numBlocks; }     // The most alive at any time.
 
 private:
     struct LivePool {
         std::uint32_t index;
-        std::unordered_map<std::uint64_t, Block> blocks;  // By their addresses.
+        std::unordered_map<std::uint64_t, Block> blocks;  // By address.
     };
 
     std::optional<Fault> Create(std::uint64_t address, Step& step);
@@ -73,7 +73,7 @@ private:
     void DropAll(LivePool& pool);
 
     std::vector<Pool> pools;
-    std::unordered_map<std::uint64_t, LivePool> livePools;  // By their addresses.
+    std::unordered_map<std::uint64_t, LivePool> livePools;  // By address.
     std::vector<std::uint32_t> freeIndices;
     std::vector<Block> dropped;
     std::uint32_t numBlocks = 0;

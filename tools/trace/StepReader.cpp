@@ -1,4 +1,4 @@
-// What makes a trace, and what is said of one that is none.
+// Counts bad lines, collects facts, and finds out whether the input is a trace at all.
 
 #include "trace/StepReader.hpp"
 

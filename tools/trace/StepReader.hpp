@@ -1,5 +1,5 @@
-// A trace as the tools read it: opened, resolved, its bad lines counted and its facts collected on
-// the way.
+// A trace as the tools read it: its events resolved to steps, its bad lines counted and its facts
+// collected on the way.
 
 #ifndef OBR_TOOLS_TRACE_STEPREADER_HPP
 #define OBR_TOOLS_TRACE_STEPREADER_HPP
@@ -30,14 +30,14 @@ struct BadLines {
 
 class StepReader {
 public:
-    // Opens the trace in the file; "-" is the standard input. See OpenTrace for its errors.
+    // Opens a file as OpenTrace does.
     explicit StepReader(const std::string& path);
 
-    // For a trace from elsewhere, which messages call `traceName`.
+    // Messages call the trace `traceName`.
     StepReader(std::unique_ptr<EventSource> events, std::string traceName);
 
-    // Reads up to the next step; false at the end. A trace that ends without a good line is a
-    // std::runtime_error: it is none.
+    // Reads the next step, never an Info; false at the end. Throws std::runtime_error if the input
+    // has no valid line at all: it is not a trace.
     bool Next(Step& step);
 
     const std::string& Name() const { return name; }
@@ -46,10 +46,10 @@ public:
     Resolver& Blocks() { return resolver; }
     const BadLines& Bad() const { return badLines; }
 
-    // What the trace tells about itself: keys and values of its Info events.
+    // Keys and values of the Info events.
     const std::map<std::string, std::string>& Facts() const { return facts; }
 
-    // Behind the end: a warning that the trace breaks off, or empty. All that came before is good.
+    // After the end: a warning if the trace is incomplete, or empty. What was read is good.
     std::string Warning() const;
 
 private:

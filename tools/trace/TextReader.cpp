@@ -12,10 +12,10 @@ namespace Trace {
 
 namespace {
 
-// Of a line, from its mark on; a longer one is malformed.
+// Bytes of a line from its mark on. A longer one is malformed.
 constexpr std::size_t maxSize = std::size_t{1} << 20;
 
-// The fields of a line, taken from the front. Once one is missing, the line is malformed.
+// Takes the fields of a line from its front. If one is missing, the line is malformed.
 class Fields {
 public:
     explicit Fields(std::string_view text) : rest(text) {}
@@ -36,7 +36,7 @@ public:
     bool AllTaken() const { return wellFormed && rest.empty(); }
 
 private:
-    // A number that no 64 bits hold is as good as the largest: it is too large in any case.
+    // A number of more than 64 bits counts as the largest: it is too large in any case.
     std::uint64_t Number(std::string_view digits, int base, std::size_t minDigits) {
         std::uint64_t value = 0;
         const char* const first = digits.data();
@@ -74,7 +74,7 @@ void Take(Fields& fields, Field field, Event& event) {
         case Field::Text:
             event.text = fields.Text();
             break;
-        case Field::Nothing:
+        case Field::Empty:
         case Field::None:
             break;
     }
@@ -114,8 +114,8 @@ bool TextReader::Next(Event& event) {
     return false;
 }
 
-// Gives the next line without its end, or what matters of it: see Shorten. The last one needs no
-// end, but where the bytes break off, so may its last number: such a line is none.
+// Reads the next line, without its end and possibly without its beginning: see Shorten. The last
+// line needs no end; but if the bytes are cut off, its last number may be too, and it is dropped.
 bool TextReader::NextLine(std::string_view& line) {
     input.Skip(lineSize);
     lineSize = 0;
@@ -139,8 +139,8 @@ bool TextReader::NextLine(std::string_view& line) {
     return true;
 }
 
-// Bounds the memory that a line takes whose end is not read yet: what stands in front of its mark,
-// or of the first part of one, goes, and so does all of a line that is too long.
+// Bounds the memory for a line whose end is not read yet. Drops what precedes its mark, or what may
+// be the first part of one; and all of a line that is too long.
 void TextReader::Shorten() {
     const std::string_view begin = input.Ahead();
     const std::size_t start = begin.find(mark);

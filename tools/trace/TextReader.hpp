@@ -1,6 +1,5 @@
-// Reads a trace of lines. A program writes them among other output: a line without the mark is
-// passed over, and so is what stands in front of the mark. A line takes a few MiB of memory at
-// most.
+// Reads a trace of lines. A program writes them among other output, so a line without the mark is
+// ignored, and so is what precedes the mark. A line takes a few MiB of memory at most.
 
 #ifndef OBR_TOOLS_TRACE_TEXTREADER_HPP
 #define OBR_TOOLS_TRACE_TEXTREADER_HPP
@@ -28,8 +27,8 @@ private:
     void Shorten();
 
     Input input;
-    std::size_t lineSize = 0;  // Bytes of the last line, its end included, which are still ahead.
-    bool isTooLong = false;    // The last line; its bytes are gone.
+    std::size_t lineSize = 0;  // Bytes of the last line with its end; they are still ahead.
+    bool isTooLong = false;    // Whether the last line is; its bytes are dropped.
     std::uint64_t number = 0;  // Of the last line.
 };
 

@@ -12,13 +12,6 @@ namespace Trace {
 
 namespace {
 
-void AppendAddress(std::string& line, std::uint64_t address) {
-    constexpr std::string_view digits = "0123456789abcdef";
-    for (std::size_t shift = 4 * addressDigits; shift != 0; shift -= 4) {
-        line += digits[address >> (shift - 4) & 0xF];
-    }
-}
-
 void AppendText(std::string& line, std::string_view text) {
     for (const char letter : text) {
         const bool isControl = static_cast<unsigned char>(letter) < 0x20 || letter == 0x7F;
@@ -43,7 +36,7 @@ void Append(std::string& line, Field field, const Event& event) {
         case Field::Text:
             AppendText(line, event.text);
             break;
-        case Field::Nothing:
+        case Field::Empty:
         case Field::None:
             break;
     }
@@ -62,6 +55,13 @@ void AppendLine(std::string& lines, const Event& event) {
             Append(lines, field, event);
         }
         lines += '\n';
+    }
+}
+
+void AppendAddress(std::string& text, std::uint64_t address) {
+    constexpr std::string_view digits = "0123456789abcdef";
+    for (std::size_t shift = 4 * addressDigits; shift != 0; shift -= 4) {
+        text += digits[address >> (shift - 4) & 0xF];
     }
 }
 
