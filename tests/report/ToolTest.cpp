@@ -92,7 +92,7 @@ TEST(Report, IsAPageUnlessAllIsAskedFor) {
     const std::string all = Tool("--all many");
     EXPECT_THAT(all, HasSubstr("149" + longName + "\n"));
     EXPECT_THAT(all, HasSubstr("100" + longName + "\n"));
-    EXPECT_THAT(all, HasSubstr("\n               100             1 "));
+    EXPECT_THAT(all, HasSubstr("\n            100            1 "));
 }
 
 // Names are text in the page, and its data end where they should.

@@ -104,7 +104,7 @@ int AdviseOn(const Options& options) {
         std::cout << JsonOf(advice).dump(2) << '\n';
     } else {
         std::cout << reader.Name() << '\n';
-        PrintBadLines(std::cout, reader);
+        PrintBadLines(std::cout, reader.Name(), reader.Bad());
         PrintTable(std::cout, advice, false);
         std::cout << '\n';
         PrintVerdict(std::cout, advice);

@@ -6,15 +6,14 @@
 
 namespace Tool {
 
-void PrintBadLines(std::ostream& out, const Trace::StepReader& reader) {
-    const Trace::BadLines& bad = reader.Bad();
+void PrintBadLines(std::ostream& out, const std::string& trace, const Trace::BadLines& bad) {
     out << "   Bad lines: " << bad.Total() << '\n';
     for (std::size_t fault = 0; fault < Trace::faultNames.size(); ++fault) {
         if (bad.numFaults[fault] == 0) { continue; }
         out << "      " << bad.numFaults[fault] << " x " << Trace::faultNames[fault] << '\n';
     }
     for (const Trace::BadLine& line : bad.first) {
-        out << "   " << reader.Name() << ':' << line.number << ": "
+        out << "   " << trace << ':' << line.number << ": "
             << Trace::faultNames[static_cast<std::size_t>(line.fault)] << '\n';
     }
     if (bad.Total() > bad.first.size()) { out << "   and more\n"; }

@@ -4,13 +4,14 @@
 #define OBR_TOOLS_MEMPOOL_PRINT_HPP
 
 #include <iostream>
+#include <string>
 
 #include "trace/StepReader.hpp"
 
 namespace Tool {
 
-// How many lines of the trace were left out, why, and where the first of them stand.
-void PrintBadLines(std::ostream& out, const Trace::StepReader& reader);
+// How many lines of the trace were ignored, why, and where the first of them are.
+void PrintBadLines(std::ostream& out, const std::string& trace, const Trace::BadLines& bad);
 
 // Warns on standard error if the trace breaks off. Returns the exit status: that of a failure then.
 int WarnOfBrokenTrace(const Trace::StepReader& reader);

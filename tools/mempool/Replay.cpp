@@ -73,7 +73,7 @@ int Compare(const std::string& path, const Options& options) {
     progress.Clear();
 
     std::cout << reader.Name() << '\n';
-    PrintBadLines(std::cout, reader);
+    PrintBadLines(std::cout, reader.Name(), reader.Bad());
     const auto held = Replay::BytesHeld(recording, [&] {
         if (options.dbg) { OBR::MemPool::Dbg(); }
     });
@@ -108,7 +108,7 @@ int Sweep(const std::string& path, const Options& options) {
     const Progress progress(reader.Name());
     const Advice advice = TakeAdvice(reader, options.seconds, progress);
     std::cout << reader.Name() << '\n';
-    PrintBadLines(std::cout, reader);
+    PrintBadLines(std::cout, reader.Name(), reader.Bad());
     PrintTable(std::cout, advice, true);
     std::cout << std::flush;
     return WarnOfBrokenTrace(reader);

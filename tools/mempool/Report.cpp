@@ -9,7 +9,6 @@
 #include <iostream>
 #include <memory>
 #include <new>
-#include <sstream>
 #include <stdexcept>
 #include <string>
 #include <system_error>
@@ -95,9 +94,7 @@ int WriteReport(Trace::StepReader& reader, const ReportOptions& options) {
     if (options.json) {
         std::cout << Report::ToJson(analysis) << '\n';
     } else {
-        std::ostringstream badLines;
-        PrintBadLines(badLines, reader);
-        PrintAnalysis(std::cout, analysis, options.extent, badLines.str());
+        PrintAnalysis(std::cout, analysis, options.extent);
     }
     std::cout << std::flush;
     if (!options.html.empty()) { WriteFile(options.html, Report::MakePage(analysis)); }

@@ -1,11 +1,10 @@
-// An analysis as text: a page for a terminal or a file, without escape codes.
+// An analysis as text for a terminal or a file, without escape codes.
 
 #ifndef OBR_TOOLS_MEMPOOL_REPORTTEXT_HPP
 #define OBR_TOOLS_MEMPOOL_REPORTTEXT_HPP
 
 #include <cstdint>
 #include <iosfwd>
-#include <string>
 
 #include "report/Analysis.hpp"
 
@@ -17,9 +16,7 @@ enum class Extent : std::uint8_t {
     All,    // Every size and every group.
 };
 
-// `heading` stands between the name of the trace and the figures.
-void PrintAnalysis(std::ostream& out, const Report::Analysis& analysis, Extent extent,
-                   const std::string& heading = "");
+void PrintAnalysis(std::ostream& out, const Report::Analysis& analysis, Extent extent);
 
 }  // namespace Tool
 
