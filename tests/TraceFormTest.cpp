@@ -1,4 +1,4 @@
-// The forms of a trace line, read and written by one table.
+// Traces of lines.
 
 #include <algorithm>
 #include <cstddef>
@@ -15,24 +15,13 @@
 
 namespace {
 
-TEST(TraceForm, IsWrittenAsItIsRead) {
-    const std::string lines =
-        Lines("@c:P\n@n:P:main() (a.c:5)\n@a:P:X:18446744073709551615\n@f:P:X:\n@x:P\n@d:P\n") +
-        "xmpt:i:program:jq :. \nxmpt:i::\n";
-    const auto reader = ReadLines(lines);
+TEST(TraceForm, HasNoControlCharacterInATextThatIsWritten) {
     std::string written;
-    Trace::Event event;
-    while (reader->Next(event)) { Trace::AppendLine(written, event); }
-    EXPECT_EQ(written, lines);
-    EXPECT_EQ(reader->Position(), 8U);
-
-    event = {Trace::Kind::Named, 0x6a1200, 0, 0, {}, "two\nlines \x7f\xc3\xa9"};
-    written.clear();
-    Trace::AppendLine(written, event);
+    Trace::AppendLine(written, {Trace::Kind::Named, 0x6a1200, 0, 0, {}, "two\nlines \x7f\xc3\xa9"});
     EXPECT_EQ(written, Lines("@n:P:two?lines ?\xc3\xa9\n"));
 }
 
-TEST(TraceForm, TellsWhatATraceIsCalledAndWhatItSaysOfItself) {
+TEST(TraceForm, HasNamesOfPoolsAndFactsAboutTheRecording) {
     Trace::StepReader reader(ReadLines(Lines("@i:program:jq:x\n@c:P\n@n:Q:no\n@n:P:caller\n") +
                                        Lines("@a:P:X:1073741823\n")),
                              "t");
@@ -43,7 +32,7 @@ TEST(TraceForm, TellsWhatATraceIsCalledAndWhatItSaysOfItself) {
     EXPECT_EQ(reader.Bad().Total(), 1U);
 }
 
-// Bytes, a thousand at a time, and a note of the most room that the reader has had for them.
+// Gives a thousand bytes at a time, and keeps the most room that the reader had for them.
 class Greedy final : public Trace::ByteSource {
 public:
     Greedy(std::string text, std::size_t& mostRoom) : rest(std::move(text)), room(mostRoom) {}
