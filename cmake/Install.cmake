@@ -19,7 +19,7 @@ endif()
 install(TARGETS ${libraries} EXPORT ObrMemPool
     LIBRARY COMPONENT runtime NAMELINK_COMPONENT dev
     ARCHIVE COMPONENT dev)
-install(FILES ${PROJECT_SOURCE_DIR}/include/MemPool ${PROJECT_SOURCE_DIR}/include/MemPoolHeap
+install(FILES include/MemPool include/MemPoolHeap include/MemPoolSettings
     DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} COMPONENT dev)
 
 set(packageDir ${CMAKE_INSTALL_LIBDIR}/cmake/ObrMemPool)

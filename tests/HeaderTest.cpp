@@ -3,6 +3,7 @@
 
 #include <MemPool>
 #include <MemPoolHeap>
+#include <MemPoolSettings>
 
 template struct OBR::vector<int>;
 template struct OBR::vector<OBR::MemPool::Mgr*>;

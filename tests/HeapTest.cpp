@@ -24,8 +24,9 @@ std::size_t NumBlocks(const Heap& heap) {
 }
 
 auto AllSettings() {
-    return std::tuple(Settings::bucketSize, Settings::dataAlignment, Settings::maxRecordSize,
-                      Settings::minRecordSize, Settings::keepEmptyBuckets, Settings::off);
+    return std::tuple(Settings::pool.bucketSize, Settings::pool.dataAlignment,
+                      Settings::pool.maxRecordSize, Settings::pool.minRecordSize,
+                      Settings::pool.keepEmptyBuckets, Settings::off);
 }
 
 // What a heap of that name and these settings is refused for; "" if it is not. The settings of the
@@ -155,7 +156,7 @@ TEST_F(HeapTest, IsRefusedWhereNoPoolCanBeMade) {
             oneOf({0, 3, 4, 8, 96, 100, 1000, 65531, 65532, 0xFFFFFFFB, 0xFFFFFFFF}),
             oneOf({0, 4, 8, 96, 97, 100, 0xFFFFFFFC, 0xFFFFFFFD, 0xFFFFFFFF}));
         if (Refusal(nullptr).empty()) { continue; }
-        Settings::dataAlignment = static_cast<std::uint16_t>(RoundUp(Settings::dataAlignment, 4));
+        Settings::pool.dataAlignment = RoundUp(Settings::pool.dataAlignment, 4);
         const pid_t child = fork();
         if (child == 0) {
             std::atexit([] { _exit(1); });  // A sanitizer has nothing to look for.

@@ -36,11 +36,11 @@ protected:
     static void Use(std::uint32_t bucketSize, std::uint16_t dataAlignment,
                     std::uint32_t maxRecordSize, std::uint32_t minRecordSize,
                     bool keepEmptyBuckets = false) {
-        Settings::bucketSize = bucketSize;
-        Settings::dataAlignment = dataAlignment;
-        Settings::maxRecordSize = maxRecordSize;
-        Settings::minRecordSize = minRecordSize;
-        Settings::keepEmptyBuckets = keepEmptyBuckets;
+        Settings::pool.bucketSize = bucketSize;
+        Settings::pool.dataAlignment = dataAlignment;
+        Settings::pool.maxRecordSize = maxRecordSize;
+        Settings::pool.minRecordSize = minRecordSize;
+        Settings::pool.keepEmptyBuckets = keepEmptyBuckets;
         Settings::off = false;
     }
 

@@ -145,8 +145,8 @@ TEST(Replay, RefusesSettingsThatMakeNoPool) {
                     HasSubstr("mempool: these settings make no pool: "));
     }
     EXPECT_THAT(Tool(path, 1, {{"NUV_OBR_MEMPOOL_BUCKET_SIZE", "20"}}),
-                HasSubstr("a bucket size of 20 takes records of 16 bytes at most, and the maximum "
-                          "record size is 1000\n"));
+                HasSubstr("a maximum record size of 1000 needs a bucket size of at least 1004, "
+                          "not 20\n"));
 }
 
 // The last line that is left may lack digits: it does not count.

@@ -103,11 +103,11 @@ protected:
     ~Report() override { Settings::off = true; }
 
     static void Use(std::uint32_t bucketSize, std::uint32_t maxRecordSize, bool keepEmpty = false) {
-        Settings::bucketSize = bucketSize;
-        Settings::dataAlignment = 4;
-        Settings::maxRecordSize = maxRecordSize;
-        Settings::minRecordSize = 8;
-        Settings::keepEmptyBuckets = keepEmpty;
+        Settings::pool.bucketSize = bucketSize;
+        Settings::pool.dataAlignment = 4;
+        Settings::pool.maxRecordSize = maxRecordSize;
+        Settings::pool.minRecordSize = 8;
+        Settings::pool.keepEmptyBuckets = keepEmpty;
         Settings::off = false;
         Settings::trace = false;
     }
@@ -173,7 +173,7 @@ TEST_F(Report, HoldsEveryLineInItsPlace) {
     Alloc(demo, 10, 3);
     demo.Alloc(2000);
     Use(50, 40);  // From now on the settings of the process are others than the pool's.
-    Settings::minRecordSize = Settings::dataAlignment = 16;
+    Settings::pool.minRecordSize = Settings::pool.dataAlignment = 16;
     Settings::off = true;
     std::string text = Plain(demo);
 

@@ -17,7 +17,7 @@
 
 #include "Child.hpp"
 #include "HostLayer/HostEnv.hpp"
-#include "MemPool/EnvInit.hpp"
+#include "MemPool/Settings.hpp"
 #include "Output.hpp"
 
 using namespace OBR::MemPool;

@@ -16,20 +16,23 @@ namespace OBR::MemPool {
 namespace {
 
 constexpr std::uint32_t recHdrSize = sizeof(RecHdr);
+static_assert(recHdrSize == recordOverhead, "PoolSizes counts a record's header.");
 
 }  // namespace
 
 BucketMgr::BucketMgr(Mgr* handle, const std::string& poolName)
-    : name(poolName),
-      mgr(handle),
-      bucketSize(std::min(Settings::bucketSize, maxBucketSize)),
-      dataAlignment(std::max<std::uint32_t>(Settings::dataAlignment, 1)),
-      maxRecordSize(Settings::maxRecordSize),
-      minRecordSize(Settings::minRecordSize),
-      keepEmptyBuckets(Settings::keepEmptyBuckets) {
+    : name(poolName), mgr(handle), keepEmptyBuckets(Settings::pool.keepEmptyBuckets) {
+    const PoolSizes sizes(Settings::pool);
+    bucketSize = sizes.bucketSize;
+    dataAlignment = sizes.dataAlignment;
+    maxRecordSize = sizes.maxRecordSize;
+    minRecordSize = sizes.minRecordSize;
     Trace::PoolCreated(this);
     enabled = !Settings::off;
-    RoundRecordSizes();
+    if (sizes.IsMaxAboveRoom()) {
+        Messages::MaxRecordAboveBucket(maxRecordSize, sizes.RoomInBucket(), bucketSize);
+    }
+    if (sizes.IsMinAboveMax()) { Messages::MinRecordAboveMax(minRecordSize, maxRecordSize); }
     numGroups = (maxRecordSize - minRecordSize) / dataAlignment + 1;
     groups = new Group*[numGroups]();
     PrepareFastPath();
@@ -39,20 +42,6 @@ BucketMgr::~BucketMgr() {
     Trace::PoolDestroyed(this);
     Clear();
     delete[] groups;
-}
-
-// Rounds the bounds of the record sizes to the alignment, inwards, and stops the process if no
-// record fits between them or the largest does not fit into a bucket.
-void BucketMgr::RoundRecordSizes() {
-    maxRecordSize = RoundUp(maxRecordSize, dataAlignment);
-    minRecordSize = RoundUp(minRecordSize, dataAlignment);
-    if (maxRecordSize > Settings::maxRecordSize) { maxRecordSize -= dataAlignment; }
-
-    const std::uint32_t room = bucketSize < recHdrSize ? 0 : bucketSize - recHdrSize;
-    if (maxRecordSize > room) { Messages::MaxRecordAboveBucket(maxRecordSize, room, bucketSize); }
-    if (minRecordSize > maxRecordSize) {
-        Messages::MinRecordAboveMax(minRecordSize, maxRecordSize);
-    }
 }
 
 // With a dataAlignment of 2^k, a size from 1 on has d = (s + 1) * 2^k data bytes, where its step s

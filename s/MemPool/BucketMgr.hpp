@@ -22,15 +22,6 @@ class Mgr;
 // The largest size that Alloc lets through: sums of a size and a header never wrap.
 constexpr std::uint32_t maxAllocSize = 0x3FFFFFFF;
 
-// The fields of a bucket are 16 bits wide.
-constexpr std::uint32_t maxBucketSize = 65535;
-
-// The smallest multiple of `multiple` that is at least `value`, but never 0. In 32 bits.
-constexpr std::uint32_t RoundUp(std::uint32_t value, std::uint32_t multiple) {
-    const std::uint32_t below = value == 0 ? 0 : value - 1;
-    return below - below % multiple + multiple;
-}
-
 // Size classes. A request of `size` bytes has d = RoundUp(size, dataAlignment) data bytes and a
 // record of r = d + 4. It goes into a bucket if r <= maxRecordSize, from the group at
 // (max(r, minRecordSize) - minRecordSize) / dataAlignment.
@@ -45,10 +36,10 @@ public:
     ExtRec* extRecs = nullptr;     // Front of the list of heap records, the newest first.
     std::uint32_t numGroups = 0;   // Places in `groups`.
     std::uint32_t numExtRecs = 0;  // Heap records on the list.
-    std::uint32_t bucketSize;      // At most 65535, the width of a bucket's fields.
-    std::uint32_t dataAlignment;   // At least 1. Data sizes are rounded up to a multiple of it.
-    std::uint32_t maxRecordSize;   // Largest record in a bucket. A multiple of dataAlignment.
-    std::uint32_t minRecordSize;   // Smallest record of the first class. A multiple as well.
+    std::uint32_t bucketSize;      // This and the next three are those of PoolSizes.
+    std::uint32_t dataAlignment;   // Data sizes are rounded up to a multiple of it.
+    std::uint32_t maxRecordSize;   // Largest record in a bucket.
+    std::uint32_t minRecordSize;   // Smallest record of the first class.
     bool keepEmptyBuckets;
     bool enabled = true;  // False: every request goes straight to the heap.
 
@@ -127,7 +118,6 @@ public:
     void DbgExtRecs(std::ostream& stream, std::uint32_t level) const;
 
 private:
-    void RoundRecordSizes();
     void PrepareFastPath();
     std::uint32_t IndexOf(std::uint32_t recSize) const;
     Group* GroupFor(std::uint32_t recSize);

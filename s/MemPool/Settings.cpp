@@ -1,44 +1,52 @@
-// The exported accessors of the settings, which store what they are given.
+// How the settings are stored: by the exported accessors, and at the start-up by the environment,
+// with a rule for each variable.
 
 #include "MemPool/Settings.hpp"
 
-#include <MemPool>
+#include <cstdint>
+#include <cstdlib>
+#include <optional>
+
+#include "HostLayer/HostEnv.hpp"
+#include "diagnostics/text/Messages.hpp"
 
 namespace OBR::MemPool {
 
+// The accessors store what they are given.
+
 unsigned int NUV_OBR_MEMPOOL_BUCKET_SIZE() {
-    return Settings::bucketSize;
+    return Settings::pool.bucketSize;
 }
 void NUV_OBR_MEMPOOL_BUCKET_SIZE(unsigned int bytes) {
-    Settings::bucketSize = bytes;
+    Settings::pool.bucketSize = bytes;
 }
 
 unsigned int NUV_OBR_MEMPOOL_DATA_ALIGNMENT() {
-    return Settings::dataAlignment;
+    return Settings::pool.dataAlignment;
 }
 void NUV_OBR_MEMPOOL_DATA_ALIGNMENT(unsigned int bytes) {
-    Settings::dataAlignment = static_cast<std::uint16_t>(bytes);
+    Settings::pool.dataAlignment = static_cast<std::uint16_t>(bytes);
 }
 
 bool NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS() {
-    return Settings::keepEmptyBuckets;
+    return Settings::pool.keepEmptyBuckets;
 }
 void NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS(bool keep) {
-    Settings::keepEmptyBuckets = keep;
+    Settings::pool.keepEmptyBuckets = keep;
 }
 
 unsigned int NUV_OBR_MEMPOOL_MAX_RECORD_SIZE() {
-    return Settings::maxRecordSize;
+    return Settings::pool.maxRecordSize;
 }
 void NUV_OBR_MEMPOOL_MAX_RECORD_SIZE(unsigned int bytes) {
-    Settings::maxRecordSize = bytes;
+    Settings::pool.maxRecordSize = bytes;
 }
 
 unsigned int NUV_OBR_MEMPOOL_MIN_RECORD_SIZE() {
-    return Settings::minRecordSize;
+    return Settings::pool.minRecordSize;
 }
 void NUV_OBR_MEMPOOL_MIN_RECORD_SIZE(unsigned int bytes) {
-    Settings::minRecordSize = bytes;
+    Settings::pool.minRecordSize = bytes;
 }
 
 bool NUV_OBR_MEMPOOL_OFF() {
@@ -61,9 +69,63 @@ void NUV_OBR_MEMPOOL_TRACE(bool trace) {
     Settings::trace = trace;
 }
 
-// The text of another time. It stays what it is for those who know reports by it.
+// Kept for compatibility: readers of reports know the library by this text.
 const char* GetVersion() {
     return "$Id: MemPool,v 1.2.52.4 2009/08/10 21:28:15 qvw Exp $";
+}
+
+namespace {
+
+// The number that a variable starts with, 0 if it starts with none; nothing if it is not set.
+std::optional<std::int32_t> Number(const char* variable) {
+    const char* const value = Host_Env::GetEnv(variable);
+    if (value == nullptr) { return std::nullopt; }
+    return std::atoi(value);
+}
+
+bool IsPositive(const char* variable) {
+    return Number(variable).value_or(0) > 0;
+}
+
+// In this order. A number that its rule refuses is silently ignored. The two record sizes are
+// compared as unsigned numbers, so that a negative one counts as a large one.
+void ReadEnvironment() {
+    using namespace SettingTable;
+    PoolSettings& pool = Settings::pool;
+    if (IsPositive("NUV_OBR_MEMPOOL_ON") || IsPositive("NUV_MEMPOOL_ON")) { Settings::off = false; }
+    if (IsPositive("NUV_OBR_MEMPOOL_TRACE")) { Settings::trace = true; }
+    if (const auto number = Number(bucketSize.variable); number >= 0) {
+        pool.bucketSize = static_cast<std::uint32_t>(*number);
+    }
+    if (const auto number = Number(maxRecordSize.variable)) {
+        const auto size = static_cast<std::uint32_t>(*number);
+        if (size <= maxRecordSize.largest) { pool.maxRecordSize = size; }
+    }
+    if (const auto number = Number(minRecordSize.variable)) {
+        const auto size = static_cast<std::uint32_t>(*number);
+        if (size >= minRecordSize.smallest) { pool.minRecordSize = size; }
+    }
+    if (const auto number = Number(dataAlignment.variable)) {
+        const auto size = static_cast<std::uint16_t>(*number);
+        pool.dataAlignment = *number > 0 ? size : dataAlignment.smallest;
+    }
+    if (const auto number = Number(keepEmptyBuckets.variable)) {
+        pool.keepEmptyBuckets = *number > 0;
+    }
+    if (Number("NUV_OBR_MEMPOOL_INFO") >= 0) { Messages::Banner(); }
+}
+
+}  // namespace
+
+// The trace stays what it was: its variable can only turn it on.
+EnvInit::EnvInit() {
+    Settings::pool = PoolSettings();
+    Settings::off = true;
+    ReadEnvironment();
+    if (!CanStartUp(Settings::pool)) {
+        throw Messages::MinRecordNotBelowMax(Settings::pool.minRecordSize,
+                                             Settings::pool.maxRecordSize);
+    }
 }
 
 }  // namespace OBR::MemPool

@@ -10,7 +10,6 @@
 #include <ios>
 
 #include "MemPool/Checked.hpp"
-#include "MemPool/EnvInit.hpp"
 #include "MemPool/MgrRegistry.hpp"
 #include "MemPool/Settings.hpp"
 
@@ -21,14 +20,12 @@ namespace OBR::MemPool {
 
 namespace Settings {
 
-// The widest bounds. The start-up stores the defaults, which EnvInit.cpp tells, before anything
-// reads these, but leaves the trace alone.
-std::uint32_t bucketSize = 0xFFFF;
-std::uint16_t dataAlignment = 1;
-std::uint32_t maxRecordSize = largestMaxRecordSize;
-std::uint32_t minRecordSize = smallestMinRecordSize;
-bool keepEmptyBuckets;
-bool off;
+// The widest bounds. The start-up stores the defaults before anything reads these, but leaves the
+// trace alone.
+PoolSettings pool = {SettingTable::bucketSize.largest, SettingTable::maxRecordSize.largest,
+                     SettingTable::minRecordSize.smallest, SettingTable::dataAlignment.smallest,
+                     false};
+bool off = false;
 bool trace = false;
 
 }  // namespace Settings

@@ -71,7 +71,7 @@ TEST(ForkedMeter, ReplaysWithTheSettingsAskedFor) {
     EXPECT_NEAR(held(506, 4), 250 * (4 * 104 + 56) + 1300, 2600);
     EXPECT_NEAR(held(65450, 4), 2 * 65500 + 1300, 1300);
     EXPECT_NEAR(held(65450, 64), 3 * 65500 + 500, 1500) << "128 bytes a block.";
-    for (const Advise::Side& side : {Advise::Side(), Advise::Side(Advise::LibraryDefaults())}) {
+    for (const Advise::Side& side : {Advise::Side(), Advise::Side(Replay::PoolSettings())}) {
         const double ns = meter.Time(side).figure.value_or(0);
         EXPECT_TRUE(ns > 0.5 && ns < 1e5) << ns;
     }

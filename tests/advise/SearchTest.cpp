@@ -87,7 +87,7 @@ TEST(Search, FindsTheOptimaWithoutTryingAll) {
     const auto& best = findings.settings.at(*verdict.fastest);
     EXPECT_LT(Distance(best.settings, fastest), 0.5) << "Noise is as much as half a step.";
     EXPECT_EQ(Key(findings.settings.at(*verdict.smallest).settings), Key(smallest));
-    EXPECT_EQ(Key(findings.settings.front().settings), Key(Advise::LibraryDefaults()));
+    EXPECT_EQ(Key(findings.settings.front().settings), Key(PoolSettings()));
     EXPECT_LT(findings.settings.size(), 120U) << "Of thousands.";
     // The machine is twice as slow for most of the time, but for the settings as for the heap.
     EXPECT_NEAR(findings.heap.nsPerEvent, 28, 1);

@@ -44,12 +44,12 @@ World::World(Bytes& input) : bytes(input) {
                                 {300, 3, 90, 40},   {24, 4, 20, 20},   {4010, 16, 19, 4},
                                 {500, 32, 490, 64}, {65535, 8, 60, 12}};
     const Sizes start = bytes.OneOf(starts);
-    Settings::bucketSize = start.bucket;
-    Settings::dataAlignment = static_cast<std::uint16_t>(start.alignment);
-    Settings::maxRecordSize = start.largest;
-    Settings::minRecordSize = start.smallest;
+    Settings::pool.bucketSize = start.bucket;
+    Settings::pool.dataAlignment = static_cast<std::uint16_t>(start.alignment);
+    Settings::pool.maxRecordSize = start.largest;
+    Settings::pool.minRecordSize = start.smallest;
     const std::uint8_t switches = bytes.Byte();
-    Settings::keepEmptyBuckets = (switches & 1) != 0;
+    Settings::pool.keepEmptyBuckets = (switches & 1) != 0;
     Settings::trace = (switches & 2) != 0;
     Settings::off = (switches & 4) != 0;
 }

@@ -155,9 +155,7 @@ Outcome ForkedMeter::Run(const Side& side, const std::function<double()>& work) 
     if (side.has_value()) {
         return InChild(
             [&] {
-                side->Apply();
-                OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);
-                OBR::MemPool::NUV_OBR_MEMPOOL_TRACE(false);
+                Replay::UsePools(*side);
                 return work();
             },
             std::max(leastLimit, mostOfHeapTime * heapSeconds));

@@ -8,7 +8,6 @@
 #include <optional>
 #include <set>
 #include <stdexcept>
-#include <tuple>
 #include <utility>
 #include <vector>
 
@@ -41,11 +40,10 @@ struct Candidate {
 
 struct Less {
     bool operator()(const PoolSettings& a, const PoolSettings& b) const {
-        const auto key = [](const PoolSettings& each) {
-            return std::tuple(each.bucketSize, each.maxRecordSize, each.minRecordSize,
-                              each.dataAlignment, each.keepEmptyBuckets);
-        };
-        return key(a) < key(b);
+        for (const auto& row : OBR::MemPool::SettingTable::all) {
+            if (row.In(a) != row.In(b)) { return row.In(a) < row.In(b); }
+        }
+        return false;
     }
 };
 

@@ -29,32 +29,31 @@ const std::array<Dimension, 4> dimensions = {{{&PoolSettings::bucketSize, bucket
                                               {&PoolSettings::minRecordSize, minRecordSizes},
                                               {&PoolSettings::dataAlignment, dataAlignments}}};
 
-// A bucket takes one record less 4 bytes.
 bool Fits(const PoolSettings& settings) {
-    return settings.maxRecordSize + 4 <= settings.bucketSize;
+    return !OBR::MemPool::PoolSizes(settings).IsMaxAboveRoom();
 }
 
 // Makes the bucket that was just changed and the largest record fit each other, if values can.
 bool Repair(PoolSettings& settings, bool bucketWasChanged) {
     if (Fits(settings)) { return true; }
     if (bucketWasChanged) {
-        const auto above =
-            std::upper_bound(maxRecordSizes.begin(), maxRecordSizes.end(), settings.bucketSize - 4);
+        const auto above = std::upper_bound(maxRecordSizes.begin(), maxRecordSizes.end(),
+                                            OBR::MemPool::PoolSizes(settings).RoomInBucket());
         if (above == maxRecordSizes.begin()) { return false; }
         settings.maxRecordSize = *(above - 1);
     } else {
-        const auto enough =
-            std::lower_bound(bucketSizes.begin(), bucketSizes.end(), settings.maxRecordSize + 4);
+        const auto enough = std::lower_bound(bucketSizes.begin(), bucketSizes.end(),
+                                             settings.maxRecordSize + OBR::MemPool::recordOverhead);
         if (enough == bucketSizes.end()) { return false; }
         settings.bucketSize = *enough;
     }
     return true;
 }
 
-// The library stops the process over what makes no pool, and its start-up over a minimum that is
-// not below the maximum.
+// By the environment and by HeapSettings.
 bool CanBeSet(const PoolSettings& settings) {
-    return settings.Problem().empty() && settings.minRecordSize < settings.maxRecordSize;
+    const OBR::MemPool::PoolSizes sizes(settings);
+    return !sizes.IsMaxAboveRoom() && !sizes.IsMinAboveMax() && OBR::MemPool::CanStartUp(settings);
 }
 
 void AddStep(std::vector<PoolSettings>& steps, PoolSettings settings, const Dimension& dimension,
@@ -66,14 +65,10 @@ void AddStep(std::vector<PoolSettings>& steps, PoolSettings settings, const Dime
 
 }  // namespace
 
-PoolSettings LibraryDefaults() {
-    return {4010, 1000, 8, 4, false};
-}
-
 unsigned int NumDifferences(const PoolSettings& a, const PoolSettings& b) {
-    unsigned int number = a.keepEmptyBuckets != b.keepEmptyBuckets ? 1 : 0;
-    for (const Dimension& dimension : dimensions) {
-        if (a.*dimension.place != b.*dimension.place) { ++number; }
+    unsigned int number = 0;
+    for (const auto& row : OBR::MemPool::SettingTable::all) {
+        if (row.In(a) != row.In(b)) { ++number; }
     }
     return number;
 }

@@ -9,9 +9,6 @@
 
 namespace Advise {
 
-// Those that a program has that sets none.
-Replay::PoolSettings LibraryDefaults();
-
 // In how many of the settings the two differ.
 unsigned int NumDifferences(const Replay::PoolSettings& a, const Replay::PoolSettings& b);
 

@@ -44,7 +44,8 @@ Index Simplest(const Findings& findings, const std::function<bool(const Figures&
         findings.settings,
         [&](const Figures& figures) { return passes(figures) && cost(figures) <= most; },
         [&](const Measured& each) {
-            return std::tuple(NumDifferences(each.settings, LibraryDefaults()), cost(each.figures));
+            return std::tuple(NumDifferences(each.settings, Replay::PoolSettings()),
+                              cost(each.figures));
         });
 }
 
@@ -113,23 +114,23 @@ std::optional<double> ShareOf(const std::string& text) {
 
 std::vector<std::pair<std::string, std::string>> EnvironmentOf(
     const Replay::PoolSettings& settings) {
-    return {{"NUV_OBR_MEMPOOL_ON", "1"},
-            {"NUV_OBR_MEMPOOL_BUCKET_SIZE", std::to_string(settings.bucketSize)},
-            {"NUV_OBR_MEMPOOL_MAX_RECORD_SIZE", std::to_string(settings.maxRecordSize)},
-            {"NUV_OBR_MEMPOOL_MIN_RECORD_SIZE", std::to_string(settings.minRecordSize)},
-            {"NUV_OBR_MEMPOOL_DATA_ALIGNMENT", std::to_string(settings.dataAlignment)},
-            {"NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS", settings.keepEmptyBuckets ? "1" : "0"}};
+    std::vector<std::pair<std::string, std::string>> variables = {{"NUV_OBR_MEMPOOL_ON", "1"}};
+    for (const auto& row : OBR::MemPool::SettingTable::all) {
+        variables.emplace_back(row.variable, std::to_string(row.In(settings)));
+    }
+    return variables;
 }
 
 std::vector<std::string> CodeOf(const Replay::PoolSettings& settings) {
-    return {"OBR::MemPool::HeapSettings()",
-            "    .On(true)",
-            "    .BucketSize(" + std::to_string(settings.bucketSize) + ")",
-            "    .MaxRecordSize(" + std::to_string(settings.maxRecordSize) + ")",
-            "    .MinRecordSize(" + std::to_string(settings.minRecordSize) + ")",
-            "    .DataAlignment(" + std::to_string(settings.dataAlignment) + ")",
-            std::string("    .KeepEmptyBuckets(") + (settings.keepEmptyBuckets ? "true" : "false") +
-                ")"};
+    std::vector<std::string> lines = {"OBR::MemPool::HeapSettings()", "    .On(true)"};
+    for (const auto& row : OBR::MemPool::SettingTable::all) {
+        const unsigned int value = row.In(settings);
+        const std::string argument = !row.IsFlag() ? std::to_string(value)
+                                     : value != 0  ? "true"
+                                                   : "false";
+        lines.push_back(std::string("    .") + row.word + "(" + argument + ")");
+    }
+    return lines;
 }
 
 }  // namespace Advise

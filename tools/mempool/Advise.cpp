@@ -67,11 +67,10 @@ nlohmann::ordered_json JsonOf(const Advice& advice) {
     ordered_json settings = ordered_json::array();
     for (const Advise::Measured& each : advice.findings.settings) {
         ordered_json& row = settings.emplace_back();
-        row["bucket_size"] = each.settings.bucketSize;
-        row["max_record_size"] = each.settings.maxRecordSize;
-        row["min_record_size"] = each.settings.minRecordSize;
-        row["data_alignment"] = each.settings.dataAlignment;
-        row["keep_empty_buckets"] = each.settings.keepEmptyBuckets;
+        for (const auto& setting : OBR::MemPool::SettingTable::all) {
+            const unsigned int value = setting.In(each.settings);
+            row[setting.key] = setting.IsFlag() ? ordered_json(value != 0) : ordered_json(value);
+        }
         AddFigures(row, each.figures);
     }
     ordered_json environment = ordered_json::object();

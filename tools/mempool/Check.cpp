@@ -15,6 +15,8 @@
 #include <string>
 #include <vector>
 
+#include <MemPoolSettings>
+
 #include "mempool/Command.hpp"
 #include "mempool/HostFile.hpp"
 #include "mempool/Program.hpp"
@@ -108,13 +110,14 @@ void Prepend(const char* variable, const std::string& value) {
 }
 
 void SetEnvironment(const Options& options) {
+    using namespace OBR::MemPool::SettingTable;
     const fs::path library = CheckedLibrary();
     setenv("NUV_OBR_MEMPOOL_ON", "1", 1);
     if (options.alignment) {
-        setenv("NUV_OBR_MEMPOOL_DATA_ALIGNMENT", std::to_string(*options.alignment).c_str(), 1);
+        setenv(dataAlignment.variable, std::to_string(*options.alignment).c_str(), 1);
     }
-    Default("NUV_OBR_MEMPOOL_DATA_ALIGNMENT", "1");
-    Default("NUV_OBR_MEMPOOL_MIN_RECORD_SIZE", "4");
+    Default(dataAlignment.variable, std::to_string(dataAlignment.smallest));
+    Default(minRecordSize.variable, std::to_string(minRecordSize.smallest));
     Default("MEMPOOL_CHECK_STATUS", "99");
     // A program may say itself where its libraries are, against which only a preload helps;
     // AddressSanitizer else wants to be the first library.
@@ -165,16 +168,15 @@ void SetEnvironment(const Options& options) {
 void AddCheck(Program& program) {
     CLI::App& check = *program.commandLine.add_subcommand("check", description);
     check.footer(notes);
+    constexpr OBR::MemPool::Setting alignment = OBR::MemPool::SettingTable::dataAlignment;
     AddCommand(program, check);
     const auto options = std::make_shared<Options>();
     check.add_option("--with", options->with, "What looks beside the library")
         ->type_name("CHECKER")
         ->check(CLI::IsMember(&checkers));
-    check
-        .add_option("--alignment", options->alignment,
-                    "Round the sizes of data up to multiples of N")
-        ->type_name("N")
-        ->check(CLI::Range(1, 65535));
+    check.add_option(alignment.option, options->alignment, alignment.help)
+        ->type_name("BYTES")
+        ->check(CLI::Range(alignment.smallest, alignment.largest).description(""));
     check.callback([&program, options] {
         const std::vector<std::string> command = program.command;
         if (command.empty()) { throw CLI::RequiredError("PROGRAM"); }

@@ -115,7 +115,10 @@ int Sweep(const std::string& path, const Options& options) {
 }
 
 int ReplayAll(const Options& options) {
-    if (!options.sweep) { ApplySettings(options.settings); }
+    if (!options.sweep) {
+        CheckSettings(options.settings);
+        Replay::UsePools(options.settings);
+    }
     int status = EXIT_SUCCESS;
     for (const std::string& path : options.paths) {
         try {
@@ -134,8 +137,9 @@ int ReplayAll(const Options& options) {
 
 // A sweep tries settings of its own, and only a sweep has a length.
 void CheckSweep(const CLI::App& replay, bool isSweep) {
-    for (const char* option : {"--bucket-size", "--max-record", "--min-record", "--alignment",
-                               "--keep-empty", "--rounds", "--dbg"}) {
+    std::vector<std::string> others = {"--rounds", "--dbg"};
+    for (const auto& row : OBR::MemPool::SettingTable::all) { others.emplace_back(row.option); }
+    for (const std::string& option : others) {
         if (isSweep && replay.count(option) != 0) { throw CLI::ExcludesError("--sweep", option); }
     }
     if (!isSweep && replay.count("--seconds") != 0) {

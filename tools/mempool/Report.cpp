@@ -78,8 +78,7 @@ int ReportOn(const Options& options) {
 }  // namespace
 
 int WriteReport(Trace::StepReader& reader, const ReportOptions& options) {
-    const std::string problem = options.settings.Problem();
-    if (!problem.empty()) { throw std::runtime_error("these settings make no pool: " + problem); }
+    CheckSettings(options.settings);
     if (!options.html.empty()) { Report::CheckCanMakePage(); }
     const Progress progress(reader.Name());
     const Report::Analysis analysis = Report::Analyse(reader, options.settings, [&](auto position) {

@@ -4,17 +4,15 @@
 #define OBR_TOOLS_MEMPOOL_SETTINGS_HPP
 
 #include <CLI/CLI.hpp>
-
-#include "replay/PoolSettings.hpp"
+#include <MemPoolSettings>
 
 namespace Tool {
 
-// Adds an option for each, which stores it in `settings`. What is not given stays as it is.
-void AddSettings(CLI::App& subcommand, Replay::PoolSettings& settings);
+// Adds an option for each setting, which stores it in `settings`. The others keep their values.
+void AddSettings(CLI::App& subcommand, OBR::MemPool::PoolSettings& settings);
 
-// Switches pools on, the trace off, and makes the settings those of the process. Settings that make
-// no pool are a std::runtime_error.
-void ApplySettings(const Replay::PoolSettings& settings);
+// Throws std::runtime_error if no pool can be built with these settings.
+void CheckSettings(const OBR::MemPool::PoolSettings& settings);
 
 }  // namespace Tool
 

@@ -46,8 +46,8 @@ std::string NamesOf(const Advice& advice, std::size_t index) {
     if (verdict.smallest == index) { names += ", smallest"; }
     if (verdict.best == index) { names += ", best"; }
     if (verdict.advised == index) { names += ", advised"; }
-    if (Advise::NumDifferences(advice.findings.settings[index].settings,
-                               Advise::LibraryDefaults()) == 0) {
+    if (Advise::NumDifferences(advice.findings.settings[index].settings, Replay::PoolSettings()) ==
+        0) {
         names += ", default";
     }
     return names.empty() ? "" : names.substr(2);

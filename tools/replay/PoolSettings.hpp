@@ -1,30 +1,20 @@
-// The settings of a pool as one value: told apart, tried one after the other, and checked before a
-// pool is built with them, which would stop the process.
+// The settings with which pools replay a trace.
 
 #ifndef OBR_TOOLS_REPLAY_POOLSETTINGS_HPP
 #define OBR_TOOLS_REPLAY_POOLSETTINGS_HPP
 
-#include <string>
+#include <MemPoolSettings>
 
 namespace Replay {
 
-// All sizes are bytes, those of records with their overhead of 4.
-struct PoolSettings {
-    unsigned int bucketSize = 0;
-    unsigned int maxRecordSize = 0;
-    unsigned int minRecordSize = 0;
-    unsigned int dataAlignment = 0;
-    bool keepEmptyBuckets = false;
+using OBR::MemPool::PoolSettings;
 
-    // Those of this process, which the environment has set or nobody yet.
-    static PoolSettings OfProcess();
-
-    // Makes them those of the process: of all pools that are built from now on.
-    void Apply() const;
-
-    // Why no pool can be built with them, or empty if one can.
-    std::string Problem() const;
-};
+// All pools built from now on have these settings, are enabled and write no trace.
+inline void UsePools(const PoolSettings& settings) {
+    settings.Apply();
+    OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);
+    OBR::MemPool::NUV_OBR_MEMPOOL_TRACE(false);
+}
 
 }  // namespace Replay
 

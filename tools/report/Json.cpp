@@ -73,12 +73,10 @@ void AddFacts(Json& json, const Analysis& analysis) {
     json["bad_lines"] = {{"total", analysis.badLines.Total()}, {"faults", std::move(faults)}};
     json["warning"] = analysis.warning.empty() ? Json(nullptr) : Json(analysis.warning);
 
-    const Replay::PoolSettings& settings = analysis.settings;
-    json["settings"] = {{"bucket_size", settings.bucketSize},
-                        {"max_record_size", settings.maxRecordSize},
-                        {"min_record_size", settings.minRecordSize},
-                        {"data_alignment", settings.dataAlignment},
-                        {"keep_empty_buckets", settings.keepEmptyBuckets}};
+    for (const auto& row : OBR::MemPool::SettingTable::all) {
+        const unsigned int value = row.In(analysis.settings);
+        json["settings"][row.key] = row.IsFlag() ? Json(value != 0) : Json(value);
+    }
 }
 
 void AddTotals(Json& json, const Analysis& analysis) {

@@ -10,34 +10,25 @@ namespace Report {
 
 namespace {
 
-constexpr std::uint32_t recHdrSize = 4;
+constexpr std::uint32_t recHdrSize = OBR::MemPool::recordOverhead;
 constexpr std::uint32_t bucketHeadSize = 48;
 constexpr std::uint32_t extRecHeadSize = 24;
-constexpr std::uint32_t maxBucketSize = 65535;
 constexpr std::uint32_t firstOffset = 2;  // Bytes of a bucket's size that no record uses.
 constexpr std::uint64_t poolBytes = MallocBytes(88);
 constexpr std::uint64_t groupBytes = MallocBytes(48);
 
-std::uint32_t RoundUp(std::uint32_t value, std::uint32_t multiple) {
-    const std::uint32_t below = value == 0 ? 0 : value - 1;
-    return below - below % multiple + multiple;
-}
-
 }  // namespace
 
 PoolModel::PoolModel(const Replay::PoolSettings& settings)
-    : alignment(std::max(settings.dataAlignment, 1U)),
-      smallestRecord(RoundUp(settings.minRecordSize, alignment)),
-      keepEmptyBuckets(settings.keepEmptyBuckets),
-      buckets(1) {
-    const std::uint32_t largestRecord = settings.maxRecordSize / alignment * alignment;
-    const std::uint32_t bucketSize = std::min(settings.bucketSize, maxBucketSize);
-    classes.resize((largestRecord - smallestRecord) / alignment + 1);
+    : sizes(settings), keepEmptyBuckets(settings.keepEmptyBuckets), buckets(1) {
+    const std::uint32_t alignment = sizes.dataAlignment;
+    classes.resize((sizes.maxRecordSize - sizes.minRecordSize) / alignment + 1);
     // If several sizes share a class, its records have room for the largest.
-    for (std::uint32_t data = alignment; data + recHdrSize <= largestRecord; data += alignment) {
+    for (std::uint32_t data = alignment; data + recHdrSize <= sizes.maxRecordSize;
+         data += alignment) {
         SizeClass& sizeClass = classes[ClassOf(data)];
         sizeClass.dataSize = data;
-        sizeClass.recsPerBucket = (bucketSize - firstOffset) / (data + recHdrSize);
+        sizeClass.recsPerBucket = (sizes.bucketSize - firstOffset) / (data + recHdrSize);
         sizesInBuckets = data + 1;
     }
 }
@@ -108,8 +99,8 @@ void PoolModel::Destroy(std::uint32_t pool) {
 }
 
 std::uint32_t PoolModel::ClassOf(std::uint32_t size) const {
-    const std::uint32_t record = RoundUp(size, alignment) + recHdrSize;
-    return (std::max(record, smallestRecord) - smallestRecord) / alignment;
+    const std::uint32_t record = OBR::MemPool::RoundUp(size, sizes.dataAlignment) + recHdrSize;
+    return (std::max(record, sizes.minRecordSize) - sizes.minRecordSize) / sizes.dataAlignment;
 }
 
 std::uint64_t PoolModel::TableBytes() const {

@@ -74,8 +74,7 @@ private:
     void Remove(Group& group, SizeClass& sizeClass, std::uint32_t index);
     std::uint64_t BucketBytes(const SizeClass& sizeClass) const;
 
-    std::uint32_t alignment;
-    std::uint32_t smallestRecord;
+    const OBR::MemPool::PoolSizes sizes;
     std::uint32_t sizesInBuckets = 0;  // Smaller sizes go into buckets.
     bool keepEmptyBuckets;
 

@@ -88,11 +88,11 @@ void Banner() {
     Inform(3260, "# NUV_OBR_MEMPOOL_INFO");
     Inform(3261, "# ================================================");
     Inform(3262, "# Version            : ", GetVersion());
-    Inform(3263, "# Bucket Size        : ", Settings::bucketSize);
-    Inform(3264, "# Data Alignment     : ", Settings::dataAlignment);
-    Inform(3265, "# Keep Empty Buckets : ", int{Settings::keepEmptyBuckets});
-    Inform(3266, "# Max Record Size    : ", Settings::maxRecordSize);
-    Inform(3267, "# Min Record Size    : ", Settings::minRecordSize);
+    Inform(3263, "# Bucket Size        : ", Settings::pool.bucketSize);
+    Inform(3264, "# Data Alignment     : ", Settings::pool.dataAlignment);
+    Inform(3265, "# Keep Empty Buckets : ", int{Settings::pool.keepEmptyBuckets});
+    Inform(3266, "# Max Record Size    : ", Settings::pool.maxRecordSize);
+    Inform(3267, "# Min Record Size    : ", Settings::pool.minRecordSize);
     Inform(3268, "# Trace              : ", int{Settings::trace});
     Inform(3269, "# Use Heap           : ", int{Settings::off});
 }
