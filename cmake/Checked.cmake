@@ -1,9 +1,9 @@
-# The checked library, which tells a host its faults: the library's own sources once more, with the
-# watch over each block. It has the same name and the same interface, and lies in a folder of its
-# own, by which a host picks it.
+# The checked library, which reports a host's faults: the library's own sources, compiled once more
+# with a watch on each block. It has the same name and interface and lies in a folder of its own, by
+# which a host picks it.
 #
-# A sanitizer's own build leaves it out: it may not be instrumented, since it reads what it keeps a
-# host from.
+# A build with a sanitizer leaves it out. It must not be instrumented, since it reads memory that it
+# has poisoned for the host.
 
 set(MEMPOOL_HAS_CHECKED OFF)
 if(MEMPOOL_IS_SHARED AND NOT CMAKE_CXX_FLAGS MATCHES "-fsanitize")
@@ -17,15 +17,16 @@ if(MEMPOOL_HAS_CHECKED)
         s/diagnostics/checked/Blocks.cpp
         s/diagnostics/checked/Checkers.cpp
         s/diagnostics/checked/EndStatus.cpp
+        s/diagnostics/checked/Variables.cpp
         s/diagnostics/checked/Watch.cpp)
     target_compile_definitions(MemPoolCheckedObjects PRIVATE OBR_MEMPOOL_CHECKED)
     find_path(VALGRIND_INCLUDE_DIR valgrind/valgrind.h)
     if(VALGRIND_INCLUDE_DIR)
         target_compile_definitions(MemPoolCheckedObjects PRIVATE OBR_KNOWS_VALGRIND)
     elseif(PROJECT_IS_TOP_LEVEL)
-        message(STATUS "Under Valgrind the checked library tells no stacks without the Debian package valgrind")
+        message(STATUS "The checked library prints no stacks under Valgrind without the Debian package valgrind")
     endif()
-    # A checker's record of where a block was taken goes from frame to frame up to the host.
+    # A checker follows the frames up to the host when it records where a block was taken.
     target_compile_options(MemPoolCheckedObjects PRIVATE
         -fno-omit-frame-pointer -fno-optimize-sibling-calls)
     mempool_library(MemPoolChecked SHARED MemPoolCheckedObjects)

@@ -89,6 +89,8 @@ TEST_F(HeapTest, KnowsTheMemoryOfAPool) {
     const BucketMgr& pool = *mgr.GetBucketMgr();
     EXPECT_EQ(ReadAt<Group**>(&pool, format::poolGroups), pool.groups);
     EXPECT_EQ(ReadAt<std::uint32_t>(&pool, format::poolNumGroups), pool.numGroups);
+    EXPECT_EQ(ReadAt<std::uint32_t>(&pool, format::poolRounding), pool.dataAlignment);
+    EXPECT_EQ(ReadAt<std::uint32_t>(&pool, format::poolMaxRecord), pool.maxRecordSize);
     EXPECT_EQ(ReadAt<void*>(&pool, format::poolExtRecs), pool.extRecs);
     static_assert(format::groupHead == offsetof(Group, head) &&
                   format::bucketNext == offsetof(Bucket, next1) &&

@@ -33,6 +33,7 @@ BucketMgr::BucketMgr(Mgr* handle, const std::string& poolName)
         Messages::MaxRecordAboveBucket(maxRecordSize, sizes.RoomInBucket(), bucketSize);
     }
     if (sizes.IsMinAboveMax()) { Messages::MinRecordAboveMax(minRecordSize, maxRecordSize); }
+    Checked::KeepSizesExact(*this);
     numGroups = (maxRecordSize - minRecordSize) / dataAlignment + 1;
     groups = new Group*[numGroups]();
     PrepareFastPath();

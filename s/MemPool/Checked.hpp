@@ -2,9 +2,9 @@
 // of a block's life. In that library (OBR_MEMPOOL_CHECKED) they lie in s/diagnostics/checked. In
 // the ordinary one they are empty, and not one instruction comes of them.
 //
-// The checked library gives each bucket one record and releases it when the record is freed,
-// whatever the settings say: so each block is a block of the heap, and what watches the heap sees
-// it. The settings themselves stay what they are, and reports show them.
+// The checked library gives each bucket one record of exactly the size asked for and releases it
+// when the record is freed, whatever the settings say: each block is a block of the heap, which
+// ends where the block ends, and what watches the heap sees it.
 
 #ifndef OBR_MEMPOOL_CHECKED_HPP
 #define OBR_MEMPOOL_CHECKED_HPP
@@ -21,7 +21,11 @@ namespace Checked {
 
 #ifdef OBR_MEMPOOL_CHECKED
 
-// What a group is told of its pool's settings.
+// A pool that is being built rounds no sizes, whatever the settings say; or to the multiple that
+// the variable MEMPOOL_CHECK_ALIGNMENT says.
+void KeepSizesExact(BucketMgr& pool);
+
+// What a group gets in place of its pool's settings.
 inline std::uint32_t BucketSize(std::uint32_t, std::uint32_t recDataSize) {
     return firstOffset + recDataSize + std::uint32_t{sizeof(RecHdr)};
 }
@@ -49,6 +53,7 @@ void AtExit();
 
 #else
 
+inline void KeepSizesExact(BucketMgr&) {}
 inline std::uint32_t BucketSize(std::uint32_t bucketSize, std::uint32_t) {
     return bucketSize;
 }

@@ -41,21 +41,20 @@ def tells(fault, kind):
     moved = 4 if kind == "heap" else 0
     damaged = r"pool nodes: bucket 0x\w{16}, record 0x\w{16}: the header is damaged up to "
     return {
-        "double free": r"pool nodes: 0x\w{16} is freed already",
-        "double free, large": r"pool nodes: 0x\w{16} is freed already",
+        "double free": r"pool nodes: 0x\w{16} is already freed",
+        "double free, large": r"pool nodes: 0x\w{16} is already freed",
         "wrong pool": r"pool others: 0x\w{16} is a block of pool nodes",
         "wrong pool, large": r"pool others: 0x\w{16} is a block of pool nodes",
-        "inner": rf"pool nodes: (0x\w{{16}}) is no block of a pool\nmempool: pool nodes: \1 lies "
-                 rf"{16 + moved} bytes into the block at 0x\w{{16}}",
-        "underrun 1": damaged + r"1 byte ahead of the data \(guard\)" if kind == "bare" else
-                      r"pool nodes: (0x\w{16}) is no block of a pool\n[^=]*lies 4 bytes into",
-        "underrun 40": damaged + (r"40 bytes ahead of the data \(next1\)" if kind == "bare" else
-                                  r"36 bytes ahead of the data \(prev1\)"),
+        "inner": rf"pool nodes: 0x\w{{16}} is not a block: it lies {8 + moved} bytes into the block at 0x",
+        "underrun 1": damaged + r"1 byte before the data \(guard\)" if kind == "bare" else
+                      r"pool nodes: 0x\w{16} is not a block: it lies 4 bytes into",
+        "underrun 40": damaged + (r"40 bytes before the data \(next1\)" if kind == "bare" else
+                                  r"36 bytes before the data \(prev1\)"),
         "underrun 1, large": r"pool nodes: heap record 0x\w{16}: the header is damaged up to 1 byte"
-                             r" ahead of the data \(guard\)",
-        "leak": rf"pool nodes: 1 block, {24 + moved} bytes never freed",
-        "leak, large": rf"pool nodes: 1 block, {2000 + moved} bytes never freed",
-        "exit": rf"pool kept: 1 block, {24 + moved} bytes never freed",
+                             r" before the data \(guard\)",
+        "leak": rf"pool nodes: 1 block, {13 + moved} bytes never freed",
+        "leak, large": "pool nodes: 1 block, 2001 bytes never freed",
+        "exit": rf"pool kept: 1 block, {13 + moved} bytes never freed",
     }.get(fault)
 
 
@@ -63,10 +62,12 @@ def tells(fault, kind):
 found = {"asan": {"read after free": "heap-use-after-free", "write after free": "heap-use-after-free",
                   "use after clear": "heap-use-after-free", "underrun 40": "use-after-poison",
                   "underrun 1, large": "use-after-poison",
-                  "overrun 1": "heap-buffer-overflow", "overrun 40": "heap-buffer-overflow",
+                  "overrun 1": "heap-buffer-overflow", "heap record overrun, large": "heap-buffer-overflow",
+                  "overrun 40": "heap-buffer-overflow",
                   "overrun 100": "heap-buffer-overflow", "underrun 100": "heap-buffer-overflow"},
          "valgrind": {"read after free": "Invalid read", "write after free": "Invalid write",
                       "use after clear": "Invalid write", "overrun 1": "Invalid write",
+                      "heap record overrun, large": "Invalid write",
                       "overrun 40": "Invalid write", "overrun 100": "Invalid write",
                       "underrun 100": "Invalid write"},
          "nothing": {}}
@@ -118,6 +119,11 @@ for checker, host in (("nothing", plain), ("asan", sanitized), ("valgrind", plai
         expect(check(checker, host, "bare", *faults_made)[0] == status, f"{checker} {faults_made}", "")
 expect(check("nothing", plain, "bare", "double free", MEMPOOL_CHECK_STATUS="7")[0] == 7, "7", "")
 expect(check("nothing", plain, "bare", "double free", MEMPOOL_CHECK_STATUS="0")[0] == 0, "0", "")
+for wrong in ("300", "7 ", ""):
+    status, sections = check("nothing", plain, "bare", "double free", MEMPOOL_CHECK_STATUS=wrong)
+    expect(status == 99 and f"STATUS={wrong}: not a number from 0 to 255; 99 is used" in sections["exit"],
+           f"{wrong}: {status}", sections)
+expect(check("asan", "--alignment", "8", sanitized, "bare", "overrun 1")[0] == 0, "alignment", "")
 expect(check("asan", sanitized, "bare", "double free", "heap leak",
              ASAN_OPTIONS="exitcode=5")[0] == 5, "the status of LeakSanitizer", "")
 expect(check("nothing", plain, "bare", "double free", MEMPOOL_ABORT="1")[0] == -6, "abort", "")
@@ -129,7 +135,7 @@ if has_valgrind == "yes":
     expect(status == 0 and "checking with valgrind" in sections[""], f"valgrind: {status}", sections)
 for checker, host, status, reason in (("asan", plain, 125, "not built with -fsanitize=address"),
                                       ("valgrind", sanitized, 125, "does not run under Valgrind"),
-                                      ("nothing", static, 125, "has the library in it"),
+                                      ("nothing", static, 125, "contains the library"),
                                       ("nothing", "/", 126, "Is a directory"),
                                       ("nothing", source, 126, "Permission denied"),
                                       ("nothing", "no-such-program", 127, "No such file"),

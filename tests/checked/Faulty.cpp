@@ -46,7 +46,7 @@ bool Make(const std::string& fault) {
     Pool nodes("nodes");
     Pool others("others");
     const bool isLarge = fault.find(", large") != std::string::npos;
-    const unsigned int size = isLarge ? 2000 : 24;
+    const unsigned int size = isLarge ? 2001 : 13;
     volatile char* const block = nodes.Take(size);  // taken here
     const auto is = [&](const char* name) { return fault.find(name) == 0; };
     if (is("none")) {
@@ -85,7 +85,7 @@ bool Make(const std::string& fault) {
         const bool refused = !others.Give(block);  // at: wrong pool
         return nodes.Give(block) && refused;
     } else if (is("inner")) {
-        const bool refused = !nodes.Give(block + 16);  // at: inner
+        const bool refused = !nodes.Give(block + 8);  // at: inner
         return nodes.Give(block) && refused;
     } else if (is("overrun 100")) {
         block[size + 99] = 1;  // at: overrun 100
@@ -95,6 +95,9 @@ bool Make(const std::string& fault) {
         return nodes.Give(block);
     } else if (is("overrun 1")) {
         block[size] = 1;  // at: overrun 1
+        return nodes.Give(block);
+    } else if (is("heap record overrun")) {
+        block[size] = 1;  // at: heap record overrun
         return nodes.Give(block);
     } else if (is("underrun 100")) {
         block[-100] = 1;  // at: underrun 100
@@ -119,6 +122,7 @@ bool Make(const std::string& fault) {
 
 int main(int argc, char** argv) {
     NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS(true);
+    NUV_OBR_MEMPOOL_DATA_ALIGNMENT(8);
     const bool isBare = argv[1] == std::string("bare");
     for (int i = 2; i < argc; ++i) {
         std::cerr << "== " << argv[i] << std::endl;
@@ -127,5 +131,5 @@ int main(int argc, char** argv) {
         }
     }
     std::cerr << "== exit" << std::endl;
-    std::fputs("all", stdout);  // Stays in the buffer.
+    std::fputs("all", fdopen(STDOUT_FILENO, "w"));  // Stays in the buffer.
 }

@@ -9,7 +9,6 @@
 #include <iostream>
 #include <map>
 #include <memory>
-#include <optional>
 #include <sstream>
 #include <stdexcept>
 #include <string>
@@ -28,30 +27,34 @@ namespace {
 
 namespace fs = std::filesystem;
 
-constexpr const char* description = "Run a program on pools that tell its faults";
+constexpr const char* description = "Run a program on pools that report its faults";
 
 constexpr const char* notes =
-    R"(The program runs as it is, with the checked library in place of the ordinary one: each block is a
-block of the heap by itself, so that a checker sees a use after free or after Clear, an overrun and
-an underrun. The library itself tells on standard error a release that it refuses, a header that an
-underrun has damaged, and the blocks that live when their pool or the process ends.
+    R"(The program runs unchanged, with pools enabled and with the checked library in place of the ordinary
+one. There each block is a heap block of its own, so that a checker sees a use after Free or Clear,
+an overrun and an underrun. The library itself reports on standard error each release that it
+refuses, each header that an underrun has damaged, and the blocks that are still in use when their
+pool or the process ends.
 
-asan          The program is built with -fsanitize=address.
-valgrind      It is not, and runs under Valgrind's memcheck.
-nothing       Only the library looks. Say it to run under another tool, or under gdb.
+asan          AddressSanitizer, for a program that is built with -fsanitize=address.
+valgrind      Valgrind's memcheck, for any other program.
+nothing       The library alone: to run the program under another tool, or under gdb.
 
-Without --with it is asan for a program that is built so, else valgrind where it is installed.
+The default is asan for a program that is built with it, else valgrind if it is installed.
 
-Variables: NUV_OBR_MEMPOOL_DATA_ALIGNMENT and NUV_OBR_MEMPOOL_MIN_RECORD_SIZE are 1 and 4 unless
-they are set, so that a block ends where the host's data end. ASAN_OPTIONS and VALGRIND_OPTS are
-heeded, before the default red zones of 128 bytes in the first. MEMPOOL_ABORT=1 has the library
-abort at a release that it refuses, for a debugger to stand there.
+Sizes are not rounded, so that one-byte overruns are caught. For a program that relies on the
+rounding, --alignment brings it back.
 
-Exit status: the program's, or of the checker where it found something: 1 of AddressSanitizer, 99 of
-Valgrind. Where only the library told something, 99 in place of 0; MEMPOOL_CHECK_STATUS is another
-number for it, and 0 leaves the program's. It is for ends by exit or of main, and each process that
-the program starts has its own. 125 if nothing was run, 126 if the program cannot be, 127 if there
-is none of that name.
+ASAN_OPTIONS            Kept, as VALGRIND_OPTS is; the default red zones are 128 bytes.
+MEMPOOL_ABORT           1: the library aborts at a release that it refuses, so that a debugger
+                        stops there.
+MEMPOOL_CHECK_STATUS    The exit status, from 1 to 255, for faults that only the library reports, 99
+                        by default; 0 keeps the program's.
+
+Exit status: the checker's if it found a fault, 1 from AddressSanitizer and 99 from Valgrind; else
+the program's. If that is 0, by exit or at the end of main, but the library reported a fault, it is
+99. Each process that the program starts has its own. 125 if nothing was run, 126 if the program
+cannot be run or checked, 127 if it is not found.
 )";
 
 enum class With { asan, valgrind, nothing };
@@ -60,15 +63,14 @@ const std::map<std::string, With> checkers = {
 
 struct Options {
     std::string with;  // A name of `checkers`, or empty.
-    std::optional<unsigned int> alignment;
+    unsigned int alignment = 1;
 };
 
 void Say(const std::string& what) {
     std::cerr << "mempool: " << what << '\n';
 }
 
-// The first of the places beside this tool that has the checked library: in an install, and where
-// the tool was built.
+// The checked library: beside the installed tool, or where the tool was built.
 fs::path CheckedLibrary() {
     const fs::path here = fs::read_symlink("/proc/self/exe").parent_path();
     std::istringstream places(CHECKED_PLACES);
@@ -76,7 +78,7 @@ fs::path CheckedLibrary() {
         fs::path library = (here / place / "libObrMemPool.so.1").lexically_normal();
         if (fs::exists(library)) { return library; }
     }
-    throw std::runtime_error("the checked library is not installed beside " + here.string());
+    throw std::runtime_error("the checked library is not installed with " + here.string());
 }
 
 With Choose(const Options& options, const HostFile& host, const std::string& program) {
@@ -90,16 +92,12 @@ With Choose(const Options& options, const HostFile& host, const std::string& pro
     }
     if (with == With::valgrind && host.isSanitized) {
         throw std::runtime_error(
-            program + " is built with -fsanitize=address, which does not run " + "under Valgrind");
+            program + " is built with -fsanitize=address, which does not run under Valgrind");
     }
     if (with == With::valgrind && !hasValgrind) {
         throw std::runtime_error("Valgrind is not installed (Debian package valgrind)");
     }
     return with;
-}
-
-void Default(const char* variable, const std::string& value) {
-    setenv(variable, value.c_str(), 0);
 }
 
 // Puts a value in front of those that a variable has.
@@ -110,17 +108,12 @@ void Prepend(const char* variable, const std::string& value) {
 }
 
 void SetEnvironment(const Options& options) {
-    using namespace OBR::MemPool::SettingTable;
     const fs::path library = CheckedLibrary();
     setenv("NUV_OBR_MEMPOOL_ON", "1", 1);
-    if (options.alignment) {
-        setenv(dataAlignment.variable, std::to_string(*options.alignment).c_str(), 1);
-    }
-    Default(dataAlignment.variable, std::to_string(dataAlignment.smallest));
-    Default(minRecordSize.variable, std::to_string(minRecordSize.smallest));
-    Default("MEMPOOL_CHECK_STATUS", "99");
-    // A program may say itself where its libraries are, against which only a preload helps;
-    // AddressSanitizer else wants to be the first library.
+    setenv("MEMPOOL_CHECK_ALIGNMENT", std::to_string(options.alignment).c_str(), 1);
+    setenv("MEMPOOL_CHECK_STATUS", "99", 0);
+    // A program's own path to its libraries comes before LD_LIBRARY_PATH; only a preload overrides
+    // it. By default AddressSanitizer insists on being the first library.
     Prepend("LD_LIBRARY_PATH", library.parent_path());
     Prepend("LD_PRELOAD", library);
     Prepend("ASAN_OPTIONS", "redzone=128:verify_asan_link_order=0");
@@ -142,11 +135,12 @@ void SetEnvironment(const Options& options) {
     Record::CheckProgram(program, "checked");
     const HostFile host = ReadHostFile(Record::FindProgram(program));
     if (host.holdsLibrary) {
-        throw std::runtime_error(program + " has the library in it (libObrMemPool.a): link the " +
-                                 "shared one to check it");
+        throw std::runtime_error(program +
+                                 " contains the library (libObrMemPool.a); to check it, " +
+                                 "link the shared library");
     }
     if (!host.isScript && !host.namesLibrary) {
-        Say(program + " itself does not use libObrMemPool.so: what it loads or starts may");
+        Say(program + " does not use libObrMemPool.so itself; what it loads or starts may");
     }
     const With with = Choose(options, host, program);
     SetEnvironment(options);
@@ -171,12 +165,13 @@ void AddCheck(Program& program) {
     constexpr OBR::MemPool::Setting alignment = OBR::MemPool::SettingTable::dataAlignment;
     AddCommand(program, check);
     const auto options = std::make_shared<Options>();
-    check.add_option("--with", options->with, "What looks beside the library")
+    check.add_option("--with", options->with, "The checker that the program runs under")
         ->type_name("CHECKER")
         ->check(CLI::IsMember(&checkers));
     check.add_option(alignment.option, options->alignment, alignment.help)
         ->type_name("BYTES")
-        ->check(CLI::Range(alignment.smallest, alignment.largest).description(""));
+        ->check(CLI::Range(1, 64).description(""))
+        ->capture_default_str();
     check.callback([&program, options] {
         const std::vector<std::string> command = program.command;
         if (command.empty()) { throw CLI::RequiredError("PROGRAM"); }

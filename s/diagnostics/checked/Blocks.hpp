@@ -1,5 +1,5 @@
-// The blocks of all pools, by the address of their data: those that live, each with its header as
-// the library left it, and those that were freed. It reads a block's memory once, as it is taken.
+// The blocks of all pools, by the address of their data: the living ones, each with its header as
+// the library left it, and the freed ones. A block's memory is read once, when the block is added.
 
 #ifndef OBR_DIAGNOSTICS_BLOCKS_HPP
 #define OBR_DIAGNOSTICS_BLOCKS_HPP
@@ -16,36 +16,41 @@
 
 namespace OBR::MemPool::Checked {
 
-// What lies ahead of a block's data: the header of a bucket and that of its one record, or that of
-// a heap record. Both begin the block of the heap, and both have two links to their neighbours.
+// The header before a block's data: that of a bucket and of its one record, or that of a heap
+// record. Either starts a block of the heap and has links to two neighbours.
 struct Layout {
+    struct Field {
+        std::size_t offset;
+        std::size_t size;  // 0 if there is no such field.
+        const char* name;
+    };
     std::size_t size;  // Of the header.
     std::size_t next;  // Where in it the links stand.
     std::size_t prev;
+    std::array<Field, 12> fields;
 };
-inline constexpr Layout bucketLayout = {sizeof(Bucket) + sizeof(RecHdr), offsetof(Bucket, next1),
-                                        offsetof(Bucket, prev1)};
-inline constexpr Layout heapRecordLayout = {sizeof(ExtRec), offsetof(ExtRec, next),
-                                            offsetof(ExtRec, prev)};
+extern const Layout bucketLayout;
+extern const Layout heapRecordLayout;
 
-// A living block.
 struct Block {
-    const BucketMgr* pool;
-    std::uint32_t size;                                 // Bytes asked for.
-    const Layout* layout;                               // One of the two above.
-    std::array<unsigned char, bucketLayout.size> head;  // What the header must be.
+    static constexpr std::size_t maxHeaderSize = sizeof(Bucket) + sizeof(RecHdr);
+
+    const BucketMgr* pool;                            // Null once the block is freed.
+    std::uint32_t size;                               // Bytes asked for.
+    const Layout* layout;                             // One of the two above.
+    std::array<unsigned char, maxHeaderSize> header;  // What the header must be.
 
     bool IsHeapRecord() const { return layout == &heapRecordLayout; }
 
     // The data of a neighbour in the pool's list, or null.
     const char* Neighbour(std::size_t link) const {
         const char* start = nullptr;
-        std::memcpy(&start, &head[link], sizeof start);
+        std::memcpy(&start, &header[link], sizeof start);
         return start == nullptr ? nullptr : start + layout->size;
     }
     void SetNeighbour(std::size_t link, const char* data) {
         const char* const start = data == nullptr ? nullptr : data - layout->size;
-        std::memcpy(&head[link], &start, sizeof start);
+        std::memcpy(&header[link], &start, sizeof start);
     }
 };
 
@@ -53,27 +58,27 @@ class Blocks {
 public:
     using ByAddress = std::unordered_map<const char*, Block>;
 
-    const ByAddress& Living() const { return living; }
+    // The freed ones too.
+    const ByAddress& All() const { return blocks; }
 
-    // The living block whose data begin there, or null.
+    // The living block whose data start there, or null.
     Block* Find(const void* data);
 
-    // The data of the living block, or else of the freed one, that the address lies in; or null. It
-    // is a search through all of them.
+    // The start of the living block that contains the address, or else of a freed one that did; or
+    // null. Searches all of them.
     const char* Around(const void* address) const;
 
-    // Enters a block that was just taken; its header says what it is.
+    // Adds a block that was just taken; its header says what it is.
     Block& Add(const BucketMgr& pool, const char* data, std::uint32_t size);
 
-    // Moves a living block to the freed ones, or forgets it where memory is exhausted.
-    void Release(const char* data);
+    // Marks a living block as freed. Its address stays known until another block has it.
+    static void Release(Block& block) { block.pool = nullptr; }
 
-    // Takes it out of its neighbours' links, ahead of that.
+    // Takes a block out of its neighbours' links, before it is released by itself.
     void Unlink(const Block& block);
 
 private:
-    ByAddress living;
-    ByAddress freed;  // Until another block has the address.
+    ByAddress blocks;
 };
 
 }  // namespace OBR::MemPool::Checked

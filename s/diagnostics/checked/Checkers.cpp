@@ -8,25 +8,20 @@
 
 #include "diagnostics/text/Text.hpp"
 
-// Null where the host has no AddressSanitizer.
+// Null if the host has no AddressSanitizer.
 // NOLINTBEGIN(bugprone-reserved-identifier,readability-identifier-naming)
-#define OBR_IF_THERE __attribute__((weak, visibility("default")))
+#define OBR_WEAK __attribute__((weak, visibility("default")))
 extern "C" {
-OBR_IF_THERE void __asan_poison_memory_region(const volatile void* start, std::size_t size);
-OBR_IF_THERE void __asan_unpoison_memory_region(const volatile void* start, std::size_t size);
-OBR_IF_THERE void __asan_describe_address(void* address);
-OBR_IF_THERE void __sanitizer_print_stack_trace();
+OBR_WEAK void __asan_poison_memory_region(const volatile void* start, std::size_t size);
+OBR_WEAK void __asan_unpoison_memory_region(const volatile void* start, std::size_t size);
+OBR_WEAK void __asan_describe_address(void* address);
+OBR_WEAK void __sanitizer_print_stack_trace();
 }
 // NOLINTEND(bugprone-reserved-identifier,readability-identifier-naming)
 
 namespace OBR::MemPool::Checkers {
 
 namespace {
-
-// AddressSanitizer keeps books on 8 bytes at a time.
-std::size_t WholeGranules(std::size_t size) {
-    return size & ~std::size_t{7};
-}
 
 #ifdef OBR_KNOWS_VALGRIND
 void ValgrindStack() {
@@ -44,23 +39,19 @@ void ValgrindHistory(const void*) {}
 }  // namespace
 
 void Poison(const void* start, std::size_t size) {
-    if (__asan_poison_memory_region != nullptr) {
-        __asan_poison_memory_region(start, WholeGranules(size));
-    }
+    if (__asan_poison_memory_region != nullptr) { __asan_poison_memory_region(start, size); }
 }
 
 void Unpoison(const void* start, std::size_t size) {
-    if (__asan_unpoison_memory_region != nullptr) {
-        __asan_unpoison_memory_region(start, WholeGranules(size));
-    }
+    if (__asan_unpoison_memory_region != nullptr) { __asan_unpoison_memory_region(start, size); }
 }
 
-void TellStack() {
+void PrintStack() {
     if (__sanitizer_print_stack_trace != nullptr) { __sanitizer_print_stack_trace(); }
     ValgrindStack();
 }
 
-void TellHistory(const void* address) {
+void PrintHistory(const void* address) {
     if (__asan_describe_address != nullptr) { __asan_describe_address(const_cast<void*>(address)); }
     ValgrindHistory(address);
 }

@@ -1,4 +1,4 @@
-// The checkers that may watch the host, AddressSanitizer and Valgrind, asked for what they know.
+// What the checkers that may watch the host, AddressSanitizer and Valgrind, know and can be told.
 // The library needs neither: AddressSanitizer's interface is there if the host brings it, and
 // Valgrind's is a few instructions that do nothing elsewhere.
 
@@ -9,16 +9,16 @@
 
 namespace OBR::MemPool::Checkers {
 
-// Under AddressSanitizer the host's accesses to these bytes are faults from now on, or no longer.
-// They begin at a multiple of 8, and an odd rest of them is left out.
+// From now on AddressSanitizer reports accesses of the host to these bytes, or no longer. It marks
+// 8 bytes at a time, and leaves out the last bytes if they are fewer.
 void Poison(const void* start, std::size_t size);
 void Unpoison(const void* start, std::size_t size);
 
-// Writes which code is running.
-void TellStack();
+// Prints the stack of the caller.
+void PrintStack();
 
-// Writes what is known of an address: where its block was taken, and where it was released.
-void TellHistory(const void* address);
+// Prints what is known of an address: where its block was taken, and where it was released.
+void PrintHistory(const void* address);
 
 }  // namespace OBR::MemPool::Checkers
 

@@ -1,7 +1,6 @@
-// How the status is changed: only a handler of on_exit learns what the process was to end with.
-// This one stands ready before main and in no library's name, so that it runs behind the
-// destructors of the host and of every library. Flushing C's streams, which comes behind it, is
-// done here.
+// Only a handler of on_exit learns the status that the process is to end with. This one is
+// registered before main and outside of any library, so that it runs after the destructors of the
+// host and of every library. It also flushes C's streams, which would come after it.
 
 #include "diagnostics/checked/EndStatus.hpp"
 
@@ -12,8 +11,10 @@
 #include <cstdlib>
 
 #include "HostLayer/HostEnv.hpp"
+#include "diagnostics/checked/Variables.hpp"
 
-// Null where the host has no LeakSanitizer. A status of its own wins, if it has not looked yet.
+// Null if the host has no LeakSanitizer. If that has not run yet and finds a leak, it ends the
+// process with a status of its own.
 // NOLINTNEXTLINE(bugprone-reserved-identifier,readability-identifier-naming)
 extern "C" __attribute__((weak, visibility("default"))) void __lsan_do_leak_check();
 
@@ -21,28 +22,24 @@ namespace OBR::MemPool::EndStatus {
 
 namespace {
 
-// The process that a fault was told of, or 0.
-std::atomic<pid_t> faulty = 0;
+std::atomic<pid_t> faulty = 0;  // The process in which a fault was reported, or 0.
 
 #ifdef __GLIBC__
-int AskedFor() {
-    const char* const text = Host_Env::GetEnv("MEMPOOL_CHECK_STATUS");
-    char* end = nullptr;
-    const long status = text == nullptr ? 0 : std::strtol(text, &end, 10);
-    return status >= 1 && status <= 255 && *end == '\0' ? static_cast<int>(status) : 0;
-}
+constexpr const char* variable = "MEMPOOL_CHECK_STATUS";
 
 void End(int status, void* /*none*/) {
     if (status != 0 || faulty != getpid()) { return; }
+    const int own = Checked::NumberOf(variable, 0, 255, 99);
+    if (own == 0) { return; }
     if (__lsan_do_leak_check != nullptr) { __lsan_do_leak_check(); }
     std::fflush(nullptr);
-    _exit(AskedFor());
+    _exit(own);
 }
 
-// A library that can be unloaded must not leave the handler behind: only `mempool check`, which
-// preloads this one, asks for it.
-__attribute__((constructor)) void StandReady() {
-    if (AskedFor() != 0) { on_exit(End, nullptr); }
+// A library that can be unloaded must not leave the handler behind. `mempool check` sets the
+// variable and preloads the library, which therefore stays.
+__attribute__((constructor)) void Register() {
+    if (Host_Env::GetEnv(variable) != nullptr) { on_exit(End, nullptr); }
 }
 #endif
 
