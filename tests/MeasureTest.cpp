@@ -64,31 +64,24 @@ TEST(Recording, MergesGroupsButNoPools) {
     EXPECT_EQ(pools.steps.size(), 5U);
 }
 
-TEST(Measure, TakesTheMedian) {
-    EXPECT_EQ(Replay::Median({9, 1, 8, 2, 5}), 5);
-}
-
-// The pools are clocked twice a round, the heap twice more for what it frees at the end of a pool.
+// The pools are clocked twice, the heap twice more for what it frees at the end of a pool.
 TEST(Measure, ChargesEachSideWithTheTimeOfItsEvents) {
     const Replay::Recording recording = Record("@c:P\n@a:P:X:8\n@x:P\n@a:P:X:8\n@d:P\n");
-    std::vector<unsigned int> rounds;
-    const auto times =
-        Replay::NanosecondsPerEvent(recording, 3, [&](unsigned int n) { rounds.push_back(n); });
-    EXPECT_EQ(rounds, (std::vector<unsigned int>{1, 2, 3}));
-    // Pool: 2, 12, 14. Heap: 4 + 6, 8 + 10, 16 + 18. It is first in the second round.
-    EXPECT_DOUBLE_EQ(times.pool, 12. / 5);
-    EXPECT_DOUBLE_EQ(times.heap, 18. / 5);
+    EXPECT_DOUBLE_EQ(Replay::PoolNanosecondsPerEvent(recording), 2. / 5);
+    EXPECT_DOUBLE_EQ(Replay::HeapNanosecondsPerEvent(recording), (4. + 6) / 5);
 }
 
 TEST(Measure, CountsWhatIsHeldAndGivesAllOfItBack) {
     const Replay::Recording recording =
         Record("@c:P\n@a:P:X:5000\n@x:P\n@c:Q\n@a:Q:X:6000\n@d:Q\n@a:P:X:6000\n@a:P:Y:1025\n");
-    const auto held = Replay::BytesHeld(recording, [] {});
-    EXPECT_EQ(held.heap, Taken(6000) + Taken(1025)) << "In place of the bytes asked for.";
-    EXPECT_NEAR(static_cast<double>(held.pool), 6000 + 1025 + 2 * 24 + 249 * 8 + 400, 400);
+    EXPECT_EQ(Replay::BytesHeldByHeap(recording), Taken(6000) + Taken(1025))
+        << "In place of the bytes asked for.";
+    EXPECT_NEAR(static_cast<double>(Replay::BytesHeldByPools(recording)),
+                6000 + 1025 + 2 * 24 + 249 * 8 + 400, 400);
 
     HeapCount::Start();
-    Replay::NanosecondsPerEvent(recording, 2, [](auto) {});
+    Replay::PoolNanosecondsPerEvent(recording);
+    Replay::HeapNanosecondsPerEvent(recording);
     EXPECT_EQ(HeapCount::Stop(), 0);
 }
 

@@ -102,17 +102,18 @@ TEST(Replay, ReportsOnEachTrace) {
     std::istringstream lines(report);
     for (std::string line; std::getline(lines, line); text += line + "\n") {
         const bool isHeld = line.find("   bytes held") == 0;
-        if (isHeld || line.find("   ns an event") == 0) {
+        if (isHeld || line.find("   ns per event") == 0) {
             EXPECT_EQ(line.size(), 25U + 3 * 12) << line;
             const bool isOfNothing = isHeld && line.back() == '-';
             line.replace(25, std::string::npos, isOfNothing ? "  # # -" : "  # # #");
         }
+        if (line.find("   spread") == 0) { line = "   spread  # #"; }
     }
     const std::string path = EXPECTED_DIR "/replay.txt";
     if (std::getenv("OBR_MEMPOOL_APPROVE") != nullptr) { std::ofstream(path) << text; }
     std::ifstream file(path);
     EXPECT_EQ(text, std::string(std::istreambuf_iterator<char>(file), {}));
-    const Figures times = Find(report, "ns an event");
+    const Figures times = Find(report, "ns per event");
     EXPECT_TRUE(times.pool > 1 && times.pool < 1e7) << times.pool;
     EXPECT_TRUE(times.heap > 1 && times.heap < 1e7) << times.heap;
 }
@@ -137,7 +138,7 @@ TEST(Replay, RefusesSettingsThatMakeNoPool) {
     for (const char* options :
          {"--bucket-size 1004", "--alignment 3 --bucket-size 1003", "--min-record 997",
           "--max-record 32767 --bucket-size 32768", "--max-record 4 --min-record 4"}) {
-        EXPECT_THAT(Tool(options + (" --rounds 1 " + path)), HasSubstr("ns an event")) << options;
+        EXPECT_THAT(Tool(options + (" --rounds 1 " + path)), HasSubstr("ns per event")) << options;
     }
     for (const char* options : {"--bucket-size 1003", "--alignment 3 --bucket-size 1002",
                                 "--bucket-size 3", "--min-record 1001", "--max-record 3"}) {
@@ -157,7 +158,7 @@ TEST(Replay, GoesAsFarAsATruncatedTraceDoes) {
     EXPECT_THAT(report, HasSubstr("mempool: standard input: unexpected end of file; read as far as "
                                   "it goes\n"));
     EXPECT_THAT(report, HasSubstr("bytes at the peak               24 "));
-    EXPECT_THAT(report, HasSubstr("   ns an event"));
+    EXPECT_THAT(report, HasSubstr("   ns per event"));
 }
 
 // Memory runs out at 256 MB; the next trace still has its turn.
@@ -185,7 +186,7 @@ TEST(Replay, CountsWhatIsHeldAtThePeak) {
         return Find(Tool("--rounds 1 " + options + path), "bytes held at the peak");
     };
     const Figures figures = held("");
-    EXPECT_EQ(figures.heap, 5000 + 24 + 2 * 8);
+    EXPECT_NEAR(figures.heap, 5000 + 24 + 2 * 8, 16) << "A free block may be split off or not.";
     // A pool, its table, its first group, a heap record, a bucket; names and the like.
     EXPECT_NEAR(figures.pool, 88 + 249 * 8 + 40 + 5000 + 24 + 4000 + 250, 250);
     EXPECT_NEAR(held("--keep-empty ").pool, figures.pool + 4000, 200) << "The bucket of 200 bytes.";

@@ -48,92 +48,49 @@ std::string Blocks(const std::string& more) {
     return lines;
 }
 
-TEST(Advise, FiguresVerdictAndEnvironmentAgree) {
+TEST(Advise, TextFiguresVerdictAndEnvironmentAgree) {
     const std::string path = TraceFile("shared", Blocks("@i:allocation_share:0.25\n"));
     const json advice = json::parse(Command(MEMPOOL " advise --json --seconds 1 " + path));
 
     std::set<std::string> keys;
     for (const auto& [key, value] : advice.items()) { keys.insert(key); }
-    EXPECT_EQ(keys, (std::set<std::string>{"events", "events_left_out", "heap", "settings",
-                                           "fastest", "smallest", "advised", "best", "verdict",
-                                           "environment", "allocation_share"}));
+    EXPECT_EQ(keys,
+              (std::set<std::string>{"events", "events_left_out", "heap", "settings", "fastest",
+                                     "smallest", "advised", "best", "verdict", "price", "sentences",
+                                     "environment", "allocation_share"}));
     EXPECT_EQ(advice["events"], 6001);
     EXPECT_EQ(advice["events_left_out"], 0);
     EXPECT_EQ(advice["allocation_share"], 0.25);
-    const json& heap = advice["heap"];
     const json& settings = advice["settings"];
     ASSERT_GE(settings.size(), 2U);
-    EXPECT_EQ(heap.size(), 3U);
+    EXPECT_EQ(advice["heap"].size(), 3U);
     const json& fastest = settings[advice["fastest"].get<std::size_t>()];
     const json& smallest = settings[advice["smallest"].get<std::size_t>()];
-    bool anyCostsNothing = false;
-    const auto costsNothing = [&](const json& each) {
-        return each["ns_per_event"] <= heap["ns_per_event"] &&
-               each["bytes_held"] <= heap["bytes_held"];
-    };
     for (const json& each : settings) {
         EXPECT_EQ(each.size(), 8U);
         EXPECT_GT(each["ns_per_event"], 0);
         EXPECT_GE(each["ns_spread"], 0);
         EXPECT_LE(fastest["ns_per_event"], each["ns_per_event"]);
         EXPECT_LE(smallest["bytes_held"], each["bytes_held"]);
-        anyCostsNothing = anyCostsNothing || costsNothing(each);
     }
-    EXPECT_EQ(advice["best"].is_null(), !anyCostsNothing);
-    if (anyCostsNothing) { EXPECT_TRUE(costsNothing(settings[advice["best"].get<std::size_t>()])); }
-
-    // With the environment that is advised a pool has the settings of one of the rows.
-    ASSERT_EQ(advice["environment"].empty(), advice["verdict"] == "none") << advice;
-    ASSERT_EQ(advice["advised"].is_null(), advice["verdict"] == "none") << advice;
-    if (advice["verdict"] == "none") { return; }
-    std::string variables = "env";
-    for (const auto& [name, value] : advice["environment"].items()) {
-        variables += " " + name + "=" + value.get<std::string>();
+    const bool helps = advice["verdict"] != "none";
+    EXPECT_EQ(advice["advised"].is_null(), !helps) << advice;
+    EXPECT_EQ(advice["environment"].size(), helps ? 6U : 0U) << advice;
+    EXPECT_EQ(advice["sentences"][0].get<std::string>().find("Pools would help") == 0, helps);
+    if (helps) {
+        const json& advised = settings[advice["advised"].get<std::size_t>()];
+        EXPECT_EQ(std::to_string(advised["bucket_size"].get<unsigned int>()),
+                  advice["environment"]["NUV_OBR_MEMPOOL_BUCKET_SIZE"]);
     }
-    const std::string report = Command(variables + " " MEMPOOL " replay --rounds 1 --dbg " + path);
-    const auto value = [&](const std::string& label) {
-        return std::stoul(report.substr(report.find(label + " :") + label.size() + 2));
-    };
-    unsigned int numMatches = 0;
-    for (const json& each : settings) {
-        const auto alignment = each["data_alignment"].get<unsigned int>();
-        const auto rounded = each["max_record_size"].get<unsigned int>() / alignment * alignment;
-        const bool keeps = advice["environment"]["NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS"] == "1";
-        if (each["bucket_size"] == value("Bucket Size") && rounded == value("Max Rec Sz ") &&
-            alignment == value("Data Align ") && each["keep_empty_buckets"] == keeps &&
-            std::to_string(each["min_record_size"].get<unsigned int>()) ==
-                advice["environment"]["NUV_OBR_MEMPOOL_MIN_RECORD_SIZE"]) {
-            ++numMatches;
-            EXPECT_EQ(&each, &settings[advice["advised"].get<std::size_t>()]);
-            const bool isFaster = each["ns_per_event"] < heap["ns_per_event"];
-            const bool isSmaller = each["bytes_held"] < heap["bytes_held"];
-            EXPECT_TRUE(advice["verdict"] == "smaller" || isFaster) << advice;
-            EXPECT_TRUE(advice["verdict"] == "faster" || isSmaller) << advice;
-        }
-    }
-    EXPECT_EQ(numMatches, 1U) << report << advice;
 }
 
-TEST(Advise, PrintsATableAndAVerdict) {
-    const std::string path = TraceFile("plain", Blocks("@i:allocation_share:0.25\n"));
-    const std::string advice = Command(MEMPOOL " advise --seconds 1 " + path);
-    EXPECT_THAT(advice, HasSubstr("\n     heap "));
-    EXPECT_THAT(advice, HasSubstr("\nPools would "));
-    EXPECT_THAT(advice, HasSubstr("Allocation takes 25 % of the program's processor time"));
-    EXPECT_THAT(advice, HasSubstr("if allocation cost nothing 75 %"));
-    for (const char* name : {"fastest", "smallest", "default\n"}) {
-        EXPECT_THAT(advice, HasSubstr(name));
-    }
-
-    const std::string unknown = TraceFile("unknown", Blocks(""));
-    const std::string sweep =
-        Command(MEMPOOL " replay --sweep --seconds 1 " + unknown + " " + path);
-    EXPECT_THAT(sweep, HasSubstr("/unknown\n   Bad lines: 0\n   Events: 6001\n"));
-    EXPECT_THAT(sweep, HasSubstr("/plain\n"));
+TEST(Advise, SweepsSeveralTraces) {
+    const std::string path = TraceFile("plain", Blocks(""));
+    const std::string sweep = Command(MEMPOOL " replay --sweep --seconds 1 " + path + " " + path);
+    EXPECT_THAT(sweep, HasSubstr("/plain\n   Bad lines: 0\n   Events: 6001\n"));
+    EXPECT_NE(sweep.find("Events", sweep.find("fastest")), std::string::npos);
     EXPECT_THAT(sweep, Not(HasSubstr("Pools would")));
     EXPECT_THAT(Command(MEMPOOL " replay --sweep --dbg x 2>&1", 1), HasSubstr("excludes"));
-    const std::string shares = Command(MEMPOOL " advise --json --seconds 1 - <" + unknown);
-    EXPECT_TRUE(json::parse(shares)["allocation_share"].is_null());
 }
 
 TEST(Advise, RefusesWhatIsNoTraceAndGoesAsFarAsABrokenOneDoes) {

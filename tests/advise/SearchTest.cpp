@@ -83,7 +83,7 @@ Advise::Findings Find(MadeMeter& meter, double seconds) {
 TEST(Search, FindsTheOptimaWithoutTryingAll) {
     MadeMeter meter;
     const Advise::Findings findings = Find(meter, 1000);
-    const Advise::Verdict verdict = Advise::Judge(findings);
+    const Advise::Verdict verdict = Advise::Judge(findings, {1000, 0, {}});
     const auto& best = findings.settings.at(*verdict.fastest);
     EXPECT_LT(Distance(best.settings, fastest), 0.5) << "Noise is as much as half a step.";
     EXPECT_EQ(Key(findings.settings.at(*verdict.smallest).settings), Key(smallest));
@@ -108,7 +108,7 @@ TEST(Search, KeepsToItsTime) {
         const Advise::Findings findings = Find(meter, seconds);
         EXPECT_LT(meter.Elapsed(), seconds + 25);
         EXPECT_GT(meter.Elapsed(), 0.9 * seconds);
-        const Advise::Verdict verdict = Advise::Judge(findings);
+        const Advise::Verdict verdict = Advise::Judge(findings, {1000, 0, {}});
         EXPECT_GE(findings.settings.at(*verdict.fastest).figures.rounds, 3U) << seconds;
         EXPECT_GE(findings.settings.at(*verdict.smallest).figures.rounds, 3U) << seconds;
     }

@@ -6,9 +6,11 @@
 #include <string>
 #include <vector>
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 using Index = std::optional<std::size_t>;
+using testing::StartsWith;
 
 namespace {
 
@@ -20,12 +22,13 @@ struct Setting {
     Replay::PoolSettings settings = {4010, 1000, 8, 4, true};
 };
 
-Advise::Verdict Judge(const std::vector<Setting>& settings) {
+Advise::Verdict Judge(const std::vector<Setting>& settings,
+                      const Advise::Program& program = {1000, 0, {}}) {
     Advise::Findings findings{{10, 1, 1000, 9}, {}, {}};
     for (const Setting& each : settings) {
         findings.settings.push_back({each.settings, {each.ns, each.spread, each.bytes, 9}});
     }
-    return Advise::Judge(findings);
+    return Advise::Judge(findings, program);
 }
 
 void Expect(const std::vector<Setting>& settings, Index best, Index advised, const char* name) {
@@ -37,7 +40,7 @@ void Expect(const std::vector<Setting>& settings, Index best, Index advised, con
 
 TEST(Verdict, NamesTheBestThatCostsNothing) {
     Expect({}, {}, {}, "none");
-    Expect({{11, 900}, {5, 800}, {4, 1001}, {6, 500}}, 3, 3, "both");
+    Expect({{11.1, 900}, {5, 800}, {4, 1011}, {6, 500}}, 3, 3, "both");
     Expect({{7, 1000}, {5, 1000}}, 1, 1, "faster");
     Expect({{10, 700}, {9.5, 800}}, 0, 0, "smaller");
     Expect({{9.1, 995}}, 0, {}, "none");
@@ -51,12 +54,14 @@ TEST(Verdict, NamesTheBestThatCostsNothing) {
     EXPECT_EQ(Judge({}).smallest, std::nullopt);
 }
 
-TEST(Verdict, NoGainIsWithinTheSpreadOfTheRuns) {
+TEST(Verdict, NeitherGainNorPriceIsWithinTheSpreadOfTheRuns) {
     Expect({{9.01, 1000}}, 0, {}, "none");
     Expect({{8.99, 1000}}, 0, 0, "faster");
     Expect({{8, 1000, 2.1}}, 0, {}, "none");
     Expect({{8, 1000, 1.9}}, 0, 0, "faster");
-    Expect({{9.5, 500}}, 0, 0, "smaller");
+    Expect({{10.9, 500}}, 0, 0, "smaller");
+    Expect({{5, 1009}}, 0, 0, "faster");
+    EXPECT_STREQ(Judge({{10.9, 500}}).Price(), "none");
 }
 
 TEST(Verdict, APriceMustBeWorthIt) {
@@ -67,6 +72,8 @@ TEST(Verdict, APriceMustBeWorthIt) {
     Expect({{5, 1500}, {4, 1500}, {9, 1050}}, {}, 1, "faster");
     Expect({{2, 1100}, {8, 990}}, 1, 1, "faster");
     Expect({{9.5, 1000}, {5, 1500}}, 0, 1, "faster");
+    EXPECT_STREQ(Judge({{5, 1500}}).Price(), "bytes");
+    EXPECT_STREQ(Judge({{14, 700}}).Price(), "time");
 }
 
 TEST(Verdict, TheFewestChangesWinAmongEquals) {
@@ -76,15 +83,61 @@ TEST(Verdict, TheFewestChangesWinAmongEquals) {
     Expect({{5, 1000, 0.3, far}, {5.4, 1000, 0.1, defaults}}, 0, 0, "faster");
 }
 
-TEST(Verdict, TheShareOfAllocationBoundsWhatAProgramCanWin) {
-    EXPECT_DOUBLE_EQ(Advise::TimeOfProgram(0.12, 0.6), 0.952);
+// The time of pools, their bytes, the share of the allocation calls: what the program gains, and
+// the first words.
+TEST(Verdict, CountsWhatTheProgramWouldNotice) {
+    const auto expect = [](const Setting& pools, std::optional<double> share, const char* name,
+                           const char* words, std::uint64_t numEvents = 1000) {
+        const Advise::Verdict verdict = Judge({pools}, {numEvents, 0, share});
+        EXPECT_STREQ(verdict.Name(), name) << words;
+        EXPECT_THAT(verdict.sentences.front(), StartsWith(words));
+        EXPECT_EQ(verdict.advised.has_value(), verdict.Name() != std::string("none"));
+    };
+    expect({5, 1000}, {}, "faster", "Pools would help: they take 0.50 of the heap's time and 1.00");
+    expect({5, 1000}, 0.02, "faster", "Pools would help: they");
+    expect({5, 1100}, 0.02, "faster", "Pools would help, at a price: they");
+    expect({5, 1100}, 0.018, "none",
+           "The program would not notice: pools would save 0.9 % of its time.");
+    expect({5, 900}, 0.018, "smaller",
+           "Pools would help: they take 0.50 of the heap's time (which the program would not");
+    expect({12, 800}, 0.018, "smaller", "Pools would help: they take 1.20");
+    expect({12, 800}, 0.2, "smaller", "Pools would help, at a price: they take 1.20");
+    expect({9.5, 800}, 0.2, "smaller", "Pools would help: they take 0.95 of the heap's time (the");
+    expect({9.5, 1000}, 0.2, "none", "Pools would not help: no settings gain more than the spread");
+    expect({5, 500}, 0.5, "none", "The program would not notice: 999 events are few.", 999);
+}
+
+TEST(Verdict, SaysWhatTheFiguresMeanForTheProgram) {
+    EXPECT_EQ(Judge({{6, 1000}}, {1000, 0, 0.12}).sentences.at(1),
+              "Allocation calls take about 12 % of the program's time: with pools the program "
+              "would take about 95 %.");
+    EXPECT_EQ(Judge({}, {1000, 500, 0.05}).sentences,
+              (std::vector<std::string>{
+                  "Pools would not help: no settings gain more than the spread of the runs and "
+                  "more than they cost.",
+                  "The first 1000 of 1500 events were judged; more --seconds take in more.",
+                  "Allocation calls take about 5.0 % of the program's time."}));
     EXPECT_EQ(Advise::ShareOf("0.125"), std::optional(0.125));
     for (const char* text : {"", "x", "-0.1", "1.1", "0.5 ", "nan"}) {
         EXPECT_EQ(Advise::ShareOf(text), std::nullopt) << text;
     }
 }
 
-TEST(Verdict, SettingsArePastedAsCode) {
+TEST(Quantile, LiesBetweenTheNearestTwo) {
+    EXPECT_EQ(Advise::Quantile({4, 1, 3, 2}, 0.5), 2.5);
+    EXPECT_EQ(Advise::Quantile({4, 1, 3, 2, 5}, 0.25), 2);
+    EXPECT_EQ(Advise::Quantile({7}, 0.75), 7);
+}
+
+TEST(Verdict, SettingsArePastedAsEnvironmentAndAsCode) {
+    std::string variables;
+    for (const auto& [name, value] : Advise::EnvironmentOf({2010, 500, 16, 8, true})) {
+        variables += name.substr(name.find("_ME")) + "=" + value + " ";
+    }
+    EXPECT_EQ(
+        variables,
+        "_MEMPOOL_ON=1 _MEMPOOL_BUCKET_SIZE=2010 _MEMPOOL_MAX_RECORD_SIZE=500 "
+        "_MEMPOOL_MIN_RECORD_SIZE=16 _MEMPOOL_DATA_ALIGNMENT=8 _MEMPOOL_KEEP_EMPTY_BUCKETS=1 ");
     std::string code;
     for (const std::string& line : Advise::CodeOf({2010, 500, 16, 8, true})) { code += line; }
     EXPECT_EQ(code,

@@ -33,15 +33,12 @@ namespace {
 
 constexpr int statusOutOfMemory = 3;
 
-// A setting that takes longer than this many times the heap's time, and than a while, is no
-// candidate.
-constexpr double mostOfHeapTime = 8;
+// Seconds that the pools may always take, and the heap.
 constexpr double leastLimit = 0.5;
-// The heap itself has no other limit than patience.
 constexpr double limitOfHeap = 3600;
 
-// A trace of few events is replayed that often that it takes about so long: the clock and the
-// caches of the processor would tell more of themselves than of it.
+// A trace of few events is replayed so often that it takes about this long: the clock and the
+// caches of the processor would show more of themselves than of it.
 constexpr double leastNanoseconds = 2e7;
 
 [[noreturn]] void BeChild(const std::function<double()>& work, int result) {
@@ -93,6 +90,11 @@ std::string ProblemOf(int status) {
 
 }  // namespace
 
+double Outcome::OrFail(const std::string& text) const {
+    if (!figure.has_value()) { throw std::runtime_error(text + ": " + problem); }
+    return *figure;
+}
+
 Outcome InChild(const std::function<double()>& work, double processorSeconds) {
     int ends[2];
     if (pipe2(ends, O_CLOEXEC) != 0) { throw std::system_error(errno, std::generic_category()); }
@@ -115,8 +117,8 @@ Outcome InChild(const std::function<double()>& work, double processorSeconds) {
     return {std::nullopt, ProblemOf(status)};
 }
 
-ForkedMeter::ForkedMeter(const Replay::Recording& replayed)
-    : recording(replayed), start(std::chrono::steady_clock::now()) {
+ForkedMeter::ForkedMeter(const Replay::Recording& replayed, double limit)
+    : recording(replayed), mostOfHeapTime(limit), start(std::chrono::steady_clock::now()) {
 #ifdef __GLIBC__
     malloc_trim(0);  // What reading the trace has left over is not for the replays to use up.
 #endif

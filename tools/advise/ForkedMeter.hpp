@@ -19,8 +19,9 @@ Outcome InChild(const std::function<double()>& work, double processorSeconds);
 
 class ForkedMeter final : public Meter {
 public:
-    // The recording must have an event, and live as long as this.
-    explicit ForkedMeter(const Replay::Recording& replayed);
+    // The recording must have an event, and live as long as this. A replay of the pools that takes
+    // more than `limit` times the time of the heap, and more than a while, is stopped.
+    explicit ForkedMeter(const Replay::Recording& replayed, double limit = 8);
 
     Outcome Time(const Side& side) override;
     Outcome Held(const Side& side) override;
@@ -30,6 +31,7 @@ private:
     Outcome Run(const Side& side, const std::function<double()>& work);
 
     const Replay::Recording& recording;
+    const double mostOfHeapTime;
     const std::chrono::steady_clock::time_point start;
     unsigned int numReplays = 1;  // In a child that measures time.
     double heapSeconds = 0;       // The longest replay of the heap so far.

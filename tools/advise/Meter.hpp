@@ -1,5 +1,5 @@
 // What a search asks for: one replay at a time, of the heap or of pools with some settings. A test
-// gives a meter with costs of its own.
+// has a meter with costs of its own.
 
 #ifndef OBR_TOOLS_ADVISE_METER_HPP
 #define OBR_TOOLS_ADVISE_METER_HPP
@@ -11,13 +11,16 @@
 
 namespace Advise {
 
-// The settings of the pools, or nothing for the heap.
+// The settings of the pools; none for the heap.
 using Side = std::optional<Replay::PoolSettings>;
 
 // The figure of a replay, or why there is none.
 struct Outcome {
     std::optional<double> figure;
     std::string problem;
+
+    // The figure. If there is none, a std::runtime_error with that text before the problem.
+    double OrFail(const std::string& text) const;
 };
 
 class Meter {
@@ -27,7 +30,7 @@ public:
     Meter& operator=(const Meter&) = delete;
     virtual ~Meter() = default;
 
-    // Processor time an event of one replay, in nanoseconds.
+    // Processor time per event of one replay, in nanoseconds.
     virtual Outcome Time(const Side& side) = 0;
 
     // Bytes held at the peak.

@@ -7,7 +7,6 @@
 #include <algorithm>
 #include <optional>
 #include <set>
-#include <stdexcept>
 #include <utility>
 #include <vector>
 
@@ -51,7 +50,7 @@ class Searcher {
 public:
     Searcher(Meter& replays, double budget, const std::function<void(std::size_t)>& progress)
         : meter(replays), seconds(budget), atStep(progress) {
-        heapBytes = OfHeap(meter.Held(std::nullopt));
+        heapBytes = meter.Held(std::nullopt).OrFail("the replay on the heap failed");
         TimeHeap();
     }
 
@@ -80,14 +79,9 @@ public:
 private:
     bool HasTime(double share) const { return meter.Elapsed() < share * seconds; }
 
-    static double OfHeap(const Outcome& outcome) {
-        if (!outcome.figure.has_value()) {
-            throw std::runtime_error("the replay on the heap failed: " + outcome.problem);
-        }
-        return *outcome.figure;
+    void TimeHeap() {
+        heapTimes.push_back(meter.Time(std::nullopt).OrFail("the replay on the heap failed"));
     }
-
-    void TimeHeap() { heapTimes.push_back(OfHeap(meter.Time(std::nullopt))); }
 
     // Tries what was not tried yet, one round each.
     void Look(const std::vector<PoolSettings>& settings) {

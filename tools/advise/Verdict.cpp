@@ -6,14 +6,21 @@
 #include <functional>
 #include <tuple>
 
+#include <fmt/format.h>
+
 #include "advise/Space.hpp"
 
 namespace Advise {
 
 namespace {
 
-// Bytes are counted, not timed, and stray by little but what the heap splits off a block.
-constexpr double smallestGain = 0.01;
+// What the bytes must differ by to count. They are not timed, and stray by little but what the heap
+// splits off a block.
+constexpr double leastBytes = 0.01;
+// What the time of the whole program must differ by to be noticed.
+constexpr double leastTime = 0.01;
+// Fewer events make no program faster or smaller.
+constexpr std::uint64_t leastEvents = 1000;
 
 using Index = std::optional<std::size_t>;
 
@@ -29,79 +36,170 @@ Index Least(const std::vector<Measured>& settings,
     return least;
 }
 
-// The one with the least cost at both, or one that is as good, within the spread of its runs, with
-// fewer changes.
-Index Simplest(const Findings& findings, const std::function<bool(const Figures&)>& passes) {
-    const auto cost = [&](const Figures& figures) {
-        return Cost(figures, findings.heap, Aim::Both);
-    };
-    const Index least =
-        Least(findings.settings, passes, [&](const Measured& each) { return cost(each.figures); });
-    if (!least.has_value()) { return least; }
-    const Figures& best = findings.settings[*least].figures;
-    const double most = (1 + best.nsSpread / best.nsPerEvent) * cost(best);
-    return Least(
-        findings.settings,
-        [&](const Figures& figures) { return passes(figures) && cost(figures) <= most; },
-        [&](const Measured& each) {
-            return std::tuple(NumDifferences(each.settings, Replay::PoolSettings()),
-                              cost(each.figures));
-        });
+std::string Percent(double share) {
+    return fmt::format("{:.{}f} %", 100 * share, share < 0.1 ? 1 : 0);
 }
 
-bool IsFaster(const Figures& figures, const Figures& heap) {
-    return figures.nsPerEvent < heap.nsPerEvent && TimesDiffer(figures, heap);
-}
-bool IsSmaller(const Figures& figures, const Figures& heap) {
-    return figures.bytesHeld < (1 - smallestGain) * heap.bytesHeld;
-}
-bool Gains(const Figures& figures, const Figures& heap) {
-    return IsFaster(figures, heap) || IsSmaller(figures, heap);
-}
+// Judges settings by what they do to one program.
+class Judging {
+public:
+    Judging(const Findings& measured, const Program& whole) : findings(measured), program(whole) {}
+
+    Verdict Judge() const {
+        const auto any = [](const Figures&) { return true; };
+        Verdict verdict;
+        verdict.fastest = Least(findings.settings, any, [](const Measured& each) {
+            return std::tuple(each.figures.nsPerEvent, each.figures.bytesHeld);
+        });
+        verdict.smallest = Least(findings.settings, any, [](const Measured& each) {
+            return std::tuple(each.figures.bytesHeld, each.figures.nsPerEvent);
+        });
+        const auto isFree = [&](const Figures& figures) {
+            return TimeEffect(figures) != Effect::Price && BytesEffect(figures) != Effect::Price;
+        };
+        const auto gains = [&](const Figures& figures) {
+            return TimeEffect(figures) == Effect::Gain || BytesEffect(figures) == Effect::Gain;
+        };
+        verdict.best = verdict.advised =
+            Simplest([&](const Figures& figures) { return isFree(figures) && gains(figures); });
+        if (!verdict.best.has_value()) {
+            verdict.best = Simplest(isFree);
+            verdict.advised = Simplest([&](const Figures& figures) {
+                return gains(figures) && Cost(figures, findings.heap, Aim::Both) < 1;
+            });
+        }
+        if (verdict.advised.has_value()) {
+            const Figures& advised = findings.settings[*verdict.advised].figures;
+            verdict.time = TimeEffect(advised);
+            verdict.bytes = BytesEffect(advised);
+        }
+        verdict.sentences = SentencesOf(verdict);
+        return verdict;
+    }
+
+private:
+    double TimeRatio(const Figures& figures) const {
+        return Cost(figures, findings.heap, Aim::Time);
+    }
+    double BytesRatio(const Figures& figures) const {
+        return Cost(figures, findings.heap, Aim::Bytes);
+    }
+
+    bool HasFewEvents() const { return program.numEvents < leastEvents; }
+
+    // By how much less time the program would take, as a share of it.
+    double Saved(const Figures& figures) const {
+        return program.allocationShare.value_or(1) * (1 - TimeRatio(figures));
+    }
+
+    // Whether the difference is more than the spread of the runs of either.
+    bool TimeDiffers(const Figures& figures) const {
+        const double spread = std::max(figures.nsSpread, findings.heap.nsSpread);
+        return std::abs(figures.nsPerEvent - findings.heap.nsPerEvent) > spread;
+    }
+
+    Effect TimeEffect(const Figures& figures) const {
+        const bool isNoticed = std::abs(Saved(figures)) >= leastTime;
+        if (HasFewEvents() || !TimeDiffers(figures) || !isNoticed) { return Effect::None; }
+        return Saved(figures) > 0 ? Effect::Gain : Effect::Price;
+    }
+
+    Effect BytesEffect(const Figures& figures) const {
+        const double saved = 1 - BytesRatio(figures);
+        if (HasFewEvents() || std::abs(saved) <= leastBytes) { return Effect::None; }
+        return saved > 0 ? Effect::Gain : Effect::Price;
+    }
+
+    // The one with the least cost at both, or one that is as good, within the spread of its runs,
+    // with fewer changes.
+    Index Simplest(const std::function<bool(const Figures&)>& passes) const {
+        const auto cost = [&](const Figures& figures) {
+            return Cost(figures, findings.heap, Aim::Both);
+        };
+        const Index least = Least(findings.settings, passes,
+                                  [&](const Measured& each) { return cost(each.figures); });
+        if (!least.has_value()) { return least; }
+        const Figures& best = findings.settings[*least].figures;
+        const double most = (1 + best.nsSpread / best.nsPerEvent) * cost(best);
+        return Least(
+            findings.settings,
+            [&](const Figures& figures) { return passes(figures) && cost(figures) <= most; },
+            [&](const Measured& each) {
+                return std::tuple(NumDifferences(each.settings, Replay::PoolSettings()),
+                                  cost(each.figures));
+            });
+    }
+
+    std::vector<std::string> SentencesOf(const Verdict& verdict) const {
+        std::vector<std::string> sentences = {
+            verdict.advised.has_value() ? Gain(verdict, Of(*verdict.advised)) : NoGain(verdict)};
+        if (program.numLeftOut != 0) {
+            sentences.push_back(
+                fmt::format("The first {} of {} events were judged; more --seconds take in more.",
+                            program.numEvents, program.numEvents + program.numLeftOut));
+        }
+        if (!program.allocationShare.has_value()) {
+            sentences.emplace_back(
+                "The trace does not say which share of the program's time its allocation calls "
+                "take.");
+        } else if (!verdict.advised.has_value()) {
+            sentences.push_back(fmt::format("Allocation calls take about {} of the program's time.",
+                                            Percent(*program.allocationShare)));
+        } else {
+            sentences.push_back(fmt::format(
+                "Allocation calls take about {} of the program's time: with pools the program "
+                "would take about {}.",
+                Percent(*program.allocationShare), Percent(1 - Saved(Of(*verdict.advised)))));
+        }
+        return sentences;
+    }
+
+    const Figures& Of(std::size_t index) const { return findings.settings[index].figures; }
+
+    std::string Gain(const Verdict& verdict, const Figures& pools) const {
+        const bool isPaid = verdict.time == Effect::Price || verdict.bytes == Effect::Price;
+        const char* const time = verdict.time != Effect::None ? ""
+                                 : TimeDiffers(pools)
+                                     ? " (which the program would not notice)"
+                                     : " (the same, within the spread of the runs)";
+        return fmt::format(
+            "Pools would help{}: they take {:.2f} of the heap's time{} and {:.2f} "
+            "of its bytes.",
+            isPaid ? ", at a price" : "", TimeRatio(pools), time, BytesRatio(pools));
+    }
+
+    std::string NoGain(const Verdict& verdict) const {
+        if (HasFewEvents()) {
+            return fmt::format("The program would not notice: {} events are few.",
+                               program.numEvents);
+        }
+        const bool isAnyFaster = verdict.fastest.has_value() && TimeDiffers(Of(*verdict.fastest)) &&
+                                 Saved(Of(*verdict.fastest)) > 0;
+        if (isAnyFaster && TimeEffect(Of(*verdict.fastest)) == Effect::None) {
+            return fmt::format("The program would not notice: pools would save {} of its time.",
+                               Percent(Saved(Of(*verdict.fastest))));
+        }
+        return "Pools would not help: no settings gain more than the spread of the runs and more "
+               "than they cost.";
+    }
+
+    const Findings& findings;
+    const Program& program;
+};
 
 }  // namespace
 
 const char* Verdict::Name() const {
-    if (isFaster) { return isSmaller ? "both" : "faster"; }
-    return isSmaller ? "smaller" : "none";
+    if (time == Effect::Gain) { return bytes == Effect::Gain ? "both" : "faster"; }
+    return bytes == Effect::Gain ? "smaller" : "none";
 }
 
-Verdict Judge(const Findings& findings) {
-    const Figures& heap = findings.heap;
-    const auto any = [](const Figures&) { return true; };
-    Verdict verdict;
-    verdict.fastest = Least(findings.settings, any, [](const Measured& each) {
-        return std::tuple(each.figures.nsPerEvent, each.figures.bytesHeld);
-    });
-    verdict.smallest = Least(findings.settings, any, [](const Measured& each) {
-        return std::tuple(each.figures.bytesHeld, each.figures.nsPerEvent);
-    });
-    const auto costsNothing = [&](const Figures& figures) {
-        return figures.nsPerEvent <= heap.nsPerEvent && figures.bytesHeld <= heap.bytesHeld;
-    };
-    verdict.best = verdict.advised = Simplest(findings, [&](const Figures& figures) {
-        return costsNothing(figures) && Gains(figures, heap);
-    });
-    if (!verdict.best.has_value()) {
-        verdict.best = Simplest(findings, costsNothing);
-        verdict.advised = Simplest(findings, [&](const Figures& figures) {
-            return Gains(figures, heap) && Cost(figures, heap, Aim::Both) < 1;
-        });
-    }
-    if (verdict.advised.has_value()) {
-        const Figures& advised = findings.settings[*verdict.advised].figures;
-        verdict.isFaster = IsFaster(advised, heap);
-        verdict.isSmaller = IsSmaller(advised, heap);
-    }
-    return verdict;
+const char* Verdict::Price() const {
+    return time == Effect::Price ? "time" : bytes == Effect::Price ? "bytes" : "none";
 }
 
-bool TimesDiffer(const Figures& a, const Figures& b) {
-    return std::abs(a.nsPerEvent - b.nsPerEvent) > std::max(a.nsSpread, b.nsSpread);
-}
-
-double TimeOfProgram(double share, double ratio) {
-    return 1 - share * (1 - ratio);
+Verdict Judge(const Findings& findings, const Program& program) {
+    return Judging(findings, program).Judge();
 }
 
 std::optional<double> ShareOf(const std::string& text) {

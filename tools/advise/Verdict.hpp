@@ -1,10 +1,11 @@
-// What follows from the figures: which settings are best at what, whether a program would gain from
-// one of them, how much, and at which price.
+// What follows from the figures: which settings are best at what, whether the program would gain
+// from one of them, at which price, and why. Whoever prints a verdict decides nothing.
 
 #ifndef OBR_TOOLS_ADVISE_VERDICT_HPP
 #define OBR_TOOLS_ADVISE_VERDICT_HPP
 
 #include <cstddef>
+#include <cstdint>
 #include <optional>
 #include <string>
 #include <utility>
@@ -14,31 +15,40 @@
 
 namespace Advise {
 
+// What the trace says about the program.
+struct Program {
+    std::uint64_t numEvents = 0;            // Replayed ones,
+    std::uint64_t numLeftOut = 0;           // and those after them, which were too many.
+    std::optional<double> allocationShare;  // Of its processor time, an estimate.
+};
+
+// What pools do to the time or the bytes of the program. A difference within the spread of the
+// runs, or one that the program would not notice, is none.
+enum class Effect : std::uint8_t { None, Gain, Price };
+
 // Indices into the settings of the findings.
 struct Verdict {
     std::optional<std::size_t> fastest;
     std::optional<std::size_t> smallest;
-    std::optional<std::size_t> best;  // Of those that are neither slower nor larger than the heap.
+    std::optional<std::size_t> best;  // Of those at no price.
 
     // What to use, if pools help: the best, if it gains anything, or else what gains more than it
     // costs.
     std::optional<std::size_t> advised;
-    bool isFaster = false;   // The advised one is, by more than the spread of the runs,
-    bool isSmaller = false;  // and by more than a hundredth.
+    Effect time = Effect::None;  // Of the advised settings.
+    Effect bytes = Effect::None;
 
-    const char* Name() const;  // "faster", "smaller", "both" or "none".
+    // The verdict in words: whether pools would help comes first, then what the figures mean for
+    // the whole program.
+    std::vector<std::string> sentences;
+
+    const char* Name() const;   // What the program gains: "faster", "smaller", "both" or "none".
+    const char* Price() const;  // What it pays: "time", "bytes" or "none".
 };
 
-Verdict Judge(const Findings& findings);
+Verdict Judge(const Findings& findings, const Program& program);
 
-// Whether the difference of their times is more than the spread of the runs of either.
-bool TimesDiffer(const Figures& a, const Figures& b);
-
-// The time of the whole program in place of 1, if its allocation calls took `share` of it and now
-// take `ratio` of what they took.
-double TimeOfProgram(double share, double ratio);
-
-// The share that a recording tells, between 0 and 1. Nothing if the text is none.
+// The share in the text, between 0 and 1; none if the text is something else.
 std::optional<double> ShareOf(const std::string& text);
 
 // The settings to paste: variables of the environment, in the order in which they are read, and

@@ -8,10 +8,12 @@
 
 #include <nlohmann/json.hpp>
 
+#include "advise/Advice.hpp"
+#include "mempool/AdviceText.hpp"
 #include "mempool/Print.hpp"
 #include "mempool/Program.hpp"
 #include "mempool/Progress.hpp"
-#include "mempool/Sweep.hpp"
+#include "mempool/Settings.hpp"
 #include "trace/StepReader.hpp"
 
 namespace Tool {
@@ -19,29 +21,31 @@ namespace Tool {
 namespace {
 
 constexpr const char* description =
-    "Tell whether a program would gain from pools, and with which settings";
+    "Find out whether a program would gain from pools, and with which settings";
 
 constexpr const char* notes =
     R"(A TRACE is what 'mempool replay' takes. It is replayed through pools with many settings, in turns
-with the heap, each time in a process of its own. See 'mempool replay --help' for what counts.
+with the heap, each time in a process of its own. 'mempool replay --help' says what counts.
 
-ns an event   The median of some replays. A time of pools is taken beside those of the heap right
+ns per event  The median of some replays. A time of pools is taken beside those of the heap right
               before and after it.
-spread        Between the lower and the upper quartile of the replays. A gain within it is none.
+spread        Between the lower and the upper quartile of the replays. A difference within it is
+              neither a gain nor a price.
 of heap       The figure divided by that of the heap.
-events        A trace of more than --seconds times 1,000,000 events, at least 4,000,000, is judged by
-              its start. The verdict says so then, and --json how many are left out.
+events        Of a trace of more than --seconds times 1,000,000 events, at least 4,000,000, only the
+              first ones are replayed. The verdict says so then, and --json how many are left out.
 best          Of the settings that are neither slower nor larger than the heap the one with the least
               time x bytes; of those as good within its spread that with the fewest changes.
 at a price    There is no such gain, but one that is greater than what it costs: time x bytes is less
               than that of the heap.
 advised       What the verdict is about, with the lines to paste: the best, if it gains anything. At
               a price it is chosen like the best, among those that gain more than they cost.
-the program   What it can win as a whole is bounded by the share of its time that its allocation
-              calls take. 'mempool record' estimates that and writes it into the trace.
+the program   'mempool record' estimates which share of its time its allocation calls take. What
+              changes less than 1 % of the program's time is neither a gain nor a price.
 
-No block is written to: what it costs to use blocks that lie elsewhere in memory is not measured. The
-pools are those of Mgr, with blocks aligned to 4 bytes; a Heap takes 4 to 8 bytes a block more.
+No block is written to: that blocks which lie closer together can be faster to use is not measured.
+The pools are those of Mgr, with blocks aligned to 4 bytes; a Heap takes 4 to 8 bytes per block more.
+docs/advisor.md describes the keys of --json.
 )";
 
 struct Options {
@@ -50,8 +54,9 @@ struct Options {
     unsigned int seconds = 30;
 };
 
-nlohmann::ordered_json IndexOrNull(const std::optional<std::size_t>& index) {
-    return index.has_value() ? nlohmann::ordered_json(*index) : nlohmann::ordered_json();
+template <typename Value>
+nlohmann::ordered_json OrNull(const std::optional<Value>& value) {
+    return value.has_value() ? nlohmann::ordered_json(*value) : nlohmann::ordered_json();
 }
 
 void AddFigures(nlohmann::ordered_json& object, const Advise::Figures& figures) {
@@ -60,12 +65,13 @@ void AddFigures(nlohmann::ordered_json& object, const Advise::Figures& figures) 
     object["bytes_held"] = static_cast<std::int64_t>(figures.bytesHeld);
 }
 
-nlohmann::ordered_json JsonOf(const Advice& advice) {
+nlohmann::ordered_json JsonOf(const Advise::Advice& advice) {
     using nlohmann::ordered_json;
+    const auto& [program, findings, verdict] = advice;
     ordered_json heap;
-    AddFigures(heap, advice.findings.heap);
+    AddFigures(heap, findings.heap);
     ordered_json settings = ordered_json::array();
-    for (const Advise::Measured& each : advice.findings.settings) {
+    for (const Advise::Measured& each : findings.settings) {
         ordered_json& row = settings.emplace_back();
         for (const auto& setting : OBR::MemPool::SettingTable::all) {
             const unsigned int value = setting.In(each.settings);
@@ -74,31 +80,33 @@ nlohmann::ordered_json JsonOf(const Advice& advice) {
         AddFigures(row, each.figures);
     }
     ordered_json environment = ordered_json::object();
-    if (advice.verdict.advised.has_value()) {
-        const Advise::Measured& advised = advice.findings.settings[*advice.verdict.advised];
+    if (verdict.advised.has_value()) {
+        const Advise::Measured& advised = findings.settings[*verdict.advised];
         for (const auto& [name, value] : Advise::EnvironmentOf(advised.settings)) {
             environment[name] = value;
         }
     }
-    ordered_json share;
-    if (advice.allocationShare.has_value()) { share = *advice.allocationShare; }
-    return {{"events", advice.numEvents},
-            {"events_left_out", advice.numLeftOut},
+    return {{"events", program.numEvents},
+            {"events_left_out", program.numLeftOut},
             {"heap", heap},
             {"settings", settings},
-            {"fastest", IndexOrNull(advice.verdict.fastest)},
-            {"smallest", IndexOrNull(advice.verdict.smallest)},
-            {"best", IndexOrNull(advice.verdict.best)},
-            {"advised", IndexOrNull(advice.verdict.advised)},
-            {"verdict", advice.verdict.Name()},
+            {"fastest", OrNull(verdict.fastest)},
+            {"smallest", OrNull(verdict.smallest)},
+            {"best", OrNull(verdict.best)},
+            {"advised", OrNull(verdict.advised)},
+            {"verdict", verdict.Name()},
+            {"price", verdict.Price()},
+            {"sentences", verdict.sentences},
             {"environment", environment},
-            {"allocation_share", share}};
+            {"allocation_share", OrNull(program.allocationShare)}};
 }
 
 int AdviseOn(const Options& options) {
     Trace::StepReader reader(options.path);
     const Progress progress(reader.Name());
-    const Advice advice = TakeAdvice(reader, options.seconds, progress);
+    const Advise::Advice advice = Advise::TakeAdvice(
+        reader, options.seconds, [&](const std::string& text) { progress.Show(text); });
+    progress.Clear();
     if (options.json) {
         std::cout << JsonOf(advice).dump(2) << '\n';
     } else {

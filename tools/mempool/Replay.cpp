@@ -4,18 +4,23 @@
 #include <cstdlib>
 #include <exception>
 #include <iostream>
+#include <limits>
 #include <memory>
 #include <new>
+#include <optional>
+#include <stdexcept>
 #include <string>
 #include <vector>
 
 #include <MemPool>
 
+#include "advise/Advice.hpp"
+#include "advise/ForkedMeter.hpp"
+#include "mempool/AdviceText.hpp"
 #include "mempool/Print.hpp"
 #include "mempool/Program.hpp"
 #include "mempool/Progress.hpp"
 #include "mempool/Settings.hpp"
-#include "mempool/Sweep.hpp"
 #include "mempool/Table.hpp"
 #include "replay/Measure.hpp"
 #include "replay/PoolSettings.hpp"
@@ -33,18 +38,20 @@ constexpr const char* notes =
     R"(A TRACE is what 'mempool record' has written, or the output of a program that ran with
 NUV_OBR_MEMPOOL_TRACE=1, plain or compressed by gzip. Of text only lines "xmpt:..." count.
 
-Settings without an option here come from the variables NUV_OBR_MEMPOOL_... as ever.
+Settings without an option come from the variables NUV_OBR_MEMPOOL_....
 
-pool          One enabled pool a traced pool.
+pool          One enabled pool for each traced pool.
 heap          operator new[] and delete[]. What a pool drops is freed on the heap too, block by
               block; at a pool's end that time is not counted. No block is written to.
 the peak      The moment with the most bytes asked for.
 bytes held    What operator new has lent at the peak, in sizes of malloc_usable_size, and the 8 bytes
               of the GNU C library's own header for each block. A replay of its own counts them,
               untimed; a timed one pays one test of a flag for it at each heap request.
-ns an event   Processor time, page faults included; the median of all rounds.
---sweep       The search of 'mempool advise', each replay in a process of its own. All settings that
-              were tried are shown, the best at time x bytes first.
+ns per event  Processor time, the median of all rounds. Each replay runs in a process of its own, as
+              a program does that starts: the first use of memory is in it.
+spread        Between the lower and the upper quartile of the rounds.
+--sweep       The search of 'mempool advise'. All settings that were tried are shown, the best at
+              time x bytes first.
 bad lines     Left out of the replay. The library's own trace does not show Mgr::Clear: after one,
               pointers allocated twice are to be expected.
 )";
@@ -64,20 +71,35 @@ void AddRow(Table& table, const char* label, double pool, double heap, int digit
                  heap > 0 ? fmt::format("{:.2f}", pool / heap) : "-");
 }
 
+double Spread(const std::vector<double>& times) {
+    return Advise::Quantile(times, 0.75) - Advise::Quantile(times, 0.25);
+}
+
 // Returns the exit status.
 int Compare(const std::string& path, const Options& options) {
     Trace::StepReader reader(path);
     const Progress progress(reader.Name());
     const Replay::Recording recording = Replay::ReadRecording(
-        reader, [&](auto position) { progress.Show("line " + std::to_string(position)); });
+        reader, [&](auto position) { progress.Show(fmt::format("line {}", position)); });
+    if (recording.steps.empty()) { throw std::runtime_error(reader.Name() + ": no event"); }
+
+    Advise::ForkedMeter meter(recording, std::numeric_limits<double>::infinity());
+    const double poolBytes = meter.Held(options.settings).OrFail(reader.Name());
+    const double heapBytes = meter.Held(std::nullopt).OrFail(reader.Name());
+    std::vector<double> pool;
+    std::vector<double> heap;
+    for (unsigned int round = 1; round <= options.rounds; ++round) {
+        progress.Show(fmt::format("round {} of {}", round, options.rounds));
+        pool.push_back(meter.Time(options.settings).OrFail(reader.Name()));
+        heap.push_back(meter.Time(std::nullopt).OrFail(reader.Name()));
+    }
     progress.Clear();
 
     std::cout << reader.Name() << '\n';
     PrintBadLines(std::cout, reader.Name(), reader.Bad());
-    const auto held = Replay::BytesHeld(recording, [&] {
-        if (options.dbg) { OBR::MemPool::Dbg(); }
-    });
-
+    if (options.dbg) {
+        Replay::BytesHeldByPools(recording, [] { OBR::MemPool::Dbg(); });
+    }
     Table table({{"", 0, Align::Left}, {"pool", 10}, {"heap", 10}, {"pool/heap", 10}});
     const auto addSame = [&](const char* label, std::uint64_t value) {
         table.AddRow(label, value, value);
@@ -88,15 +110,10 @@ int Compare(const std::string& path, const Options& options) {
     addSame("bytes at the peak", recording.peakBytes);
     addSame("blocks cleared", recording.numCleared);
     addSame("blocks never freed", recording.numNeverFreed);
-    AddRow(table, "bytes held at the peak", static_cast<double>(held.pool),
-           static_cast<double>(held.heap), 0);
-    if (!recording.steps.empty()) {
-        const auto times = Replay::NanosecondsPerEvent(recording, options.rounds, [&](auto round) {
-            progress.Show(fmt::format("round {} of {}", round, options.rounds));
-        });
-        progress.Clear();
-        AddRow(table, "ns an event", times.pool, times.heap, 1);
-    }
+    AddRow(table, "bytes held at the peak", poolBytes, heapBytes, 0);
+    AddRow(table, "ns per event", Advise::Quantile(pool, 0.5), Advise::Quantile(heap, 0.5), 1);
+    table.AddRow("spread", fmt::format("{:.1f}", Spread(pool)),
+                 fmt::format("{:.1f}", Spread(heap)));
     table.Write(std::cout);
     std::cout << std::flush;
     return WarnOfBrokenTrace(reader);
@@ -106,7 +123,9 @@ int Compare(const std::string& path, const Options& options) {
 int Sweep(const std::string& path, const Options& options) {
     Trace::StepReader reader(path);
     const Progress progress(reader.Name());
-    const Advice advice = TakeAdvice(reader, options.seconds, progress);
+    const Advise::Advice advice = Advise::TakeAdvice(
+        reader, options.seconds, [&](const std::string& text) { progress.Show(text); });
+    progress.Clear();
     std::cout << reader.Name() << '\n';
     PrintBadLines(std::cout, reader.Name(), reader.Bad());
     PrintTable(std::cout, advice, true);

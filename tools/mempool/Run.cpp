@@ -14,13 +14,15 @@
 #include <string>
 #include <system_error>
 
+#include "advise/Advice.hpp"
+#include "mempool/AdviceText.hpp"
 #include "mempool/Command.hpp"
 #include "mempool/Print.hpp"
 #include "mempool/Program.hpp"
 #include "mempool/Progress.hpp"
 #include "mempool/Record.hpp"
 #include "mempool/ReportText.hpp"
-#include "mempool/Sweep.hpp"
+#include "mempool/Settings.hpp"
 #include "report/Analysis.hpp"
 #include "report/Page.hpp"
 #include "trace/OpenTrace.hpp"
@@ -115,8 +117,11 @@ void ReportOn(const NamelessFile& trace, const Options& options) {
 
 void AdviseOn(const NamelessFile& trace, const Options& options) {
     Trace::StepReader reader = Open(trace, options);
-    const Advice advice = TakeAdvice(reader, options.seconds, Progress("mempool"),
-                                     options.order.pools ? Pools::AsTraced : Pools::One);
+    const Progress progress("mempool");
+    const Advise::Advice advice = Advise::TakeAdvice(
+        reader, options.seconds, [&](const std::string& text) { progress.Show(text); },
+        options.order.pools ? Advise::Pools::AsTraced : Advise::Pools::One);
+    progress.Clear();
     std::cerr << '\n';
     PrintTable(std::cerr, advice, false);
     std::cerr << '\n';

@@ -21,6 +21,13 @@ void AddSettings(CLI::App& subcommand, OBR::MemPool::PoolSettings& settings) {
     }
 }
 
+void AddSeconds(CLI::App& subcommand, unsigned int& seconds) {
+    subcommand.add_option("--seconds", seconds, "How long to search, about")
+        ->type_name("N")
+        ->check(CLI::Range(1, 100000))
+        ->capture_default_str();
+}
+
 void CheckSettings(const OBR::MemPool::PoolSettings& settings) {
     const std::string problem = OBR::MemPool::PoolSizes(settings).Problem();
     if (!problem.empty()) { throw std::runtime_error("these settings make no pool: " + problem); }

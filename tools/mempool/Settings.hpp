@@ -1,4 +1,4 @@
-// The settings of the pools as options of a subcommand.
+// The settings of the pools, and of a search for them, as options of a subcommand.
 
 #ifndef OBR_TOOLS_MEMPOOL_SETTINGS_HPP
 #define OBR_TOOLS_MEMPOOL_SETTINGS_HPP
@@ -10,6 +10,9 @@ namespace Tool {
 
 // Adds an option for each setting, which stores it in `settings`. The others keep their values.
 void AddSettings(CLI::App& subcommand, OBR::MemPool::PoolSettings& settings);
+
+// Adds --seconds, the length of a search.
+void AddSeconds(CLI::App& subcommand, unsigned int& seconds);
 
 // Throws std::runtime_error if no pool can be built with these settings.
 void CheckSettings(const OBR::MemPool::PoolSettings& settings);

@@ -2,10 +2,6 @@
 
 #include "replay/Measure.hpp"
 
-#include <algorithm>
-#include <cstddef>
-#include <utility>
-
 #include "replay/Clock.hpp"
 #include "replay/HeapCount.hpp"
 #include "replay/Sides.hpp"
@@ -35,14 +31,8 @@ double TimePerEvent(const Recording& recording) {
 
 }  // namespace
 
-double Median(std::vector<double> values) {
-    const auto middle = values.begin() + static_cast<std::ptrdiff_t>(values.size() / 2);
-    std::nth_element(values.begin(), middle, values.end());
-    return *middle;
-}
-
-std::int64_t BytesHeldByPools(const Recording& recording) {
-    return HeldAtPeak<PoolSide>(recording, [] {});
+std::int64_t BytesHeldByPools(const Recording& recording, const std::function<void()>& atPeak) {
+    return HeldAtPeak<PoolSide>(recording, atPeak);
 }
 
 std::int64_t BytesHeldByHeap(const Recording& recording) {
@@ -55,25 +45,6 @@ double PoolNanosecondsPerEvent(const Recording& recording) {
 
 double HeapNanosecondsPerEvent(const Recording& recording) {
     return TimePerEvent<HeapSide>(recording);
-}
-
-Compared<std::int64_t> BytesHeld(const Recording& recording,
-                                 const std::function<void()>& atPoolPeak) {
-    const std::int64_t pool = HeldAtPeak<PoolSide>(recording, atPoolPeak);
-    return {pool, BytesHeldByHeap(recording)};
-}
-
-Compared<double> NanosecondsPerEvent(const Recording& recording, unsigned int rounds,
-                                     const std::function<void(unsigned int round)>& atRound) {
-    std::vector<double> pool;
-    std::vector<double> heap;
-    for (unsigned int round = 1; round <= rounds; ++round) {
-        atRound(round);
-        if (round % 2 == 0) { heap.push_back(HeapNanosecondsPerEvent(recording)); }
-        pool.push_back(PoolNanosecondsPerEvent(recording));
-        if (round % 2 != 0) { heap.push_back(HeapNanosecondsPerEvent(recording)); }
-    }
-    return {Median(std::move(pool)), Median(std::move(heap))};
 }
 
 }  // namespace Replay

@@ -3,6 +3,7 @@
 #include "replay/Recording.hpp"
 
 #include <algorithm>
+#include <future>
 #include <tuple>
 #include <utility>
 
@@ -88,13 +89,18 @@ Recording ReadRecording(Trace::StepReader& reader,
                         const std::function<void(std::uint64_t position)>& atEvent,
                         std::size_t maxSteps) {
     constexpr std::uint64_t interval = 100000;
-    Recorder recorder(maxSteps);
-    Trace::Step step = {};
-    for (std::uint64_t number = 1; reader.Next(step); ++number) {
-        recorder.Add(step, reader.Blocks());
-        if (number % interval == 0) { atEvent(reader.Position()); }
-    }
-    return recorder.Finish(reader.Blocks());
+    const auto read = [&] {
+        Recorder recorder(maxSteps);
+        Trace::Step step = {};
+        for (std::uint64_t number = 1; reader.Next(step); ++number) {
+            recorder.Add(step, reader.Blocks());
+            if (number % interval == 0) { atEvent(reader.Position()); }
+        }
+        return recorder.Finish(reader.Blocks());
+    };
+    // In a thread of its own, which has an arena of its own in the C library: the heap of the
+    // calling thread, which a replay uses, stays as fresh as that of a program that starts.
+    return std::async(std::launch::async, read).get();
 }
 
 void MergePools(Recording& recording) {

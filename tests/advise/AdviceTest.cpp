@@ -1,0 +1,57 @@
+// An advice from the trace to the text.
+
+#include <sstream>
+#include <string>
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <MemPool>
+
+#include "TraceLines.hpp"
+#include "mempool/AdviceText.hpp"
+
+using testing::HasSubstr;
+using testing::Not;
+
+namespace {
+
+// The heap takes 10 ns and 1000 bytes, pools 5 ns and as many bytes as given.
+Advise::Advice Advice(double bytes) {
+    Advise::Advice advice;
+    advice.program = {1000, 500, {}};
+    advice.findings = {{10, 0.1, 1000, 9}, {{{506, 128, 8, 16, true}, {5, 0.1, bytes, 9}}}, {}};
+    advice.verdict = Advise::Judge(advice.findings, advice.program);
+    return advice;
+}
+
+std::string Verdict(const Advise::Advice& advice) {
+    std::ostringstream text;
+    Tool::PrintVerdict(text, advice);
+    return text.str();
+}
+
+TEST(Advice, IsForOnePoolOrForThoseOfTheTrace) {
+    const auto bytes = [](Advise::Pools pools) {
+        Trace::StepReader reader(ReadLines(Lines("@c:P\n@a:P:X:24\n@c:Q\n@a:Q:Y:24\n")), "trace");
+        const Advise::Advice advice = Advise::TakeAdvice(
+            reader, 0.1, [](auto&) {}, pools);
+        return advice.findings.settings.at(0).figures.bytesHeld;
+    };
+    EXPECT_NEAR(bytes(Advise::Pools::AsTraced), 2 * bytes(Advise::Pools::One), 300);
+}
+
+TEST(Advice, IsPrintedWithLinesToPasteIfPoolsHelp) {
+    const std::string text = Verdict(Advice(900));
+    EXPECT_THAT(text, HasSubstr("Pools would help: "));
+    EXPECT_THAT(text, HasSubstr("\n    export NUV_OBR_MEMPOOL_BUCKET_SIZE=506\n"));
+    EXPECT_THAT(text, HasSubstr("\n        .BucketSize(506)\n"));
+    EXPECT_THAT(Verdict(Advice(2500)), Not(HasSubstr("BUCKET")));
+
+    std::ostringstream table;
+    Tool::PrintTable(table, Advice(900), false);
+    EXPECT_THAT(table.str(), HasSubstr("   Events: 1000, the first of 1500\n"));
+    EXPECT_THAT(table.str(), HasSubstr("kept         5.0     0.1  0.50    900  0.90  fastest, "
+                                       "smallest, best, advised\n"));
+}
+
+}  // namespace

@@ -1,0 +1,37 @@
+#include "advise/Advice.hpp"
+
+#include <cstddef>
+#include <stdexcept>
+
+#include <fmt/format.h>
+
+#include "advise/ForkedMeter.hpp"
+#include "advise/Search.hpp"
+#include "replay/Recording.hpp"
+
+namespace Advise {
+
+Advice TakeAdvice(Trace::StepReader& reader, double seconds,
+                  const std::function<void(const std::string&)>& show, Pools pools) {
+    Replay::Recording recording = Replay::ReadRecording(
+        reader, [&](auto position) { show(fmt::format("event {}", position)); }, MaxSteps(seconds));
+    if (recording.peakBlocks == 0) {
+        throw std::runtime_error(reader.Name() + ": no block was allocated");
+    }
+    if (pools == Pools::One) { Replay::MergePools(recording); }
+
+    Advice advice;
+    advice.program.numEvents = recording.steps.size();
+    advice.program.numLeftOut = recording.numLeftOut;
+    const auto share = reader.Facts().find("allocation_share");
+    if (share != reader.Facts().end()) { advice.program.allocationShare = ShareOf(share->second); }
+    ForkedMeter meter(recording);
+    advice.findings = Search(meter, seconds, [&](std::size_t numTried) {
+        show(fmt::format("{} settings tried, {:.0f} s of about {}", numTried, meter.Elapsed(),
+                         seconds));
+    });
+    advice.verdict = Judge(advice.findings, advice.program);
+    return advice;
+}
+
+}  // namespace Advise

@@ -1,0 +1,127 @@
+#include "mempool/AdviceText.hpp"
+
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
+#include <map>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include <fmt/ostream.h>
+
+#include "advise/Space.hpp"
+#include "mempool/Table.hpp"
+
+namespace Tool {
+
+namespace {
+
+using Advise::Advice;
+using Advise::Aim;
+using Advise::Figures;
+using Advise::Measured;
+
+// How many of the best the short table has, beside those that are named.
+constexpr std::size_t numShown = 8;
+
+std::string NamesOf(const Advice& advice, std::size_t index) {
+    const Advise::Verdict& verdict = advice.verdict;
+    std::string names;
+    if (verdict.fastest == index) { names += ", fastest"; }
+    if (verdict.smallest == index) { names += ", smallest"; }
+    if (verdict.best == index) { names += ", best"; }
+    if (verdict.advised == index) { names += ", advised"; }
+    if (Advise::NumDifferences(advice.findings.settings[index].settings, Replay::PoolSettings()) ==
+        0) {
+        names += ", default";
+    }
+    return names.empty() ? "" : names.substr(2);
+}
+
+void AddRow(Table& table, const Advice& advice, std::vector<std::string> cells,
+            const Figures& figures, const std::string& names) {
+    cells.push_back(fmt::format("{:.1f}", figures.nsPerEvent));
+    cells.push_back(figures.rounds > 1 ? fmt::format("{:.1f}", figures.nsSpread) : "-");
+    cells.push_back(fmt::format("{:.2f}", Cost(figures, advice.findings.heap, Aim::Time)));
+    cells.push_back(fmt::format("{:.0f}", figures.bytesHeld));
+    cells.push_back(fmt::format("{:.2f}", Cost(figures, advice.findings.heap, Aim::Bytes)));
+    cells.push_back(names);
+    table.AddCells(std::move(cells));
+}
+
+void AddRow(Table& table, const Advice& advice, std::size_t index) {
+    const auto& [settings, figures] = advice.findings.settings[index];
+    AddRow(table, advice,
+           {std::to_string(settings.bucketSize), std::to_string(settings.maxRecordSize),
+            std::to_string(settings.minRecordSize), std::to_string(settings.dataAlignment),
+            settings.keepEmptyBuckets ? "kept" : "released"},
+           figures, NamesOf(advice, index));
+}
+
+void PrintGivenUp(std::ostream& out, const Advice& advice) {
+    std::map<std::string, unsigned int> problems;
+    for (const auto& each : advice.findings.givenUp) { ++problems[each.problem]; }
+    for (const auto& [problem, number] : problems) {
+        fmt::print(out, "   {} {} given up: {}\n", number,
+                   number == 1 ? "setting was" : "settings were", problem);
+    }
+}
+
+}  // namespace
+
+void PrintTable(std::ostream& out, const Advice& advice, bool all) {
+    const std::vector<Measured>& settings = advice.findings.settings;
+    std::vector<std::size_t> order(settings.size());
+    for (std::size_t i = 0; i < order.size(); ++i) { order[i] = i; }
+    std::stable_sort(order.begin(), order.end(), [&](std::size_t a, std::size_t b) {
+        const auto cost = [&](std::size_t i) {
+            return Cost(settings[i].figures, advice.findings.heap, Aim::Both);
+        };
+        return cost(a) < cost(b);
+    });
+
+    const auto& [numEvents, numLeftOut, share] = advice.program;
+    fmt::print(out, "   Events: {}", numEvents);
+    if (numLeftOut != 0) { fmt::print(out, ", the first of {}", numEvents + numLeftOut); }
+    out << '\n';
+    Table table({{"bucket\nsize"},
+                 {"max\nrecord"},
+                 {"min\nrecord"},
+                 {"align-\nment"},
+                 {"empty\nbuckets", 0, Align::Left},
+                 {"ns per\nevent"},
+                 {"spread"},
+                 {"of\nheap"},
+                 {"bytes\nheld"},
+                 {"of\nheap"},
+                 {"", 0, Align::Left}});
+    AddRow(table, advice, {"heap", "", "", "", ""}, advice.findings.heap, "");
+    std::size_t numHidden = 0;
+    for (std::size_t place = 0; place < order.size(); ++place) {
+        if (all || place < numShown || !NamesOf(advice, order[place]).empty()) {
+            AddRow(table, advice, order[place]);
+        } else {
+            ++numHidden;
+        }
+    }
+    table.Write(out);
+    if (numHidden != 0) { fmt::print(out, "   and {} more settings that were tried\n", numHidden); }
+    PrintGivenUp(out, advice);
+}
+
+void PrintVerdict(std::ostream& out, const Advice& advice) {
+    for (const std::string& sentence : advice.verdict.sentences) { out << sentence << '\n'; }
+    if (!advice.verdict.advised.has_value()) { return; }
+    const Measured& advised = advice.findings.settings[*advice.verdict.advised];
+    out << '\n';
+    for (const auto& [name, value] : Advise::EnvironmentOf(advised.settings)) {
+        fmt::print(out, "    export {}={}\n", name, value);
+    }
+    out << "\nor, in code:\n\n";
+    for (const std::string& line : Advise::CodeOf(advised.settings)) {
+        fmt::print(out, "    {}\n", line);
+    }
+}
+
+}  // namespace Tool
