@@ -105,9 +105,10 @@ private:
     }
 
     Effect BytesEffect(const Figures& figures) const {
-        const double saved = 1 - BytesRatio(figures);
-        if (HasFewEvents() || std::abs(saved) <= leastBytes) { return Effect::None; }
-        return saved > 0 ? Effect::Gain : Effect::Price;
+        const double ratio = BytesRatio(figures);
+        if (HasFewEvents()) { return Effect::None; }
+        if (ratio < 1 - leastBytes) { return Effect::Gain; }
+        return ratio > 1 + leastBytes ? Effect::Price : Effect::None;
     }
 
     // The one with the least cost at both, or one that is as good, within the spread of its runs,
