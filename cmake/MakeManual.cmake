@@ -1,11 +1,11 @@
-# Makes the manual page PAGE, compressed, of SOURCE, README and the help of PROGRAM, if any. Takes
-# PANDOC, GZIP and VERSION too.
+# Builds the compressed manual PAGE from SOURCE, from pages of the project, whose folder is SOURCES, and
+# from the help of PROGRAM, if any. Also takes PANDOC, GZIP and VERSION.
 cmake_minimum_required(VERSION 3.25)
 
 cmake_path(REMOVE_EXTENSION PAGE LAST_ONLY OUTPUT_VARIABLE page)
 cmake_path(GET page PARENT_PATH folder)
 file(MAKE_DIRECTORY ${folder})
-set(ENV{README} ${README})
+set(ENV{SOURCES} ${SOURCES})
 set(ENV{PROGRAM} ${PROGRAM})
 execute_process(
     COMMAND ${PANDOC} --standalone --from markdown-smart --to man --metadata hyphenate=false

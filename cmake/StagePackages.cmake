@@ -1,8 +1,7 @@
-# Run by cpack when each component of Packages.cmake lies in a folder of its own, before these become
-# packages. Adds what Debian wants in every package: its changelog, made of the newest part of
-# CHANGELOG.md; its copyright file, made of what README.md says; and what is known of lintian's
-# findings. Takes from binaries what nobody needs. All files get the time of the sources, which
-# SOURCE_DATE_EPOCH tells, so that packages that are made twice are the same.
+# cpack runs this when each component of Packages.cmake lies in a folder of its own, before it packs them.
+# It adds what Debian wants in every package: a changelog, from the newest part of CHANGELOG.md; a
+# copyright file, from the licence in README.md; and the known findings of lintian. It strips binaries.
+# All files get the time of the sources, SOURCE_DATE_EPOCH, so that packages are reproducible.
 
 cmake_minimum_required(VERSION 3.25)
 
@@ -18,7 +17,7 @@ endfunction()
 
 file(STRINGS ${sources}/README.md licence REGEX "licence has been granted")
 if(NOT licence)
-    message(FATAL_ERROR "README.md tells nothing of a licence.")
+    message(FATAL_ERROR "README.md has no line about the licence.")
 endif()
 set(time "")
 if(DEFINED ENV{SOURCE_DATE_EPOCH})
@@ -31,12 +30,8 @@ execute_process(COMMAND awk -v version=${CPACK_PACKAGE_VERSION}-${CPACK_DEBIAN_P
         -f ${CMAKE_CURRENT_LIST_DIR}/changelog.awk ${sources}/CHANGELOG.md
     OUTPUT_VARIABLE changelog COMMAND_ERROR_IS_FATAL ANY)
 
-# What of others is compiled into a component, each told by the Debian package that it comes from.
+# Debian packages with code that is compiled into a component.
 set(others_tools libcli11-dev libfmt-dev nlohmann-json3-dev libjs-d3)
-
-# What there is to read.
-set(texts_dev README.md docs/moving.md)
-set(texts_tools docs/report.md)
 
 foreach(component IN LISTS CPACK_COMPONENTS_ALL)
     string(TOUPPER ${component} upper)
@@ -50,20 +45,23 @@ foreach(component IN LISTS CPACK_COMPONENTS_ALL)
         set(notice /usr/share/doc/${other}/copyright)
         if(EXISTS ${notice})
             file(READ ${notice} notice)
-            file(APPEND ${doc}/copyright "\nIt has code of ${other} in it, which says:\n\n${notice}")
+            file(APPEND ${doc}/copyright "\nIt contains code of ${other}, under this licence:\n\n${notice}")
         endif()
     endforeach()
     file(WRITE ${doc}/changelog.Debian "${changelog}")
     run(gzip -9nf ${doc}/changelog.Debian)
-    foreach(text IN LISTS texts_${component})
-        file(COPY ${sources}/${text} DESTINATION ${doc})
-    endforeach()
+    if(NOT component STREQUAL "runtime")  # A page links to others, so each package has all of them.
+        file(COPY ${sources}/README.md ${sources}/CHANGELOG.md DESTINATION ${doc})
+        file(COPY ${sources}/docs DESTINATION ${doc} FILES_MATCHING
+            PATTERN *.md PATTERN *.svg PATTERN *.png
+            PATTERN man EXCLUDE PATTERN reference.md EXCLUDE)
+    endif()
     set(overrides ${CMAKE_CURRENT_LIST_DIR}/lintian/${package})
     if(EXISTS ${overrides})
         file(COPY ${overrides} DESTINATION ${root}/usr/share/lintian/overrides)
     endif()
 
-    # gdb's commands read the library's symbol table, which is therefore kept.
+    # The library keeps its symbol table, which gdb's commands read.
     file(GLOB_RECURSE files LIST_DIRECTORIES false ${root}/*)
     foreach(file IN LISTS files)
         if(IS_SYMLINK ${file})

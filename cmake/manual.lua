@@ -1,25 +1,26 @@
--- Makes a manual of a text for pandoc, and of what is told elsewhere already:
+-- Builds a manual from a text for pandoc. Comments in it stand for text from elsewhere:
 --
---   <!-- README: HEADING -->   what README.md, which the variable README names, has under that heading
---   <!-- HELP -->              what the program that the variable PROGRAM names says of each of its
---                              subcommands, in the form that CLI11 gives it
+--   <!-- FILE -->            the page FILE of the project, without its title
+--   <!-- FILE: HEADING -->   the part of that page below HEADING, a heading of the second level
+--   <!-- HELP -->            the help of each subcommand of a program, in CLI11's form
 --
--- A manual page shows neither the target of a link nor wide tables well: a link is its text, and a
--- table of up to four columns is a list of its rows.
+-- The variables SOURCES and PROGRAM name the project's folder and the program. A manual cannot show the
+-- target of a link or a wide table, so a link becomes its text, and a table of up to four columns a list.
 
-local function readme_part(heading)
-    local file = assert(io.open(os.getenv("README")))
-    local readme = pandoc.read(file:read("a"), "markdown-smart")
+local function page_part(name, heading)
+    local file = assert(io.open(os.getenv("SOURCES") .. "/" .. name))
+    local page = pandoc.read(file:read("a"), "markdown-smart")
     file:close()
-    local part, inside = pandoc.List(), false
-    for _, block in ipairs(readme.blocks) do
-        if block.t == "Header" and block.level <= 2 then
+    local part, inside = pandoc.List(), heading == nil
+    for _, block in ipairs(page.blocks) do
+        local level = block.t == "Header" and block.level or 3
+        if level == 2 and heading then
             inside = pandoc.utils.stringify(block) == heading
-        elseif inside then
+        elseif inside and level > 1 then
             part:insert(block)
         end
     end
-    assert(#part > 0, "README.md has nothing under: " .. heading)
+    assert(#part > 0, name .. " has nothing below: " .. (heading or "its title"))
     return part
 end
 
@@ -44,8 +45,8 @@ local function table_as_list(tbl)
     end))
 end
 
--- Entries of a help, "  NAME   TEXT" with TEXT also on the lines behind, as a list. Names of options
--- and arguments stand two blanks in, the words that a footer explains none.
+-- The entries of a help as a list. An entry is "NAME   TEXT", and TEXT may continue on the next lines.
+-- `indent` is what precedes NAME: two blanks for options and arguments, none for words in a footer.
 local function entries(lines, indent)
     local items, text = pandoc.List(), nil
     for _, line in ipairs(lines) do
@@ -64,7 +65,7 @@ local function entries(lines, indent)
     end))
 end
 
--- Paragraphs of lines between empty ones.
+-- The paragraphs of a help, each a list of its lines.
 local function paragraphs(help)
     local all, lines = pandoc.List(), pandoc.List()
     for line in (help .. "\n\n"):gmatch("(.-)\n") do
@@ -105,14 +106,15 @@ local function all_help()
     for name in list:gmatch("  (%l[%l-]*) +%u[^\n]*") do
         blocks:extend(help_of(program, name))
     end
-    assert(#blocks > 0, program .. " tells no subcommand")
+    assert(#blocks > 0, program .. " lists no subcommand")
     return blocks
 end
 
 local function include(block)
-    local heading = block.text:match("^<!%-%- README: (.*) %-%->$")
     if block.text == "<!-- HELP -->" then return all_help() end
-    return heading and readme_part(heading)
+    local name, heading = block.text:match("^<!%-%- (%S+%.md):? ?(.-) ?%-%->$")
+    if not name then return nil end
+    return page_part(name, heading ~= "" and heading or nil)
 end
 
 return {

@@ -93,12 +93,12 @@ TEST_F(WordPools, CountsWordsAndTellsWhatItCannotRead) {
     EXPECT_EQ(text, Content(path));
 }
 
-// The README shows the report of a text that every Debian has.
+// docs/reading-reports.md shows the report of a text that every Debian has.
 TEST_F(WordPools, ReportsAsMuchAsItIsAskedFor) {
     const std::string command = "WordPools /usr/share/common-licenses/BSD ";
-    const std::string readme = Content(SOURCES "/README.md");
-    const std::size_t start = readme.find("\nMemPool::Mgr ");
-    const std::string sample = readme.substr(start, readme.find("```", start) - start);
+    const std::string page = Content(SOURCES "/docs/reading-reports.md");
+    const std::size_t start = page.find("\nMemPool::Mgr ");
+    const std::string sample = page.substr(start, page.find("```", start) - start);
     EXPECT_THAT(Masked(Run(command + "--report")), HasSubstr(Masked(sample)));
     EXPECT_NE(Run(command + "--detailed").find("ALL RECORDS (501)"), std::string::npos);
 }
