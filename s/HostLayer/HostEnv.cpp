@@ -1,4 +1,4 @@
-// Stands in for the host's own layer, over the standard environment.
+// Used if the host has no layer of its own: reads the standard environment.
 
 #include "HostLayer/HostEnv.hpp"
 

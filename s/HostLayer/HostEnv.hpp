@@ -1,10 +1,10 @@
-// The one place that reads an environment variable. A host whose own layer provides this class
-// links it instead of HostEnv.cpp.
+// The one place that reads environment variables. A host whose own layer provides this class links
+// that layer instead of HostEnv.cpp.
 
 #ifndef OBR_HOSTLAYER_HOSTENV_HPP
 #define OBR_HOSTLAYER_HOSTENV_HPP
 
-// Visible, since it may come out of another library.
+// Visible, since another library may define it.
 class __attribute__((visibility("default"))) Host_Env {
 public:
     // The value of the variable, which may be empty, or null if it is not set.

@@ -1,5 +1,4 @@
-// The two ends of a bucket, the steps that the heap has a part in: it is made, with a header
-// written for each of its records, and it is destroyed.
+// How a bucket is made, with a header written for each of its records, and how it is destroyed.
 
 #include "MemPool/Bucket.hpp"
 

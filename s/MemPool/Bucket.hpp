@@ -1,5 +1,5 @@
 // One bucket: a heap block of a header and equal records, with a free list of offsets. Record.hpp
-// draws it. A Group (Group.hpp) decides when buckets come and go and links them into its lists.
+// draws it. A Group (Group.hpp) makes and releases buckets and links them into its lists.
 //
 // Words: a bucket is empty when no record is in use, and full when none is free.
 
@@ -20,14 +20,14 @@ namespace OBR::MemPool {
 
 class Group;
 
-// How many there are of each data size.
+// How many blocks there are of each data size.
 using SizeCounts = std::map<std::uint32_t, std::uint32_t>;
 
 // Invariants: used + numFree == TotalRecs(), size == 2 + TotalRecs() * recSize, and the free list
 // that starts at freeHead has numFree records.
 class Bucket {
 public:
-    // In the order of memory. The reports read them as they are.
+    // In the order of memory. Reports and gdb read them as they are.
     Group* parent;           // The group that owns the bucket; null once it is destroyed.
     Bucket* next1;           // Next in the group's list of all buckets, null at the end.
     Bucket* prev1;           // Previous one, null at the front.
@@ -51,12 +51,12 @@ public:
     // order of their addresses, on no list. `bucketSize` must leave room for one record.
     static Bucket* Create(Group* parent, std::uint32_t bucketSize, std::uint32_t recDataSize);
 
-    // Ends a bucket and releases its memory. Its header then says that it is none, as long as the
-    // heap leaves those bytes alone.
+    // Releases a bucket's memory. Its header no longer describes a bucket then, as long as the heap
+    // leaves those bytes alone.
     static void Destroy(Bucket* bucket);
 
-    // The number of records. It is stored nowhere. 0 for a header so damaged that it has room for
-    // none.
+    // The number of records, which is stored nowhere; 0 if the header is so damaged that there is
+    // room for none.
     std::int32_t TotalRecs() const {
         if (recSize == 0 || size < firstOffset) { return 0; }
         return (std::int32_t{size} - std::int32_t{firstOffset}) / std::int32_t{recSize};
@@ -85,14 +85,14 @@ public:
         const std::uint32_t hdr = record->Word();
         record->SetWord(RecHdr::Marked(hdr, typeUsed, offset));
         SetFreeState(((state - oneFree) & numFreeMask) | RecHdr::LinkOf(hdr));
-        __builtin_prefetch(RecordAt(RecHdr::LinkOf(hdr)));  // The next to be taken may be cold.
+        __builtin_prefetch(RecordAt(RecHdr::LinkOf(hdr)));  // The next one may be cold.
         return record->Data();
     }
 
-    // For a bucket that will be the next to give a record, and may not have been touched for long.
+    // For a bucket that will give the next record and may not have been touched for long.
     void PrefetchFirstFree() const { __builtin_prefetch(RecordAt(freeHead)); }
 
-    // Puts the used record of these data in front of the free list.
+    // Puts the used record with these data in front of the free list.
     void ReturnRecord(void* data) {
         const std::uint32_t state = FreeState();
         RecHdr* const record = RecHdr::Of(data);
@@ -101,15 +101,14 @@ public:
         SetFreeState(((state + oneFree) & numFreeMask) | RecHdr::LinkOf(hdr));
     }
 
-    // The bucket that the link of a used record leads to. Of a foreign pointer's bytes it is any
-    // address.
+    // The bucket that the link of a used record leads to. For a foreign pointer it is any address.
     static Bucket* Holding(void* data, std::uint16_t offset) {
         return reinterpret_cast<Bucket*>(static_cast<char*>(data) - sizeof(RecHdr) - offset -
                                          baseDistance);
     }
 
-    // The owner that the bytes of this header name, or null if they are no bucket's. They may be
-    // anybody's.
+    // The owner that this header names, or null if it is not a bucket's: after a foreign pointer
+    // was followed, these may be any bytes.
     OBR_READS_FOREIGN const Group* Owner() const {
         const Group* group;
         std::memcpy(&group, &parent, sizeof group);
@@ -119,8 +118,8 @@ public:
         return extent == 0 ? nullptr : group;
     }
 
-    // Reports, all read-only and exact to the character; s/diagnostics/reports holds them. `level`
-    // indents by three blanks each. Number counts buckets from 1.
+    // Reports, all read-only and exact to the character, defined in s/diagnostics/reports. Each
+    // `level` indents by three blanks. `number` counts buckets from 1.
     void DbgBucket(std::ostream& stream, std::uint32_t number, std::uint32_t level,
                    bool showRecords, bool showFreeList) const;
     void DbgAllRecords(std::ostream& stream, std::uint32_t level) const;
@@ -131,7 +130,7 @@ public:
     // Adds each used record to the count of its data size.
     void AddUsedRecords(SizeCounts& counts) const;
 
-    // The lines of the record map, `n` boxes each from the record at index `first` on.
+    // The lines of the record map, of `n` boxes each, from the record at index `first` on.
     using Records = OBR::vector<const RecHdr*>;
     void DbgMapRule(std::ostream& stream, std::uint16_t n) const;
     void DbgMapKinds(std::ostream& stream, std::uint16_t n, std::uint16_t first,
@@ -146,8 +145,7 @@ public:
     void CheckFreeList() const;
 
 private:
-    // freeHead and numFree in one load or store: store-to-load forwarding, as for a record's
-    // header.
+    // freeHead and numFree in one load or store, for store-to-load forwarding as with RecHdr.
     std::uint32_t FreeState() const {
         std::uint32_t state;
         std::memcpy(&state, RecsBase() - sizeof freeHead, sizeof state);
@@ -159,7 +157,7 @@ private:
     static constexpr std::uint32_t oneFree = 0x10000;
     static constexpr std::uint32_t numFreeMask = 0xFFFF0000;
 };
-static_assert(sizeof(Bucket) == 48, "The first record starts 48 bytes behind the bucket's start.");
+static_assert(sizeof(Bucket) == 48, "The first record starts 48 bytes after the bucket's start.");
 static_assert(offsetof(Bucket, size) == 40 && offsetof(Bucket, recSize) == 42 &&
                   offsetof(Bucket, freeHead) == 44,
               "The four counts follow the five links.");

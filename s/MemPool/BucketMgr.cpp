@@ -1,5 +1,5 @@
-// The slow paths of a pool: it is built, grows a group, serves what is too large or traced, answers
-// questions and ends.
+// The slow paths of a pool: building it, making a group, requests that are too large for a bucket
+// or traced, queries, and its end.
 
 #include "MemPool/BucketMgr.hpp"
 
@@ -9,7 +9,7 @@
 
 #include "MemPool/Checked.hpp"
 #include "diagnostics/text/Messages.hpp"
-#include "diagnostics/text/Trace.hpp"
+#include "diagnostics/text/TraceLine.hpp"
 
 namespace OBR::MemPool {
 
@@ -27,7 +27,7 @@ BucketMgr::BucketMgr(Mgr* handle, const std::string& poolName)
     dataAlignment = sizes.dataAlignment;
     maxRecordSize = sizes.maxRecordSize;
     minRecordSize = sizes.minRecordSize;
-    Trace::PoolCreated(this);
+    TraceLine::PoolCreated(this);
     enabled = !Settings::off;
     if (sizes.IsMaxAboveRoom()) {
         Messages::MaxRecordAboveBucket(maxRecordSize, sizes.RoomInBucket(), bucketSize);
@@ -40,15 +40,15 @@ BucketMgr::BucketMgr(Mgr* handle, const std::string& poolName)
 }
 
 BucketMgr::~BucketMgr() {
-    Trace::PoolDestroyed(this);
+    TraceLine::PoolDestroyed(this);
     Clear();
     delete[] groups;
 }
 
-// With a dataAlignment of 2^k, a size from 1 on has d = (s + 1) * 2^k data bytes, where its step s
-// is (size - 1) >> k, and minRecordSize is m * 2^k. So the rule's (d + 4 - minRecordSize) / 2^k is
-// s + 1 + (4 >> k) - m, that is s less the skipped steps m - 1 - (4 >> k). It is below 0 just where
-// d + 4 is below minRecordSize, and there the rule gives 0.
+// Let dataAlignment be 2^k and minRecordSize m * 2^k. A size of at least 1 has d = (s + 1) * 2^k
+// data bytes, where its step s is (size - 1) >> k. The index (d + 4 - minRecordSize) / 2^k is
+// therefore s + 1 + (4 >> k) - m, which is s less the skipped steps m - 1 - (4 >> k). It is
+// negative exactly if d + 4 is below minRecordSize, and then the index is 0.
 void BucketMgr::PrepareFastPath() {
     const bool isPowerOfTwo = (dataAlignment & (dataAlignment - 1)) == 0;
     const bool fits = minRecordSize <= std::numeric_limits<std::int16_t>::max();
@@ -68,8 +68,8 @@ std::uint32_t BucketMgr::IndexOf(std::uint32_t recSize) const {
     return (std::max(recSize, minRecordSize) - minRecordSize) / dataAlignment;
 }
 
-// The group that serves records of `recSize` bytes, made if need be. Several sizes can share the
-// first place; its records have room for the largest of them, whichever is asked for first.
+// The group that serves records of `recSize` bytes, made if it is missing. Several sizes can share
+// the first place; its records have room for the largest of them, whichever comes first.
 Group* BucketMgr::GroupFor(std::uint32_t recSize) {
     const std::uint32_t index = IndexOf(recSize);
     if (groups[index] == nullptr) {
@@ -93,7 +93,7 @@ OBR_NOINLINE void* BucketMgr::AllocSlow(std::uint32_t size) {
         const std::uint32_t recSize = RoundUp(size, dataAlignment) + recHdrSize;
         data = recSize > maxRecordSize ? AllocExtRec(size) : GroupFor(recSize)->Alloc();
     }
-    Trace::BlockAllocated(this, data, size);
+    TraceLine::BlockAllocated(this, data, size);
     return data;
 }
 
@@ -107,7 +107,7 @@ void* BucketMgr::AllocExtRec(std::uint32_t size) {
 }
 
 OBR_NOINLINE bool BucketMgr::FreeSlow(void* data) {
-    Trace::BlockFreed(this, data);
+    TraceLine::BlockFreed(this, data);
     if (!enabled) {
         ::operator delete[](data);
         return true;
@@ -116,7 +116,7 @@ OBR_NOINLINE bool BucketMgr::FreeSlow(void* data) {
     return bucket != nullptr ? bucket->parent->Free(data, bucket) : FreeExtRec(data);
 }
 
-// Gives a heap record back; false if `data` is none's.
+// Gives a heap record back; false if `data` is not a heap record's.
 OBR_NOINLINE bool BucketMgr::FreeExtRec(void* data) {
     if (ExtRec::LengthAt(data) == 0) { return false; }
     ExtRec* const extRec = ExtRec::Of(data);

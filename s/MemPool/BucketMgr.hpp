@@ -1,6 +1,6 @@
-// The pool behind a Mgr: it copies the settings once, turns the size of a request into a size class
-// and serves it from that class's Group, or from the heap if it is too large for a bucket or the
-// pool is disabled.
+// The pool of a Mgr: it copies the settings once, finds the size class of each request, and serves
+// the request from the class's Group, or from the heap if it is too large for a bucket or the pool
+// is disabled.
 
 #ifndef OBR_MEMPOOL_BUCKETMGR_HPP
 #define OBR_MEMPOOL_BUCKETMGR_HPP
@@ -19,7 +19,7 @@ namespace OBR::MemPool {
 
 class Mgr;
 
-// The largest size that Alloc lets through: sums of a size and a header never wrap.
+// The largest size that Alloc accepts, so that the sum of a size and a header never wraps.
 constexpr std::uint32_t maxAllocSize = 0x3FFFFFFF;
 
 // Size classes. A request of `size` bytes has d = RoundUp(size, dataAlignment) data bytes and a
@@ -31,8 +31,8 @@ constexpr std::uint32_t maxAllocSize = 0x3FFFFFFF;
 class BucketMgr {
 public:
     std::string name;
-    Mgr* mgr;                      // The handle that made the pool; null once it is destroyed.
-    Group** groups = nullptr;      // One place per size class, null until it is asked for.
+    Mgr* mgr;                      // The handle that built the pool; null once it is destroyed.
+    Group** groups = nullptr;      // One place per size class, null until its first request.
     ExtRec* extRecs = nullptr;     // Front of the list of heap records, the newest first.
     std::uint32_t numGroups = 0;   // Places in `groups`.
     std::uint32_t numExtRecs = 0;  // Heap records on the list.
@@ -44,11 +44,10 @@ public:
     bool enabled = true;  // False: every request goes straight to the heap.
 
 private:
-    // The size-class rule for the fast path, worked out once, without its division and its cases:
-    // the index for `size` is (size - 1) >> alignmentShift, less skippedSteps, but at least 0.
-    // PrepareFastPath derives it.
-    std::uint16_t fastMax = 0;        // Sizes from 1 to this go that way. 0: none does.
-    std::int16_t skippedSteps = 0;    // Steps of dataAlignment up to index 0. Can be below 0.
+    // The size-class rule of the fast path, which has no division: the index for `size` is
+    // (size - 1) >> alignmentShift, less skippedSteps, but at least 0. See PrepareFastPath.
+    std::uint16_t fastMax = 0;        // The rule holds for sizes from 1 to this; 0: for none.
+    std::int16_t skippedSteps = 0;    // Steps of dataAlignment before index 0; may be negative.
     std::uint8_t alignmentShift = 0;  // dataAlignment is 2 to the power of this.
 
 public:
@@ -72,7 +71,7 @@ public:
         return group->Alloc();
     }
 
-    // Gives a block back. False for null and, in an enabled pool, for what it does not recognise.
+    // Gives a block back. False for null and, in an enabled pool, for a foreign pointer.
     OBR_READS_FOREIGN bool Free(void* data) {
         if (OBR_UNLIKELY(data == nullptr)) { return false; }
         if (OBR_UNLIKELY(!enabled || Settings::trace)) { return FreeSlow(data); }
@@ -82,11 +81,11 @@ public:
         return bucket->parent->Free(data, bucket);
     }
 
-    // Gives everything back. The pool is as new.
+    // Gives all blocks back. The pool is as new.
     void Clear();
 
-    // The bucket of this pool that holds the used record at `data`, or null. `data` may be
-    // anybody's; the same in an enabled and a disabled pool, as for the two questions below.
+    // The bucket of this pool that holds the used record at `data`, or null. `data` may be null or
+    // foreign. This and the next two behave alike in an enabled and a disabled pool.
     OBR_READS_FOREIGN Bucket* FindBucket(void* data) const {
         if (data == nullptr) { return nullptr; }
         const std::uint32_t hdr = RecHdr::Of(data)->Word();
@@ -101,13 +100,13 @@ public:
     bool Contains(const void* data) const;
     std::uint32_t GetSize(const void* data) const;
 
-    // Buckets, counted from 0 in the order of the groups' indices and of each group's list.
-    // GetBucket is part of the interface: nothing in the library calls it.
+    // The buckets in the order of the groups' indices and of each group's list. `index` counts from
+    // 0; null above the last. The library does not call GetBucket: kept for compatibility.
     std::uint32_t GetNumBuckets() const;
     const Bucket* GetBucket(std::uint32_t index) const;
 
-    // Reports, all read-only and exact to the character; s/diagnostics/reports holds them. `level`
-    // indents by three blanks each.
+    // Reports, all read-only and exact to the character, defined in s/diagnostics/reports. Each
+    // `level` indents by three blanks.
     void DbgReport(std::ostream& stream, std::uint32_t level, bool showBuckets, bool showRecords,
                    bool showFreeList) const;
     void DbgUsedData(std::ostream& stream, std::uint32_t level,
@@ -127,7 +126,7 @@ private:
     bool FreeSlow(void* data);
     bool FreeExtRec(void* data);
 };
-static_assert(sizeof(BucketMgr) == 88, "A pool has 88 bytes, which the reports show.");
+static_assert(sizeof(BucketMgr) == 88, "A pool has 88 bytes, which the reports print.");
 
 }  // namespace OBR::MemPool
 

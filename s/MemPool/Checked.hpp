@@ -1,10 +1,10 @@
-// The seam of the checked library, which tells a host its faults: the pool calls these at each step
-// of a block's life. In that library (OBR_MEMPOOL_CHECKED) they lie in s/diagnostics/checked. In
-// the ordinary one they are empty, and not one instruction comes of them.
+// What the checked library does at each step of a block's life, to report a host's faults. There
+// (OBR_MEMPOOL_CHECKED) s/diagnostics/checked defines these functions. In the ordinary library they
+// are empty and cost no instruction.
 //
 // The checked library gives each bucket one record of exactly the size asked for and releases it
-// when the record is freed, whatever the settings say: each block is a block of the heap, which
-// ends where the block ends, and what watches the heap sees it.
+// when the record is freed, whatever the settings are: each block is a heap block of its own, which
+// ends where the data end, and tools that watch the heap see it.
 
 #ifndef OBR_MEMPOOL_CHECKED_HPP
 #define OBR_MEMPOOL_CHECKED_HPP
@@ -33,22 +33,22 @@ inline bool KeepsEmptyBuckets(bool) {
     return false;
 }
 
-// A block of `size` bytes was taken from the pool. Returns it. If memory for the notes on it is
-// exhausted, gives it back and throws.
+// A block of `size` bytes was taken from the pool. Returns it. If there is no memory for the notes
+// on it, gives it back and throws std::bad_alloc.
 void* Taken(BucketMgr& pool, void* data, std::uint32_t size);
 
-// Whether the pool is to be asked about a block, or to release it. False is the answer to the host
-// as well, and a refused release is told. A damaged header is told and mended, so that the pool can
-// go by it.
+// Whether the pool may be asked about a block, or may release it; if not, the host's answer is
+// false as well. A refused release is reported. A damaged header is reported and repaired, so that
+// the pool can use it.
 bool MayAskAbout(const BucketMgr& pool, const void* data);
 bool MayRelease(BucketMgr& pool, void* data);
 
-// All blocks of the pool are about to be released: because the host asks for it, or at its end,
-// where those that live are told.
+// All blocks of the pool are about to be released: by Clear, or at its end, where those still in
+// use are reported.
 void BeforeClear(const BucketMgr& pool);
 void BeforeEnd(const BucketMgr& pool);
 
-// The process ends, or the library is unloaded: what lives in any pool is told.
+// The process ends or the library is unloaded: reports the blocks in use of all pools.
 void AtExit();
 
 #else

@@ -1,4 +1,4 @@
-// The slow paths of a group: buckets come, go, become full and regain a free record.
+// The slow paths of a group: a bucket is made, released, becomes full or regains a free record.
 
 #include "MemPool/Group.hpp"
 
@@ -17,7 +17,7 @@ OBR_NOINLINE void* Group::AllocFromNewBucket() {
     return Alloc();
 }
 
-// The front bucket has given away its last free record, the one with these data.
+// The front bucket has given away its last free record, which has these data.
 OBR_NOINLINE void* Group::UnlinkFull(void* data) {
     --numFreeBuckets;
     freeBuckets = freeBuckets->next2;
@@ -38,7 +38,7 @@ OBR_NOINLINE bool Group::LinkFree(Bucket* bucket) {
     return true;
 }
 
-// A bucket's last used record has come back. If it is the only one, the bucket was full.
+// A bucket's last used record has come back. A bucket of a single record was full until then.
 OBR_NOINLINE bool Group::FreeLastUsed(Bucket* bucket) {
     const bool wasFull = totalRecs == 1;
     if (keepEmptyBuckets) { return wasFull ? LinkFree(bucket) : true; }

@@ -1,5 +1,5 @@
-// All buckets of one record size of one pool. Here records are really taken and given back, and
-// here it is decided when a bucket comes and when it goes.
+// All buckets of one record size of one pool: takes records and gives them back, and decides when a
+// bucket is made and when it is released.
 
 #ifndef OBR_MEMPOOL_GROUP_HPP
 #define OBR_MEMPOOL_GROUP_HPP
@@ -8,30 +8,38 @@
 #include <cstdint>
 
 #include "MemPool/Bucket.hpp"
-#include "MemPool/Checks.hpp"
 
 namespace OBR::MemPool {
 
 class BucketMgr;
 
-// Two lists run through the buckets themselves, and new buckets enter both in front: all buckets
-// (next1, prev1), and those with at least one free record (next2, prev2).
+// With OBR_MEMPOOL_CHECKS, checks a bucket's free list each time it gives or takes back a record.
+#ifdef OBR_MEMPOOL_CHECKS
+inline void CheckTouched(const Bucket& bucket) {
+    bucket.CheckFreeList();
+}
+#else
+inline void CheckTouched(const Bucket&) {}
+#endif
+
+// Two lists link the buckets, and a new bucket enters both in front: the list of all buckets
+// (next1, prev1), and the free-bucket list of those with at least one free record (next2, prev2).
 //
-// Invariants: a bucket is on the free-bucket list exactly while its numFree > 0. Records are only
-// taken from the front of that list, so a bucket that becomes full leaves it from the front. The
+// Invariants: a bucket is on the free-bucket list exactly while its numFree > 0. Records are taken
+// only from the front of that list, so a bucket that becomes full leaves it from the front. The
 // front bucket's prev2 is null. freeBuckets is null exactly while numFreeBuckets is 0.
 class Group {
 public:
-    BucketMgr* parent;                 // The pool that owns the group. Here it is only a name.
+    BucketMgr* parent;                 // The pool that owns the group; never followed here.
     Bucket* head = nullptr;            // Front of the list of all buckets.
-    Bucket* tail = nullptr;            // Back of that list, part of the format: nothing reads it.
+    Bucket* tail = nullptr;            // Back of that list: part of the format, never read.
     Bucket* freeBuckets = nullptr;     // Front of the free-bucket list.
     std::uint32_t numBuckets = 0;      // Buckets on the list of all buckets.
     std::uint32_t numFreeBuckets = 0;  // Buckets on the free-bucket list.
     std::uint16_t recDataSize;         // Data bytes of every record.
-    const std::uint16_t bucketSize;    // The pool's, told once: a group asks for nothing above it.
+    const std::uint16_t bucketSize;    // Copied from the pool.
     const std::uint16_t totalRecs;     // Records of every bucket.
-    const bool keepEmptyBuckets;       // The pool's too: whether an empty bucket stays.
+    const bool keepEmptyBuckets;       // Copied from the pool: whether an empty bucket stays.
 
     // Makes no bucket. `bucketBytes` must leave room for a record.
     Group(BucketMgr* owner, std::uint32_t dataSize, std::uint32_t bucketBytes, bool keepsEmpty)
@@ -45,7 +53,8 @@ public:
     Group& operator=(const Group&) = delete;
     ~Group() = default;
 
-    // Returns the data of a used record. Fails only with the heap, and then changes nothing.
+    // Returns the data of a used record. Throws only what the heap throws, and then changes
+    // nothing.
     void* Alloc() {
         Bucket* const bucket = freeBuckets;
         if (OBR_UNLIKELY(bucket == nullptr)) { return AllocFromNewBucket(); }
@@ -68,8 +77,8 @@ public:
     void DestroyBuckets();
 
 private:
-    // Slow paths. Each returns what its caller is to return, so that the call is the last thing
-    // that the fast path does: a jump, for which no register is saved and no frame made.
+    // Slow paths. Each returns what its caller returns, so that the call is the last thing that the
+    // fast path does: it becomes a jump, which needs no saved register and no stack frame.
     void* AllocFromNewBucket();
     void* UnlinkFull(void* data);
     bool LinkFree(Bucket* bucket);

@@ -1,5 +1,5 @@
-// The exported class: names, and handles that share a pool. All memory work lies in the BucketMgr
-// behind it, whose fast paths are inline here.
+// The exported class: names of pools, and handles that share a pool. The memory work is done by
+// BucketMgr, whose fast paths are inlined here.
 
 #include <MemPool>
 
@@ -21,7 +21,7 @@ static_assert(sizeof(OBR::vector<Mgr*>) == 16, "One pointer and two 32-bit count
 
 namespace {
 
-// Made without a stream, which would take exhausted memory for a reason to write half a name.
+// Made without a stream, which would write half a name if memory is exhausted.
 std::string NextName() {
     static std::uint32_t nameCounter = 1;
     const std::string number = std::to_string(nameCounter++);
@@ -31,7 +31,7 @@ std::string NextName() {
 
 }  // namespace
 
-// Closed to hosts, and nothing here calls it.
+// Private, and never called.
 Mgr::Mgr(const Mgr&) : bucketMgr(nullptr) {}
 
 Mgr::Mgr(const char* name) : bucketMgr(nullptr) {

@@ -1,4 +1,4 @@
-// The registry's operations, and the exported functions through which hosts see it.
+// The registry's operations, and the exported functions that give hosts access to it.
 
 #include "MemPool/MgrRegistry.hpp"
 
@@ -22,9 +22,8 @@ void MgrRegistry::AddSharer(Mgr* handle) {
     }
 }
 
-// The handle can be named by the pools that it has left. Each has its entry, but for the time
-// behind the exit step, when there are no entries: then a pool that anything can still reach is
-// that of one of its other handles, and those came to it by an assignment.
+// The pools that the handle has left may still refer to it. Each of them has an entry until the
+// exit step. After that step a pool can only be reached through another handle, which is a sharer.
 void MgrRegistry::ForgetHandle(Mgr* handle) {
     const auto forget = [handle](BucketMgr* pool) {
         if (pool != nullptr && pool->mgr == handle) { pool->mgr = nullptr; }

@@ -1,4 +1,4 @@
-// The pools of the process by name, and the handles that assignments have made.
+// The pools of the process by name, and the handles that were assigned to.
 
 #ifndef OBR_MEMPOOL_MGRREGISTRY_HPP
 #define OBR_MEMPOOL_MGRREGISTRY_HPP
@@ -14,10 +14,10 @@
 namespace OBR::MemPool {
 
 // Invariants: one entry per living pool, under the pool's own name; a pool's `mgr` is the living
-// handle that made it, or null. The entries own no pool and no handle.
+// handle that built it, or null. The entries own neither pools nor handles.
 //
-// A handle of the host's may be destroyed after the library's exit step. The one object of this
-// class is therefore never destroyed: from that step on it is an empty registry.
+// The host may destroy a handle after the library's exit step. The one object of this class is
+// therefore never destroyed: after that step it is an empty registry.
 class MgrRegistry {
 public:
     using Pools = std::map<std::string, BucketMgr*>;
@@ -33,11 +33,10 @@ public:
     void Erase(const std::string& name) { pools.erase(name); }
     void ReleaseNodes() { pools.clear(); }
 
-    // The living handle that made `pool`, if there is a living pool behind it, else null.
+    // The living handle that built `pool`, if that handle has a living pool, else null.
     static Mgr* HandleOf(const BucketMgr* pool);
 
-    // The handles of all pools, but of those that have lost theirs, in the order of the pools'
-    // names: visit(handle).
+    // Calls visit(handle) for each pool that still has its handle, in the order of the names.
     template <typename Visit>
     void ForEachHandle(Visit visit) const {
         for (const auto& entry : pools) {
@@ -45,12 +44,12 @@ public:
         }
     }
 
-    // Sharers are the living handles that have been the left-hand side of an assignment. Only they
-    // can share a pool with its maker, and only they can be the maker of a pool they have left.
+    // Sharers are the living handles that were once assigned to. Only they can share a pool with
+    // the handle that built it, and only they can have left a pool that they built.
     const std::vector<Mgr*>& Sharers() const { return sharers; }
     void AddSharer(Mgr* handle);
 
-    // For a handle that is being destroyed: no pool names it as its maker from now on.
+    // For a handle that is being destroyed: no pool refers to it from now on.
     void ForgetHandle(Mgr* handle);
 
 private:

@@ -1,5 +1,5 @@
-// The memory of a pool, byte by byte: what a record and a heap record are made of and how a data
-// pointer leads to its header. With Bucket the only place that counts in the bytes of a block.
+// The memory of a pool, byte by byte: the layout of a record and of a heap record, and how a data
+// pointer leads to its header. Only this file and Bucket compute addresses within a block.
 //
 //   Bucket, one heap block                              ExtRec ("heap record"), one heap block
 //
@@ -18,8 +18,8 @@
 // An offset is the 16-bit distance of a record from recsBase, the last two bytes of the bucket's
 // header. The first record thus has offset 2, and offset 0 means none.
 //
-// Words: a record is FREE or USED. The link of a FREE record is the offset of the next free one, 0
-// at the end of the list; that of a USED record is its own offset, which leads from its data back
+// Words: a record is FREE or USED. The link of a FREE record is the offset of the next free record,
+// 0 at the end of the list; that of a USED record is its own offset, which leads from its data back
 // to the bucket. EXT marks a heap record.
 
 #ifndef OBR_MEMPOOL_RECORD_HPP
@@ -33,14 +33,14 @@
 #define OBR_UNLIKELY(condition) __builtin_expect(static_cast<bool>(condition), 0)
 #define OBR_NOINLINE __attribute__((noinline))
 
-// For code that looks at the bytes ahead of a pointer which may be anybody's. They are read as the
-// pool reads its own, whatever a sanitizer knows of them.
+// For code that reads the bytes before a pointer that may be foreign. A sanitizer does not check
+// these reads.
 #define OBR_READS_FOREIGN __attribute__((no_sanitize("address", "alignment", "object-size")))
 
 namespace OBR::MemPool {
 
-// Keeps the stores to a block that is about to be released: an optimiser takes them for dead, but
-// they are what tells a pointer that comes back too late from one that is alive.
+// Keeps the stores to a block that is about to be released. An optimiser would drop them as dead,
+// but by them the pool recognises a pointer that is freed again after its block is gone.
 inline void KeepStores(const void* block) {
     __asm__ volatile("" : : "r"(block) : "memory");
 }
@@ -48,11 +48,11 @@ inline void KeepStores(const void* block) {
 // The offset of a bucket's first record.
 constexpr std::uint16_t firstOffset = 2;
 
-// Written as plain bytes: a header can hold any other value where memory was damaged.
+// Plain bytes, not an enumeration: the header of damaged memory can hold any other value.
 constexpr std::uint8_t typeFree = 0;
 constexpr std::uint8_t typeUsed = 1;
 constexpr std::uint8_t typeExt = 2;
-constexpr std::uint8_t typeUnknown = 0xFF;  // What reports take for a header that lies nowhere.
+constexpr std::uint8_t typeUnknown = 0xFF;  // Stands for a header that is not in the bucket.
 
 // The name of a `type` in reports and messages.
 constexpr const char* RecKindName(std::uint8_t type) {
@@ -68,10 +68,11 @@ constexpr const char* RecKindName(std::uint8_t type) {
     }
 }
 
-// A record's header. A record may start at any address, so that its header is copied like bytes,
-// low byte of the link first; a compiler makes one load or store of a copy. All four bytes go at
-// once, for speed: most records are freed or taken soon after they were taken or freed, and
-// store-to-load forwarding works for a load of the same bytes only.
+// A record's header. A record may start at any address, so its header is copied as bytes, with the
+// low byte of the link first; the compiler makes one load or store of a copy. All four bytes are
+// copied at once for speed: most records are freed soon after they were taken, or taken soon after
+// they were freed, and store-to-load forwarding needs a load of the bytes that were stored
+// together.
 struct RecHdr {
     std::uint8_t link[2];  // FREE: offset of the next free record; USED: own offset; EXT: AA BB.
     std::uint8_t type;     // typeFree, typeUsed or typeExt.
@@ -90,45 +91,44 @@ struct RecHdr {
         return (word & 0xFF000000) + ((std::uint32_t{type} << 16) + link);
     }
 
-    // Whether a word says USED, with a link that can be an offset. One comparison for both.
+    // Whether a word is USED and its link can be an offset.
     static bool IsUsed(std::uint32_t word) {
         const std::uint32_t unguarded = word & 0x00FFFFFF;
         return unguarded >= Marked(0, typeUsed, firstOffset) &&
                unguarded <= Marked(0, typeUsed, 0xFFFF);
     }
 
-    // The link alone, for those who have no use for the rest.
     std::uint16_t Link() const {
         std::uint16_t offset;
         std::memcpy(&offset, link, sizeof offset);
         return offset;
     }
 
-    // Makes a FREE record of raw memory. Two stores: a run of records is faster made so than with
-    // their guards read in order to be kept.
+    // Makes a FREE record of raw memory. Two stores are faster than one of all four bytes, for
+    // which the guard would have to be read first.
     void Format(std::uint16_t newLink) {
         std::memcpy(link, &newLink, sizeof link);
         type = typeFree;
     }
 
-    // The caller's data lie directly behind the header.
+    // The caller's data follow the header directly.
     void* Data() { return this + 1; }
     static RecHdr* Of(void* data) { return static_cast<RecHdr*>(data) - 1; }
     static const RecHdr* Of(const void* data) { return static_cast<const RecHdr*>(data) - 1; }
 };
-static_assert(sizeof(RecHdr) == 4, "The data of every record start 4 bytes behind its header.");
+static_assert(sizeof(RecHdr) == 4, "The data of every record start 4 bytes after its header.");
 static_assert(alignof(RecHdr) == 1, "A record may start at any address.");
 static_assert(__BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__,
               "A copied word has the link's low byte first.");
 
-// The header of a heap record. Nothing in it tells which pool it belongs to.
+// The header of a heap record. It does not say which pool the record belongs to.
 struct ExtRec {
     ExtRec* next;          // Next in the pool's list, null at the end.
     ExtRec* prev;          // Previous one, null at the front.
-    std::uint32_t length;  // Bytes asked for, not rounded. 0: no test takes it for a heap record.
-    RecHdr hdr;            // Stands where a record's header stands: 4 bytes ahead of the data.
+    std::uint32_t length;  // Bytes asked for, not rounded. With 0 no test recognises the record.
+    RecHdr hdr;            // In the place of a record's header: the 4 bytes before the data.
 
-    // Makes a heap record, on no list.
+    // Makes a heap record that is on no list.
     static ExtRec* Create(std::uint32_t length) {
         auto* const extRec = static_cast<ExtRec*>(::operator new[](sizeof(ExtRec) + length));
         *extRec = {nullptr, nullptr, length, {{0xAA, 0xBB}, typeExt, 0xCC}};
@@ -139,7 +139,7 @@ struct ExtRec {
     const void* Data() const { return this + 1; }
     static ExtRec* Of(void* data) { return static_cast<ExtRec*>(data) - 1; }
 
-    // The length of the heap record at `data`, or 0 if the bytes there are not one's.
+    // The length of the heap record with these data, or 0 if they are not a heap record's.
     OBR_READS_FOREIGN static std::uint32_t LengthAt(const void* data) {
         const RecHdr* const hdr = RecHdr::Of(data);
         if (hdr->link[0] != 0xAA || hdr->link[1] != 0xBB || hdr->type != typeExt ||
@@ -153,7 +153,7 @@ struct ExtRec {
 };
 static_assert(sizeof(ExtRec) == 24, "A heap record costs 24 bytes.");
 static_assert(offsetof(ExtRec, length) == 16 && offsetof(ExtRec, hdr) == 20,
-              "The length stands 8 bytes ahead of the data and the header 4.");
+              "The length is 8 bytes before the data, the header 4.");
 
 }  // namespace OBR::MemPool
 

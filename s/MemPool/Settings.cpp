@@ -1,5 +1,4 @@
-// How the settings are stored: by the exported accessors, and at the start-up by the environment,
-// with a rule for each variable.
+// How the settings are stored: by the exported accessors, and at the start-up from the environment.
 
 #include "MemPool/Settings.hpp"
 
@@ -76,7 +75,7 @@ const char* GetVersion() {
 
 namespace {
 
-// The number that a variable starts with, 0 if it starts with none; nothing if it is not set.
+// The number at the start of a variable's value, or 0 if there is none; nullopt if it is not set.
 std::optional<std::int32_t> Number(const char* variable) {
     const char* const value = Host_Env::GetEnv(variable);
     if (value == nullptr) { return std::nullopt; }
@@ -87,8 +86,8 @@ bool IsPositive(const char* variable) {
     return Number(variable).value_or(0) > 0;
 }
 
-// In this order. A number that its rule refuses is silently ignored. The two record sizes are
-// compared as unsigned numbers, so that a negative one counts as a large one.
+// Reads the variables in this order, each with its own rule. A number out of bounds is silently
+// ignored. The record sizes are compared as unsigned numbers: a negative one counts as large.
 void ReadEnvironment() {
     using namespace SettingTable;
     PoolSettings& pool = Settings::pool;

@@ -1,5 +1,4 @@
-// The settings of the process: plain values, which every layer may read. The start-up and the
-// exported accessors store them.
+// The settings of the process: plain values, which every layer may read. Settings.cpp stores them.
 
 #ifndef OBR_MEMPOOL_SETTINGS_HPP
 #define OBR_MEMPOOL_SETTINGS_HPP
@@ -19,9 +18,9 @@ OBR_HIDDEN extern bool trace;         // Read at every event of every pool.
 
 }  // namespace Settings
 
-// Its construction is the start-up: the defaults, the environment, the banner if asked for. It
-// throws a text, const char*, if the record sizes of the environment cannot work; the text outlives
-// the unwinding.
+// The constructor is the start-up: it stores the defaults, reads the environment and prints the
+// banner if asked to. If the minimum record size is not below the maximum then, it throws a text,
+// const char*, which lives as long as the library.
 class EnvInit {
 public:
     EnvInit();

@@ -1,10 +1,10 @@
-// The data of the process, which all pools share, and what happens to it when the library is loaded
-// and unloaded, in this order: the registry is constructed empty, its exit step stands ready, the
-// settings start up (which may throw). On the way out the exit step releases the registry's own
+// The data of the process, which all pools share, and what happens when the library is loaded and
+// unloaded. On load, in this order: the registry is constructed empty, its exit step is registered,
+// and the settings start up (which may throw). On unload the exit step releases the registry's own
 // nodes and nothing else.
 //
-// A program can hold the library as an archive. No static of the host's is constructed ahead of
-// these objects then, and since the data is defined here, each operation of the library brings this
+// A program can link the library as an archive. These objects are constructed before the host's
+// statics then too, and since the data is defined here, every operation of the library links this
 // file into the program.
 
 #include <ios>
@@ -13,7 +13,7 @@
 #include "MemPool/MgrRegistry.hpp"
 #include "MemPool/Settings.hpp"
 
-// Ahead of all objects of the program that name no priority of their own.
+// Before all objects of the program that have no priority of their own.
 #define OBR_FIRST __attribute__((init_priority(101)))
 
 namespace OBR::MemPool {
@@ -32,7 +32,7 @@ bool trace = false;
 
 namespace {
 
-OBR_FIRST const std::ios_base::Init streams;  // The start-up writes.
+OBR_FIRST const std::ios_base::Init streams;  // The start-up writes to them.
 
 }  // namespace
 

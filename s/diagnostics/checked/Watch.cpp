@@ -19,7 +19,7 @@
 #include "diagnostics/checked/EndStatus.hpp"
 #include "diagnostics/checked/Variables.hpp"
 #include "diagnostics/text/Text.hpp"
-#include "diagnostics/text/Trace.hpp"
+#include "diagnostics/text/TraceLine.hpp"
 
 namespace OBR::MemPool::Checked {
 
@@ -147,7 +147,7 @@ std::string Reason(const BucketMgr& pool, const void* data, const char* known) {
 
 // Reports a release that is refused. Returns false.
 bool Refuse(const BucketMgr& pool, const void* data) {
-    Trace::BlockFreed(&pool, data);
+    TraceLine::BlockFreed(&pool, data);
     const char* const known = blocks.Around(data);
     Report(pool, PtrText(data) + " " + Reason(pool, data, known));
     Checkers::PrintStack();

@@ -1,5 +1,5 @@
-// The whole state of one bucket: its header, the figures worked out from it, and on request the
-// sections that open it record by record.
+// The report of one bucket: its header, the figures computed from it, and on request the sections
+// about each of its records.
 
 #include <iomanip>
 #include <ostream>

@@ -1,5 +1,5 @@
-// The check of one bucket's free list, which stops the process at the first fault. A sound list
-// passes without a word.
+// The check of one bucket's free list, which stops the process at the first fault and prints
+// nothing for a sound list.
 
 #include "MemPool/Bucket.hpp"
 #include "diagnostics/reports/RecordHeaders.hpp"

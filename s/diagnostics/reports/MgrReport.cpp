@@ -1,5 +1,5 @@
 // The report of a pool, and the exported operations that print it for one pool or for all. A pool
-// keeps no statistics: the figures are gathered from its buckets first, then printed.
+// keeps no statistics: the figures are gathered from its buckets first and printed then.
 
 #include <iomanip>
 #include <iostream>
@@ -16,7 +16,7 @@ namespace OBR::MemPool {
 
 namespace {
 
-// The least bucket size that the report advises. Nothing enforces it.
+// The smallest bucket size that the report advises; not enforced.
 constexpr std::uint32_t minBucketSize = 128;
 
 struct Figures {
@@ -25,7 +25,7 @@ struct Figures {
     std::uint32_t usedRecs = 0;
     std::uint32_t freeRecs = 0;
     std::uint32_t freeBucks = 0;   // Buckets on free-bucket lists.
-    std::uint32_t freeBucksM = 0;  // Data size of the last group: bytes, and no count.
+    std::uint32_t freeBucksM = 0;  // Data size of the last group, in bytes.
     SizeCounts usedDataFreq;       // Of records and heap records in use.
 };
 
@@ -105,9 +105,9 @@ void BucketMgr::DbgReport(std::ostream& stream, std::uint32_t level, bool showBu
 
 namespace {
 
-// A failed write stays silent, unless the host has asked its stream to tell. But memory that is
-// exhausted while the stream's buffer grows ends the report as it does elsewhere, by its exception:
-// the stream would swallow it and leave half a number.
+// A failed write is silent unless the host has enabled the stream's exceptions. But std::bad_alloc
+// while the stream's buffer grows leaves the report, as it does elsewhere: the stream would swallow
+// it and print half a number.
 void Print(const BucketMgr& pool, bool detailed) {
     const std::ios::iostate told = std::cout.exceptions();
     const bool tellsAll = (told & std::ios::badbit) != 0;

@@ -1,4 +1,4 @@
-// The four tables of a pool: the histogram of its blocks in use, its buckets and their fill, the
+// The four tables of a pool: a histogram of its blocks in use, its buckets and their fill, the
 // free-bucket list of each group, and its heap records. An address is two characters wider than its
 // column.
 
@@ -12,7 +12,7 @@
 
 namespace OBR::MemPool {
 
-// The bars are scaled so that the longest has 51 to 100 asterisks once it stands for 50 or more.
+// The bars are scaled: the longest has 51 to 100 asterisks if it stands for 50 blocks or more.
 void BucketMgr::DbgUsedData(std::ostream& stream, std::uint32_t level,
                             const SizeCounts& usedDataFreq) const {
     std::uint32_t largest = 0;
@@ -48,7 +48,7 @@ void BucketMgr::DbgBuckets(std::ostream& stream, std::uint32_t level) const {
     });
 }
 
-// The first bucket of a group has the group's own values in its row.
+// Only the row of a group's first bucket has the group's own values.
 void BucketMgr::DbgFreeBuckets(std::ostream& stream, std::uint32_t level, std::uint32_t freeBucks,
                                std::uint32_t freeBucksM) const {
     stream << std::endl;

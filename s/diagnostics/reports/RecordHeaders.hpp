@@ -1,6 +1,6 @@
-// The headers of a bucket that may be damaged. These functions read no byte beyond what the
-// bucket's own header tells: a record's header that it does not hold, the guard aside, has an
-// unknown type and no link.
+// The headers of records in a bucket that may be damaged. These functions read no byte beyond the
+// size that the bucket's header states: a record's header that does not fit there, its guard aside,
+// counts as one of unknown type without a link.
 
 #ifndef OBR_DIAGNOSTICS_RECORDHEADERS_HPP
 #define OBR_DIAGNOSTICS_RECORDHEADERS_HPP
@@ -16,8 +16,8 @@ inline bool HasHeaderAt(const Bucket& bucket, std::uint32_t offset) {
     return offset + offsetof(RecHdr, guard) <= bucket.size;
 }
 
-// A record is where the way from record to record comes by and finds a header, be it in a piece of
-// a record at the end.
+// Whether a record begins at the offset: at a multiple of the record size, with a whole header,
+// even if the record itself is cut off by the bucket's end.
 inline bool HasRecordAt(const Bucket& bucket, std::uint32_t offset) {
     return offset >= firstOffset && bucket.recSize != 0 &&
            (offset - firstOffset) % bucket.recSize == 0 && HasHeaderAt(bucket, offset);

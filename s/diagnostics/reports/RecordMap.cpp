@@ -5,7 +5,7 @@
 //          +---------+---------+---------+
 //          | USED    | FREE +  | FREE    |     kinds
 //          | o=2     | o=18    | o=34    |     offsets
-//        0 | s=16    | s=16    | s=16    |     sizes, behind the index of the row's first record
+//        0 | s=16    | s=16    | s=16    |     sizes, after the index of the row's first record
 //          | d=12    | n=34    | n=0     |     values: data size, or offset of the next free record
 //          +---------+---------+---------+
 
@@ -33,7 +33,7 @@ void WriteLeft(std::ostream& stream, int width, const Text& text) {
     stream << std::left << std::setw(width) << text << std::right << "| ";
 }
 
-// A line of boxes that begins at the margin, with the text of each by the index of its record.
+// A line of boxes: writeBox(index) writes the box of each record.
 template <typename WriteBox>
 void WriteBoxes(std::ostream& stream, std::uint16_t n, std::uint16_t first, WriteBox writeBox) {
     WriteMargin(stream);

@@ -1,5 +1,5 @@
-// The three tables that open up one bucket: all its records, a histogram of the used ones, and its
-// free list from the head on.
+// The three tables of a bucket: all its records, a histogram of the used ones, and its free list
+// from the head on.
 
 #include <algorithm>
 #include <ostream>
@@ -35,7 +35,7 @@ void Bucket::AddUsedRecords(SizeCounts& counts) const {
     });
 }
 
-// One asterisk a record, as many as the column holds.
+// One asterisk per record, as many as the column holds.
 void Bucket::DbgUsedHistogram(std::ostream& stream, std::uint32_t level) const {
     constexpr std::uint32_t maxBar = 50;
     SizeCounts counts;

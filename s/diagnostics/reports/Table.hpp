@@ -1,5 +1,5 @@
-// A table of a report: one list of columns gives the headings, the rule below them and the rows.
-// What is set on the stream here stays set: right-justified, with a blank as fill.
+// A table of a report: one list of columns determines the headings, the rule below them and the
+// rows. It leaves the stream right-justified, with a blank as fill.
 
 #ifndef OBR_DIAGNOSTICS_TABLE_HPP
 #define OBR_DIAGNOSTICS_TABLE_HPP
@@ -14,14 +14,14 @@
 
 namespace OBR::MemPool {
 
-// A value that is wider than its column is written whole and moves the rest of its row.
+// A value wider than its column is written whole and shifts the rest of its row.
 struct Column {
     const char* heading;
     int width;
-    char fill = ' ';  // Ahead of a row's value.
+    char fill = ' ';  // Before a row's value.
 };
 
-// Values that are not written as they are.
+// Values with a format of their own.
 struct Percentage {
     double value;
 };
@@ -35,7 +35,7 @@ class Table {
 public:
     using Columns = Column[numColumns];
 
-    // Writes the headings. Behind a row's last value stands `atEnd`.
+    // Writes the headings. Each row ends with `atEnd`.
     Table(std::ostream& output, std::uint32_t level, const Columns& list, const char* atEnd = " ")
         : stream(output), indent(Indent(level)), columns(list), rowEnd(atEnd) {
         stream << std::left << indent;
@@ -55,8 +55,7 @@ public:
     // Writes a row: a value for each column.
     template <typename... Values>
     void WriteRow(const Values&... values) const {
-        static_assert(sizeof...(Values) == numColumns,
-                      "A value has a column, and a column a value.");
+        static_assert(sizeof...(Values) == numColumns, "A row has one value per column.");
         const Column* column = columns;
         const char* separator = indent.c_str();
         const auto write = [&](const auto& value) {

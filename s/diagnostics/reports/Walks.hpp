@@ -1,5 +1,5 @@
-// The ways through a pool and a bucket that the reports take. They read no byte outside the block
-// that a bucket's header describes, also where the header or the free list is damaged.
+// How the reports walk through a pool and a bucket. They read no byte outside the block that a
+// bucket's header describes, even if the header or the free list is damaged.
 
 #ifndef OBR_DIAGNOSTICS_WALKS_HPP
 #define OBR_DIAGNOSTICS_WALKS_HPP
@@ -28,8 +28,8 @@ void ForEachBucket(const Group& group, Visit visit) {
     }
 }
 
-// All records of a bucket in the order of their addresses: visit(offset). A bucket holds at least
-// one record, so that the first is not asked for.
+// All records of a bucket in the order of their addresses: visit(offset). The first is always
+// visited, since a bucket has at least one.
 template <typename Visit>
 void ForEachRecord(const Bucket& bucket, Visit visit) {
     std::uint32_t offset = firstOffset;
@@ -39,12 +39,11 @@ void ForEachRecord(const Bucket& bucket, Visit visit) {
     } while (offset < bucket.size && bucket.recSize != 0);
 }
 
-// The way along a bucket's free list:
+// A walk along a bucket's free list:
 //
 //     for (FreeListWalk walk(bucket); walk.IsOnRecord(); walk.Next()) { ... walk.Offset() ... }
 //
-// It has no end if the list runs in a circle, and no sense from the first place on that is not a
-// record's.
+// It does not end if the list is circular, and must not go on from a place that is not a record.
 class FreeListWalk {
 public:
     explicit FreeListWalk(const Bucket& walked) : bucket(walked), offset(walked.freeHead) {}

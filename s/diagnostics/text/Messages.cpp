@@ -1,5 +1,5 @@
-// The exact texts. A message has a fixed number, which is its name for those who search for it; it
-// is no position in these files.
+// The exact texts. Each message has a fixed number, by which people search for it; the number is
+// not a line of these files.
 
 #include "diagnostics/text/Messages.hpp"
 
@@ -16,7 +16,7 @@ namespace OBR::MemPool {
 
 namespace {
 
-// One whole line. The stream's own fill and justification hold for the number's width.
+// Writes one line. The stream's own fill and justification apply to the number.
 template <typename... Pieces>
 void WriteLine(const char* severity, int number, const Pieces&... pieces) {
     std::cout << severity << ":../s/MemPool:" << std::setw(5) << number << ": ";
@@ -82,7 +82,7 @@ void TooManyFreeRows(std::uint32_t rows, std::uint32_t totalRecs) {
     Warn(2970, "Exceeded the number of total number of recs ", rows, " > ", totalRecs);
 }
 
-// Truth values are shown as 1 and 0, however the stream would write a bool.
+// Flags are printed as 1 and 0, whatever the stream makes of a bool.
 void Banner() {
     Inform(3259, "# ================================================");
     Inform(3260, "# NUV_OBR_MEMPOOL_INFO");
@@ -97,7 +97,7 @@ void Banner() {
     Inform(3269, "# Use Heap           : ", int{Settings::off});
 }
 
-// The text is made in place, which neither the process's locale nor exhausted memory changes.
+// The text is made in place, so that neither a locale nor exhausted memory changes it.
 const char* MinRecordNotBelowMax(std::uint32_t minRecordSize, std::uint32_t maxRecordSize) {
     static FixedText text;
     text = FixedText();

@@ -1,4 +1,4 @@
-// Every message of the library, one operation each, in the order of their numbers. Those marked
+// Every message of the library, a function each, in the order of their numbers. Those marked
 // noreturn end the process through std::exit(1).
 
 #ifndef OBR_DIAGNOSTICS_MESSAGES_HPP
@@ -24,17 +24,17 @@ void TooManyRows(std::uint32_t rows, std::uint32_t totalRecs);
 void TooFewRows(std::uint32_t rows, std::uint32_t totalRecs);
 void TooManyFreeRows(std::uint32_t rows, std::uint32_t totalRecs);
 
-// The settings as they are, line by line.
+// Prints the present settings.
 void Banner();
 
-// Writes its line to the standard error stream. Returns the same text, which lives as long as the
-// library: an exception carries it out of the load.
+// Writes its line to standard error. Returns the same text, to be thrown; it lives as long as the
+// library.
 const char* MinRecordNotBelowMax(std::uint32_t minRecordSize, std::uint32_t maxRecordSize);
 
 }  // namespace Messages
 
-// Reports a broken assumption of the program and ends the process through std::exit(1). It has no
-// caller in the library: it stands for the sake of those who search for its text.
+// Reports a broken assumption of the program and ends the process through std::exit(1). The library
+// does not call it: kept for compatibility.
 [[noreturn]] void MYASSERT(const char* text, const char* file, std::int32_t line);
 
 }  // namespace OBR::MemPool

@@ -1,5 +1,4 @@
-// Addresses have one form wherever they are told, and one function makes its digits. They are made
-// in place, so that exhausted memory never leaves some of them out.
+// All addresses have one form, and one class makes its digits in place, without the heap.
 
 #include "diagnostics/text/Text.hpp"
 

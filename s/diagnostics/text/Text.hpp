@@ -1,5 +1,5 @@
-// The texts that messages, traces and reports share: indentation, addresses, and short texts put
-// together in place. They take nothing from the stream that they end up on, nor from the process's
+// The texts that messages, traces and reports share: indentation, addresses, and short texts built
+// in place. They depend neither on the state of the stream that they are written to nor on a
 // locale.
 
 #ifndef OBR_DIAGNOSTICS_TEXT_HPP
@@ -12,16 +12,17 @@
 
 namespace OBR::MemPool {
 
-// Three blanks a level.
+// Three blanks per level.
 std::string Indent(std::uint32_t level);
 
 // "0x" and 16 hexadecimal digits; 18 zeros for null.
 std::string PtrText(const void* pointer);
 
-// The 16 digits alone; 18 zeros for null, which has no "0x" to lose.
+// The 16 digits alone; 18 zeros for null. The library does not call it: kept for compatibility.
 std::string BareHex(const void* pointer);
 
-// A text of at most 127 characters that asks the heap for nothing. The callers keep to that length.
+// A text of at most 127 characters, in an array instead of on the heap. Callers keep to that
+// length.
 class FixedText {
 public:
     FixedText& Add(std::string_view piece);

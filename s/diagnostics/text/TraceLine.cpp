@@ -1,6 +1,6 @@
 // The exact text of each traced event, and how it reaches the buffer of standard output whole.
 
-#include "diagnostics/text/Trace.hpp"
+#include "diagnostics/text/TraceLine.hpp"
 
 #include <algorithm>
 #include <cstddef>
@@ -11,11 +11,11 @@
 #include "MemPool/Settings.hpp"
 #include "diagnostics/text/Text.hpp"
 
-namespace OBR::MemPool::Trace {
+namespace OBR::MemPool::TraceLine {
 
 namespace {
 
-// Reaches what a buffer of any class keeps from all but its heirs: how far its memory is filled.
+// Gives access to protected members of any stream buffer: how far its memory is filled.
 class Buffer : std::streambuf {
 public:
     struct Extent {
@@ -27,7 +27,7 @@ public:
                 (buf.*&Buffer::egptr)() - (buf.*&Buffer::eback)()};
     }
 
-    // Takes the beginning of `line` back if that is what the buffer got since it had this extent.
+    // Removes the beginning of `line` if that is what the buffer has received since `before`.
     static void TakeBack(std::streambuf& buf, const Extent& before, std::string_view line) {
         const Extent now = ExtentOf(buf);
         if (now.written <= before.written) { return; }
@@ -41,12 +41,11 @@ public:
     }
 };
 
-// Past the stream's insertions, which heed its width and its locale and may throw. A stream that
-// the host has marked as failed takes no line, as it takes no other output.
+// Writes to the buffer directly, since the stream's operators use its width and its locale and may
+// throw. A stream in a failed state gets no line, like any other output.
 //
-// A buffer that has to grow for a line and cannot (that of a string stream without memory) has
-// filled the room there was. That beginning is taken back, or the next line would stand glued to
-// it.
+// A buffer that must grow for a line and cannot (a string stream's, if memory is exhausted) keeps
+// the beginning of the line. That is removed, or the next line would be glued to it.
 void Write(FixedText& text) noexcept {
     if (!std::cout.good()) { return; }
     std::streambuf& buf = *std::cout.rdbuf();
@@ -82,4 +81,4 @@ void PoolDestroyed(const BucketMgr* pool) noexcept {
     if (Settings::trace) { Write(FixedText().Add("xmpt:d:").AddBareHex(pool)); }
 }
 
-}  // namespace OBR::MemPool::Trace
+}  // namespace OBR::MemPool::TraceLine

@@ -1,0 +1,28 @@
+// The four events of the trace, which write one line each on standard output. With the trace off an
+// event costs a call and a test of the setting.
+//
+// An event writes one whole line or nothing, and it never fails or changes what the pool does: a
+// line is built without the heap, and it neither uses nor changes the state of the stream, which
+// the host may have set. A line that cannot be written is silently dropped.
+
+#ifndef OBR_DIAGNOSTICS_TRACELINE_HPP
+#define OBR_DIAGNOSTICS_TRACELINE_HPP
+
+#include <cstdint>
+
+namespace OBR::MemPool {
+
+class BucketMgr;
+
+namespace TraceLine {
+
+void PoolCreated(const BucketMgr* pool) noexcept;
+void BlockAllocated(const BucketMgr* pool, const void* data, std::uint32_t size) noexcept;
+void BlockFreed(const BucketMgr* pool, const void* data) noexcept;
+void PoolDestroyed(const BucketMgr* pool) noexcept;
+
+}  // namespace TraceLine
+
+}  // namespace OBR::MemPool
+
+#endif
