@@ -25,6 +25,6 @@ build() {
 # The targets whose tests are the library's own, without those of examples and tools, and the names of
 # these tests.
 # shellcheck disable=SC2034  # Used by those who source this.
-coreTests=({Record,Pool,Mgr,Trace,Report,Heap,HeapContainer,HeapFails,Vector,Process,Settings,Load,PoolsCorpus}Test StaticHost)
+coreTests=({Record,Pool,Mgr,Trace,Report,Heap,HeapContainer,Vector,Process,Settings,Load,PoolsCorpus}Test StaticHost)
 # shellcheck disable=SC2034
 coreNames="^($(IFS='|' && echo "${coreTests[*]}"))(\\.|\$)"
