@@ -104,6 +104,10 @@ class LiveHost(unittest.TestCase):
                                       for name, offset, code in form.fields})
             self.assertEqual(cxx_type.sizeof, form.size)
 
+    def test_rounds_as_the_library_does(self):
+        for index, sizes in enumerate(((0, 4), (1, 4), (8, 4), (10, 3))):
+            self.assertEqual(self.layout.round_up(*sizes), evaluate(f"roundedUp[{index}]"))
+
     def test_lists_the_pools(self):
         text = run("info mempools")
         rows = {line[66:].split("  ", 1)[1]: line.split() for line in text.splitlines()[1:]}

@@ -17,6 +17,9 @@ using namespace OBR::MemPool;
 const MgrRegistry* registryOfNone = nullptr;
 const ExtRec* extRecOfNone = nullptr;
 
+// What gdb's commands round in Python.
+unsigned int roundedUp[] = {RoundUp(0, 4), RoundUp(1, 4), RoundUp(8, 4), RoundUp(10, 3)};
+
 // The report that gdb asks for: it sets these while the host stands in Ready and lets it go on. It
 // calls nothing, since gdb cannot do that on a processor with registers that it does not know.
 char askedName[64] = "";
@@ -58,6 +61,8 @@ int main() {
     }
     NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS(false);
     NUV_OBR_MEMPOOL_DATA_ALIGNMENT(4);
+    NUV_OBR_MEMPOOL_MIN_RECORD_SIZE(0xFFFFFFFF);  // Rounded up, it wraps to 0.
+    sorts.emplace_back();
     NUV_OBR_MEMPOOL_MIN_RECORD_SIZE(8);
 
     // Two full buckets and one with a free record between two used ones, of three records each; one

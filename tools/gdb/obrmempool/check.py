@@ -62,7 +62,7 @@ def check_settings(pool):
     require(0 < align < 2**16, pool, f"a data alignment of {align}")
     require(low % align == 0 and high % align == 0, pool,
             f"record sizes from {low} to {high} are no multiples of {align}")
-    require(0 < low <= high <= pool.bucketSize - hdr, pool,
+    require(low <= high <= pool.bucketSize - hdr, pool,
             f"record sizes from {low} to {high} in buckets of {pool.bucketSize}")
     require(pool.numGroups == (high - low) // align + 1, pool,
             f"{pool.numGroups} places for groups, {(high - low) // align + 1} size classes")
