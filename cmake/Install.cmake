@@ -1,14 +1,13 @@
-# What an install consists of: the shared library with its links, the archive, the headers, and the
-# packages by which CMake (ObrMemPool) and pkg-config (ObrMemPool.pc) find them. An install may be
-# moved: the packages find the rest from where they lie themselves. The library depends on nothing
-# that its users would have to find, not even with a host layer, which it links privately; only the
-# archive leaves such a layer to them.
+# Install rules for the library, its headers, and the files through which CMake (ObrMemPool) and pkg-config
+# (ObrMemPool.pc) find them. These files contain relative paths, so an installed tree can be moved. Users of
+# the shared library need no other library, not even a host layer, which it links privately. Users of the
+# static library link a host layer themselves.
 #
-# Every rule of the project names its component, which Packages.cmake makes a package of:
+# Each install rule of the project names a component, and Packages.cmake makes a package of each:
 #
-#   runtime   the shared library, and what gdb loads with it
-#   dev       headers, archive, the packages for CMake and pkg-config, manual of the library
-#   tools     programs, what they load, and their manuals
+#   runtime   the shared library, and the commands that gdb loads with it
+#   dev       headers, static library, files for CMake and pkg-config, the library's manual
+#   tools     programs, the libraries that they load, and their manual
 
 include(CMakePackageConfigHelpers)
 
@@ -37,7 +36,7 @@ install(FILES
     ${CMAKE_CURRENT_BINARY_DIR}/ObrMemPoolConfigVersion.cmake
     DESTINATION ${packageDir} COMPONENT dev)
 
-# A folder below the prefix is told from the prefix, one elsewhere by its whole path.
+# A folder below the prefix gets a relative path, any other an absolute one.
 set(pkgConfigDir ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
 cmake_path(ABSOLUTE_PATH pkgConfigDir BASE_DIRECTORY ${CMAKE_INSTALL_PREFIX}
     OUTPUT_VARIABLE fullPkgConfigDir)

@@ -1,5 +1,5 @@
-# Part of an install: makes the link by which gdb finds `script` with the library in `linkDir`. Both
-# are told from `prefix`, or by their whole paths. See Gdb.cmake for where it stands and why.
+# Part of an install: creates the link through which gdb finds `script` for the library in `linkDir`. Both
+# are absolute or relative to `prefix`. Gdb.cmake explains where the link must be.
 
 cmake_path(ABSOLUTE_PATH linkDir BASE_DIRECTORY "${prefix}" NORMALIZE)
 cmake_path(ABSOLUTE_PATH script BASE_DIRECTORY "${prefix}" NORMALIZE)

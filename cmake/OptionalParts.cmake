@@ -1,5 +1,5 @@
-# Parts of the project beside the library. What a part needs comes from Debian packages; where one is
-# missing the part is left out, unless its option asks for it:
+# Optional parts of the project. A part needs Debian packages. If one is missing the part is left out, or the
+# configure step fails if the option of the part is ON:
 #
 #   optional_part(OBR_MEMPOOL_TOOLS "Build the tools")
 #   part_needs(OBR_MEMPOOL_TOOLS mempool
@@ -7,23 +7,23 @@
 #       ZLIB zlib1g-dev)
 #   if(CAN_BUILD_mempool)
 #
-# The option is ON (everything of the part must be built), OFF (nothing is), or AUTO (what can be).
+# The option is ON (all of the part must be built), OFF (none of it), or AUTO (as much as possible).
 
-# Declares the option of a part: AUTO by default, or what a third argument says; OFF inside of another
-# project.
+# optional_part(OPTION HELP [DEFAULT]): declares the option of a part. DEFAULT is AUTO if omitted. Inside of
+# another project the option is OFF.
 function(optional_part option help)
     set(default ${ARGN} AUTO)
     list(GET default 0 default)
     if(NOT PROJECT_IS_TOP_LEVEL)
         set(default OFF)
     endif()
-    set(${option} ${default} CACHE STRING "${help}: ON, OFF, or AUTO, which leaves out what it cannot")
+    set(${option} ${default} CACHE STRING "${help}: ON, OFF, or AUTO to leave out what lacks a package")
     set_property(CACHE ${option} PROPERTY STRINGS AUTO ON OFF)
 endfunction()
 
-# Finds what `name`, of the part with that option, needs: pairs of a CMake package, whose version may
-# follow behind a blank, and the Debian package that brings it. Sets CAN_BUILD_name. A macro, since
-# what a package sets is meant for the caller.
+# part_needs(OPTION NAME [CMAKE_PACKAGE DEBIAN_PACKAGE]...): looks for the packages that NAME needs and sets
+# CAN_BUILD_NAME. A version may follow the CMake package after a blank. This is a macro, so that the caller
+# sees the variables that a package sets.
 macro(part_needs option name)
     set(CAN_BUILD_${name} FALSE)
     if(${option})

@@ -1,5 +1,5 @@
-# Makes a Debian changelog of the newest version in CHANGELOG.md: each item of its lists, filled anew
-# to the width that Debian has. Takes version, maintainer and date.
+# Converts the newest version in CHANGELOG.md to a Debian changelog. Rewraps each list item to Debian's
+# width. Takes version, maintainer and date.
 
 function put_item(    n, words, i, line) {
     if (item == "") { return }

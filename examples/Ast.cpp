@@ -1,9 +1,9 @@
-// A small compiler's front end: it parses arithmetic with variables and functions into a tree,
-// folds constants, evaluates it, and drops the tree whole. Each unit (here a made text of many
-// definitions) has a heap of its own. Nodes with pointers and doubles come from it through an
-// Allocator, the names and argument lists in them through a Resource.
+// The front end of a small compiler. It parses arithmetic with variables and functions into a tree,
+// evaluates the tree, and drops it with one call. Each unit, here a generated text of many
+// definitions, has a heap of its own. The nodes come from it through an Allocator, the names and
+// argument lists in the nodes through a Resource.
 //
-// With --heap the same tree is made of new and delete, and dropped node by node.
+// With --heap the same tree uses new and delete, and is dropped node by node.
 //
 //     let v7 = max(v3, 2 * 1.5) + (v1 - 8) / 4;
 
@@ -46,9 +46,9 @@ struct Node {
     std::pmr::vector<Node*> args;  // The operands.
 };
 
-// A unit's tree on pools. A compiler builds and drops, and frees next to nothing between: large
-// buckets are filled to the end, so that there are few of them to make. No bucket runs empty before
-// the drop, so that none is kept.
+// The tree of a unit on pools. A compiler frees almost nothing before it drops the tree, so large
+// buckets are filled to the end and few are needed. No bucket runs empty before the drop, so it is
+// of no use to keep empty ones.
 class PoolMemory {
 public:
     explicit PoolMemory(bool on)
@@ -60,7 +60,7 @@ public:
     }
     std::pmr::memory_resource& Texts() { return resource; }
 
-    // All that the nodes own lies in the heap as well, so that no destructor has to run.
+    // Everything that the nodes own is in the heap too, so no destructor has to run.
     void Drop(const std::vector<Node*>&) { heap.FreeAll(); }
 
     void Report() const { heap.GetMgr().Dbg(); }
@@ -71,7 +71,7 @@ private:
     Resource resource;
 };
 
-// The same on new and delete.
+// The same tree with new and delete.
 class PlainMemory {
 public:
     template <typename... Args>
@@ -91,13 +91,13 @@ private:
     }
 };
 
-// Recursive descent over the text. A syntax error is a std::runtime_error with its place.
+// A recursive-descent parser. A syntax error is a std::runtime_error with its position.
 template <typename Memory>
 class Parser {
 public:
     Parser(std::string_view source, Memory& memoryOfNodes) : text(source), memory(memoryOfNodes) {}
 
-    // Every `let` of the text: its name and the tree behind it.
+    // Every `let` of the text: its name and its tree.
     void ParseAll(std::vector<Node*>& roots, std::vector<std::string_view>& names) {
         for (SkipBlanks(); place < text.size(); SkipBlanks()) {
             if (Word() != "let") { Fail("'let' expected"); }
@@ -195,7 +195,7 @@ double Call(std::string_view name, const std::vector<double>& args) {
     if (name == "max") { return *std::max_element(args.begin(), args.end()); }
     if (name == "min") { return *std::min_element(args.begin(), args.end()); }
     if (name == "abs") { return std::fabs(args.front()); }
-    throw std::runtime_error("no function is named '" + std::string(name) + "'");
+    throw std::runtime_error("unknown function '" + std::string(name) + "'");
 }
 
 using Values = std::unordered_map<std::string_view, double>;
@@ -227,7 +227,7 @@ double Evaluate(const Node& node, const Values& values) {
     return Call(node.name, args);
 }
 
-// A text that is the same on every machine.
+// Generates a text, the same on every machine.
 std::string MadeText(int definitions) {
     std::string text;
     std::uint32_t seed = 1;
@@ -278,12 +278,12 @@ int Main(int argc, char** argv) {
     bool useHeap = false;
     bool off = false;
     bool report = false;
-    CLI::App app("Parses and evaluates a made text, its tree in a memory pool.", "Ast");
-    app.add_option("--definitions", definitions, "How long the text is")
+    CLI::App app("Parses and evaluates a generated text, with its tree in a memory pool.", "Ast");
+    app.add_option("--definitions", definitions, "Definitions in the text")
         ->check(CLI::Range(1, 10000000))
         ->capture_default_str();
-    app.add_flag("--heap", useHeap, "new and delete in place of a pool");
-    app.add_flag("--off", off, "The pool off: each block by itself, for a memory checker");
+    app.add_flag("--heap", useHeap, "Use new and delete instead of a pool");
+    app.add_flag("--off", off, "Disable the pool, so that a memory checker sees each block");
     app.add_flag("--report", report, "Print the pool before the tree is dropped");
     CLI11_PARSE(app, argc, argv);
 

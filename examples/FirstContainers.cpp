@@ -1,4 +1,4 @@
-// Standard containers in a heap, pmr and classic. The README shows this program.
+// Containers of std::pmr and of std in a heap. The README shows this program.
 
 #include <MemPoolHeap>
 #include <string>

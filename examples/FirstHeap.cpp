@@ -1,4 +1,4 @@
-// A heap of one's own, as most hosts start. The README shows this program.
+// A heap with the calls of C. The README shows this program.
 
 #include <MemPoolHeap>
 

@@ -1,4 +1,4 @@
-// The first program of the README.
+// A bare pool. The README shows this program.
 
 #include <MemPool>
 #include <iostream>

@@ -1,11 +1,10 @@
-// Runs Lua scripts on pools: each script has a state of its own, and each state a heap of its own,
-// which Lua's allocator function asks for every block. When a script is done its heap is dropped as
-// a whole, in place of lua_close, which gives block after block back. With --heap the states take
-// their blocks from the C library's malloc, for comparison.
+// Runs Lua scripts on pools. Each script has a Lua state with a heap of its own, which serves all
+// blocks of the state. When a script ends, one call drops its heap; lua_close would free each
+// block. With --heap the states use the C library's malloc, for comparison.
 //
-// What a script prints is all that comes to standard output; the figures go to standard error.
-// Dropping a heap runs no finalizer (__gc, <close> of a suspended coroutine): a script that counts
-// on them wants --close.
+// Standard output has only what the scripts print; the figures go to standard error. Dropping a
+// heap runs no finalizers (__gc, <close> of a suspended coroutine). Use --close for scripts that
+// need them.
 
 #include <MemPoolHeap>
 
@@ -27,11 +26,10 @@ namespace {
 using OBR::MemPool::Heap;
 using OBR::MemPool::HeapSettings;
 
-// An interpreter's blocks are small and of few sizes, and hundreds of thousands live: the largest
-// buckets are made least often, and neighbours in time lie side by side. The collector drops blocks
-// by the thousand, all but emptying a class at each turn, so that empty buckets are kept; objects
-// that die a generation at a time would do a fifth better without. Records up to 1000 bytes hold
-// all objects and small tables; larger ones are few.
+// An interpreter has hundreds of thousands of small blocks of few sizes, so it gains most from the
+// largest buckets: few are made, and blocks that are allocated together lie together. The collector
+// frees thousands of blocks at a time and almost empties a size class, so empty buckets are kept.
+// Records of up to 1000 bytes hold all objects and small tables; larger blocks are few.
 HeapSettings Settings(bool on) {
     return HeapSettings().On(on).BucketSize(65535).MaxRecordSize(1000).KeepEmptyBuckets(true);
 }
@@ -70,14 +68,14 @@ double Seconds() {
     return std::chrono::duration<double>(now).count();
 }
 
-// What lua_pcall calls with an error's text, or with what a script threw.
+// The message handler of lua_pcall: adds a traceback to the error.
 int AddTraceback(lua_State* lua) {
     const char* const text = luaL_tolstring(lua, 1, nullptr);
     luaL_traceback(lua, lua, text, 1);
     return 1;
 }
 
-// Runs in protected mode, since each of these can run out of memory. Takes the script's name.
+// Takes the script's name. Runs in protected mode, since each call here can run out of memory.
 int RunScript(lua_State* lua) {
     const auto* const name = static_cast<const char*>(lua_touserdata(lua, 1));
     luaL_openlibs(lua);
@@ -97,14 +95,14 @@ bool Succeeds(lua_State* lua, const std::string& script) {
     lua_pushlightuserdata(lua, const_cast<char*>(script.c_str()));
     if (lua_pcall(lua, 1, 0, 0) == LUA_OK) { return true; }
     const char* const text = lua_tostring(lua, -1);
-    std::fprintf(stderr, "LuaHost: %s\n", text != nullptr ? text : "an error without a text");
+    std::fprintf(stderr, "LuaHost: %s\n", text != nullptr ? text : "an error without a message");
     return false;
 }
 
 bool Run(const Options& options, const std::string& script, std::size_t number) {
     std::unique_ptr<Heap> heap;
     if (!options.useMalloc) {
-        // Two runs of one script are two pools.
+        // The number keeps names of pools unique if a script runs twice.
         const std::string name = std::to_string(number) + " " + script;
         heap = std::make_unique<Heap>(name.c_str(), Settings(!options.off));
     }
@@ -138,12 +136,13 @@ bool Run(const Options& options, const std::string& script, std::size_t number) 
 int Main(int argc, char** argv) {
     Options options;
     CLI::App app("Runs Lua scripts, each in a memory pool of its own.", "LuaHost");
-    app.add_option("SCRIPT", options.scripts, "Lua scripts, run one after the other")->required();
-    app.add_flag("--heap", options.useMalloc, "The C library's malloc in place of pools");
-    app.add_flag("--off", options.off, "Pools off: each block by itself, for a memory checker");
+    app.add_option("SCRIPT", options.scripts, "Lua scripts to run, one after the other")
+        ->required();
+    app.add_flag("--heap", options.useMalloc, "Use the C library's malloc instead of pools");
+    app.add_flag("--off", options.off, "Disable pools, so that a memory checker sees each block");
     app.add_flag("--close", options.close,
-                 "Close the state, with its finalizers, ahead of the heap");
-    app.add_flag("--report", options.report, "Print each script's pool when it is done");
+                 "Close the state before the heap is dropped, which runs finalizers");
+    app.add_flag("--report", options.report, "Print the pool of each script when it ends");
     CLI11_PARSE(app, argc, argv);
 
     bool success = true;

@@ -1,5 +1,5 @@
-// How much an example has read, on one line of a terminal that is written over and over. Nothing is
-// shown in a file or a pipe.
+// Shows on one line of a terminal how much an example has read. Shows nothing if standard error is
+// not a terminal.
 
 #ifndef OBR_EXAMPLES_PROGRESS_HPP
 #define OBR_EXAMPLES_PROGRESS_HPP
@@ -25,7 +25,7 @@ public:
         isShown = true;
     }
 
-    // Makes room for what is written next.
+    // Clears the line for other output.
     void Clear() {
         if (isShown) { std::cerr << "\r\033[K" << std::flush; }
         isShown = false;

@@ -1,9 +1,8 @@
-// Runs an SQL file in an SQLite database whose every block comes from a heap of pools: SQLite takes
-// a host's memory calls through sqlite3_config. With --heap it keeps those of its own, which are
-// the C library's malloc, for comparison.
+// Runs an SQL file in SQLite, with all of SQLite's memory in a heap: sqlite3_config takes the
+// functions. With --heap SQLite uses the C library's malloc, for comparison.
 //
-// Rows come to standard output as the sqlite3 program prints them: a line a row, its values with
-// "|" between. The first error ends the run.
+// Prints rows as the sqlite3 program does: a line per row, with "|" between values. The first error
+// ends the run.
 
 #include <MemPoolHeap>
 
@@ -27,16 +26,15 @@ namespace {
 using OBR::MemPool::Heap;
 using OBR::MemPool::HeapSettings;
 
-// Two kinds of blocks: the small ones of the parser and of prepared statements, which come and go
-// with each statement, so that classes often run empty and buckets are kept (at 65535 bytes a
-// bucket thousands of small statements take 1.7 times as long without); and the page cache, whose
-// pages of some 4360 bytes live long: as heap records, at 24 bytes each, they waste less than in
-// buckets. Few blocks live at a time, so that larger buckets are only more memory to touch.
+// SQLite has two kinds of blocks. The small ones of the parser and of prepared statements live as
+// long as a statement, so size classes often run empty, and empty buckets are kept. The pages of
+// the page cache, some 4360 bytes each, live long; as heap records they waste less memory than in
+// buckets. Few blocks live at a time, so larger buckets would not help.
 HeapSettings Settings(bool on) {
     return HeapSettings().On(on).BucketSize(4010).MaxRecordSize(1000).KeepEmptyBuckets(true);
 }
 
-// SQLite hands no context to these calls: there is one memory for the process.
+// SQLite passes no context to these functions, so the process has one heap.
 Heap* memory = nullptr;
 
 sqlite3_mem_methods Methods() {
@@ -87,7 +85,7 @@ bool RunSql(sqlite3* database, const std::string& file, const std::string& sql) 
             return Fail(database, file, sql, position);
         }
         while (sqlite3_step(statement) == SQLITE_ROW) { PrintRow(statement); }
-        // What step says of an error, finalize says again; of no statement, nothing.
+        // Repeats an error of sqlite3_step. Accepts a null statement.
         if (sqlite3_finalize(statement) != SQLITE_OK) {
             return Fail(database, file, sql, position);
         }
@@ -132,14 +130,14 @@ int Main(int argc, char** argv) {
     Options options;
     CLI::App app("Runs an SQL file with SQLite's memory in a pool.", "SqliteHost");
     app.add_option("FILE", options.file, "SQL statements")->required();
-    app.add_option("--database", options.database, "The database file")->capture_default_str();
-    app.add_flag("--heap", options.useMalloc, "The C library's malloc in place of pools");
-    app.add_flag("--off", options.off, "Pools off: each block by itself, for a memory checker");
+    app.add_option("--database", options.database, "Database file")->capture_default_str();
+    app.add_flag("--heap", options.useMalloc, "Use the C library's malloc instead of pools");
+    app.add_flag("--off", options.off, "Disable pools, so that a memory checker sees each block");
     app.add_flag("--report", options.report, "Print the pool at the end");
     CLI11_PARSE(app, argc, argv);
 
     std::unique_ptr<Heap> heap;
-    sqlite3_config(SQLITE_CONFIG_MEMSTATUS, 0);  // Its own books would be a second set.
+    sqlite3_config(SQLITE_CONFIG_MEMSTATUS, 0);  // SQLite then keeps no statistics of its own.
     if (!options.useMalloc) {
         heap = std::make_unique<Heap>("sqlite", Settings(!options.off));
         memory = heap.get();

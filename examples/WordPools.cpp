@@ -1,8 +1,7 @@
-// Counts the words of texts, as a first real host of the pools. Each text has a pool named after
-// its file, in which every line and every distinct word is a block of its own: short ones become
-// records of buckets, long ones heap records. All texts live together until they are reported, and
-// then each is dropped: with one Clear, or with pools off block by block. How long that took and
-// how much memory it needed is the last line.
+// Counts the words of texts. Each text has a pool, named after its file, in which every line and
+// every distinct word is a block: a record of a bucket, or a heap record if it is long. All texts
+// live until they have been reported, and then each is dropped: with one Clear, or block by block
+// if pools are off. The last line of the output has the times and the memory that this took.
 
 #include <MemPool>
 
@@ -37,8 +36,8 @@ using OBR::MemPool::Mgr;
 
 constexpr std::size_t maxBlock = 1073741823;  // Mgr::Alloc stops the process above this.
 
-// Letters, digits, and all bytes above 127, so that words in UTF-8 stay whole. Not the process's
-// locale: the same text gives the same words everywhere.
+// Letters, digits, and all bytes above 127, so that words in UTF-8 stay whole. Ignores the locale,
+// so that a text has the same words everywhere.
 bool IsWordByte(unsigned char byte) {
     return (byte >= 'a' && byte <= 'z') || (byte >= 'A' && byte <= 'Z') ||
            (byte >= '0' && byte <= '9') || byte > 127;
@@ -48,8 +47,7 @@ char ToSmall(char letter) {
     return letter >= 'A' && letter <= 'Z' ? static_cast<char>(letter - 'A' + 'a') : letter;
 }
 
-// What a host keeps of a text: it finds its lines and its words again, whichever memory they are
-// in.
+// A text in memory: its lines, and how often each word occurs.
 class Text {
 public:
     using WordCount = std::pair<std::string_view, std::size_t>;
@@ -74,7 +72,7 @@ public:
         if (input.bad()) { throw std::runtime_error(std::strerror(errno)); }
     }
 
-    // The `n` most frequent words, equally frequent ones in the order of their bytes.
+    // The `n` most frequent words; equally frequent ones are sorted by their bytes.
     std::vector<WordCount> TopWords(std::size_t n) const {
         std::vector<WordCount> top(std::min(n, counts.size()));
         std::partial_sort_copy(counts.begin(), counts.end(), top.begin(), top.end(),
@@ -87,7 +85,7 @@ public:
         return top;
     }
 
-    // A disabled pool keeps no books: its Clear frees nothing, and each block goes back by itself.
+    // The Clear of a disabled pool frees nothing, so each block must be freed.
     void Drop() {
         if (pool.IsEnabled()) {
             pool.Clear();
@@ -157,8 +155,7 @@ void ReadFile(Text& text, const std::string& file, Progress& progress) {
     text.Read(input, progress);
 }
 
-// Returns whether the file could be read. One that could not leaves no text, and the next ones have
-// their turn.
+// Returns whether the file could be read. If it could not, there is no text of it.
 bool AddText(std::deque<Text>& texts, const std::string& file, Progress& progress) {
     const auto refuse = [&, numBefore = texts.size()](const char* reason) {
         if (texts.size() > numBefore) { texts.pop_back(); }
@@ -183,7 +180,7 @@ void PrintWords(const Text& text, std::size_t top) {
     std::cout << '\n';
 }
 
-// One line a pool, in the order of the names, from the library's own list of pools.
+// Prints a line per pool, sorted by name, from the library's list of pools.
 void PrintPools(const std::deque<Text>& texts) {
     std::vector<Mgr*> mgrs;
     OBR::MemPool::GetMgrs(mgrs);
@@ -198,7 +195,7 @@ void PrintPools(const std::deque<Text>& texts) {
     std::cout << '\n';
 }
 
-// Processor time, so that neither others on the machine nor a slow input count.
+// Processor time, which other processes and slow input do not affect.
 template <typename Work>
 double Seconds(Work work) {
     const std::clock_t start = std::clock();
@@ -206,7 +203,7 @@ double Seconds(Work work) {
     return static_cast<double>(std::clock() - start) / CLOCKS_PER_SEC;
 }
 
-// The largest part of this process that was ever in memory, in KiB, as the system counts it.
+// The peak resident memory of this process in KiB.
 long PeakResident() {
     rusage usage = {};
     getrusage(RUSAGE_SELF, &usage);
@@ -232,7 +229,7 @@ void PrintTexts(const std::deque<Text>& texts, const Options& options) {
     }
 }
 
-// Returns whether all went well.
+// Returns whether all files could be read and the output written.
 bool CountAll(const Options& options) {
     OBR::MemPool::NUV_OBR_MEMPOOL_ON(!options.heap);
     std::deque<Text> texts;  // A deque: a handle stays at its address.
@@ -266,11 +263,10 @@ constexpr const char* description =
     R"(Counts the words of texts, with every line and distinct word in a pool named after its file.
 A word is a run of letters, digits and bytes above 127; capitals count as small letters.
 
-The last line tells how long it took to read the texts and to drop them again, in processor time,
-and the largest part of the program that was in memory.
+The last line of the output has the processor time to read and to drop the texts, and the peak of
+resident memory.
 
-A text that cannot be read is told on the standard error stream, and the others are counted all the
-same; the exit status is then 1.)";
+A text that cannot be read is reported on standard error and left out. The exit status is then 1.)";
 
 int Run(int argc, char** argv) {
     CLI::App app(description, "WordPools");
@@ -278,18 +274,17 @@ int Run(int argc, char** argv) {
     app.add_option("FILE", options.files, "Texts to read; - is the standard input")
         ->required()
         ->type_name("");
-    auto* const top =
-        app.add_option("--top", options.top, "How many of the most frequent words to print")
-            ->check(CLI::Range(0, 1000000))
-            ->type_name("N")
-            ->capture_default_str();
-    app.add_flag("--heap", options.heap, "Turn the pools off: every block comes from the heap");
-    auto* const report =
-        app.add_flag("--report", options.report, "Report the pools with all their buckets");
+    auto* const top = app.add_option("--top", options.top, "Print the N most frequent words")
+                          ->check(CLI::Range(0, 1000000))
+                          ->type_name("N")
+                          ->capture_default_str();
+    app.add_flag("--heap", options.heap, "Disable pools, so that every block comes from the heap");
+    auto* const report = app.add_flag("--report", options.report, "Print the report of each pool");
     auto* const detailed =
-        app.add_flag("--detailed", options.detailed, "Report every record of the pools, too");
+        app.add_flag("--detailed", options.detailed,
+                     "Print the detailed report of each pool, with every record");
     app.add_flag("--figures", options.figures,
-                 "Print nothing but seconds to read, seconds to drop and KiB at the peak")
+                 "Print only seconds to read, seconds to drop, and KiB at the peak")
         ->excludes(top, report, detailed);
     try {
         app.parse(argc, argv);

@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
-# Compares the binary interface of the shared library, names and types of what it exports, with that
-# of the last release, or before the first one with what is to be it: tests/abi/libObrMemPool.abi. A
-# release that changes it takes another SONAME. OBR_MEMPOOL_APPROVE=1 records the present one.
+# Compares the binary interface of the shared library, the names and types that it exports, with the
+# recorded one, tests/abi/libObrMemPool.abi. A release that changes the interface needs a new SONAME.
+# OBR_MEMPOOL_APPROVE=1 records the present interface.
 # shellcheck source=scripts/build.sh
 source "$(dirname "$0")/build.sh"
 
@@ -16,7 +16,7 @@ if ! { cmake -S . -B build/abi -G Ninja -DCMAKE_BUILD_TYPE=RelWithDebInfo -DCMAK
     cat build/abi.log
     exit 1
 fi
-# Sources have the same names in every build folder.
+# The paths in the record do not depend on the build folder.
 abidw --headers-dir include --drop-private-types --exported-interfaces-only --drop-undefined-syms \
     --suppressions tests/abi/own.abignore --no-corpus-path --no-comp-dir-path --no-show-locs \
     --no-elf-needed --no-architecture --no-parameter-names build/abi/libObrMemPool.so.1 |
@@ -24,9 +24,9 @@ abidw --headers-dir include --drop-private-types --exported-interfaces-only --dr
 if [ -n "${OBR_MEMPOOL_APPROVE:-}" ]; then
     cp build/abi/present.abi "$recorded"
 fi
-# A record that has lost what it is about would agree with anything.
+# An empty record would agree with anything.
 for name in _ZN3OBR7MemPool3Mgr5AllocEj _ZN3OBR7MemPool7GetMgrsERNS_6vector; do
     grep -q "mangled-name='$name" "$recorded"
 done
 abidiff "$recorded" build/abi/present.abi
-echo "The interface is that of $recorded"
+echo "The interface agrees with $recorded"

@@ -1,12 +1,12 @@
 # shellcheck shell=bash
-# For the other scripts, which source it: steps told one at a time, and a preset built.
+# For the other scripts, which source this file: prints steps and builds presets.
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/.."
 
 step() { printf '\n== %s\n' "$*"; }
 
-# build PRESET [TARGET...]: configures, which finds what has been installed since, and builds what has
-# changed. The output is shown only if that fails. What the preset leaves open is added to `options`.
+# build PRESET [TARGET...]: configures and builds, with more options for cmake in the array `options`.
+# Shows the output only if that fails.
 options=()
 build() {
     local preset=$1 log
@@ -22,9 +22,9 @@ build() {
     rm -f "$log"
 }
 
-# The targets whose tests are the library's own, without those of examples and tools, and the names of
+# The targets with tests of the library itself, not of examples and tools, and a pattern for the names of
 # these tests.
-# shellcheck disable=SC2034  # Used by those who source this.
+# shellcheck disable=SC2034  # Used by the scripts that source this one.
 coreTests=({Record,Pool,Mgr,Trace,Report,Heap,HeapContainer,Vector,Process,Settings,Load,PoolsCorpus}Test StaticHost)
 # shellcheck disable=SC2034
 coreNames="^($(IFS='|' && echo "${coreTests[*]}"))(\\.|\$)"

@@ -1,12 +1,12 @@
 #!/usr/bin/env bash
-# Each program that the README shows is a file, which is compiled: a block of C++ stands behind a
-# line "<!-- FILE -->" and is that file without its opening comment.
+# Checks that each program in the README is an example, which the build compiles. A line "<!-- FILE -->"
+# precedes each block of C++, and the block is FILE without its first comment.
 set -euo pipefail
 cd "$(dirname "$0")/.."
 
 mapfile -t files < <(sed -n 's/^<!-- \(examples\/.*\.cpp\) -->$/\1/p' README.md)
 if [ "$(grep -c '^```cpp$' README.md)" -ne "${#files[@]}" ]; then
-    echo "README.md: a block of C++ does not say which file it is." >&2
+    echo "README.md: a block of C++ has no line that names its file." >&2
     exit 1
 fi
 for file in "${files[@]}"; do

@@ -1,14 +1,13 @@
 #!/usr/bin/env bash
-# Tells what of the library and of both headers the library's own tests reach: lines and branches a
-# file, and in build/coverage/report.html line by line. docs/coverage.md tells why the rest is not
-# reached. Branches that only an exception takes are not counted: for all that the compiler knows at
-# that point any call can throw.
+# Prints the lines and branches of the library and its headers that the library's tests reach, per file,
+# and writes build/coverage/report.html with each line. docs/coverage.md explains what is not reached.
+# Branches that only an exception takes are not counted, since the compiler assumes one at any call.
 # shellcheck source=scripts/build.sh
 source "$(dirname "$0")/build.sh"
 
 step "Packages"
 scripts/install-packages.sh build coverage
-# Counts of another build do not fit the new objects.
+# Remove the counts of an earlier build.
 if [ -d build/coverage ]; then find build/coverage -name '*.gcda' -delete; fi
 options=(-DOBR_MEMPOOL_TESTS=ON)
 build coverage "${coreTests[@]}"

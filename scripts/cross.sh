@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
-# Builds the library for other processors and runs its own tests there, under qemu: cross.sh
-# [PRESET...], aarch64 and riscv64 if not said. Two tests that start a program are left out, since a
-# program under qemu starts no other without the system's help.
+# Builds the library for other processors and runs its tests there, under qemu. Usage: cross.sh
+# [PRESET...], by default aarch64 and riscv64. Leaves out two tests that start a program, which does not
+# work under qemu unless the system is set up for it.
 # shellcheck source=scripts/build.sh
 source "$(dirname "$0")/build.sh"
 

@@ -1,7 +1,6 @@
-# Reads runs, a line each: "on" or "off", then seconds to read, seconds to drop, KiB at the peak.
-# Prints the medians of both sides as a table, and what they say in one sentence. A difference counts
-# where all runs of one side, two or more, are below all of the other, and where it does not round to
-# nothing.
+# Reads a line per run: "on" or "off", seconds to read, seconds to drop, KiB at the peak. Prints a table of
+# the medians and a sentence. A difference counts if all runs of one side are below all runs of the other,
+# there are two or more per side, and it does not round to 0 %.
 
 {
     ++runs[$1]
@@ -55,7 +54,7 @@ function median(side, field,    n) {
     return (values[side, field, int((n + 1) / 2)] + values[side, field, int(n / 2) + 1]) / 2
 }
 
-# In a unit that suits the greatness of `guide`.
+# `value` in a unit that suits the size of `guide`.
 function amount(value, guide, field) {
     if (field == 4) { return sprintf("%.1f MiB", value / 1024) }
     if (guide >= 1) { return sprintf("%.2f s", value) }

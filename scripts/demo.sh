@@ -1,11 +1,11 @@
 #!/usr/bin/env bash
-# Builds the library and shows what its first host, WordPools, gains from it. With pools on and off,
-# in turns, WordPools counts the words of the files given, or of a text that is made of those on
-# this machine; then both stand side by side. In the end `mempool run` tells of a program that knows
-# nothing of pools, Perl, whether it would gain from them.
+# Builds the library and shows what a program, WordPools, gains from it. WordPools counts the words of the
+# given files, or of a text made of files on this machine, in turns with pools on and off. The script shows
+# its report and compares time and memory. Then `mempool run` shows whether Perl, which does not use pools,
+# would gain from them.
 #
-# DEMO_MEGABYTES (100) is the size of the text, DEMO_ROUNDS (5) how often each side runs. The text and
-# the report stay in build/demo.
+# DEMO_MEGABYTES (100) is the size of the text, DEMO_ROUNDS (5) the runs per side. The text and the report stay in
+# build/demo.
 if [[ ${1:-} == -h || ${1:-} == --help ]]; then
     echo "usage: scripts/demo.sh [FILE...]   (- is the standard input)"
     exit
@@ -30,11 +30,11 @@ texts() {
         xargs --null cat
 }
 
-# Writes $text, as often over as it takes, unless it is there from the last time.
+# Writes $text, repeating its sources if they are too short. Keeps one of the right size.
 make_text() {
     local wanted=$((megabytes * 1000000))
     if [ "$(stat --format=%s "$text" 2>/dev/null)" = "$wanted" ]; then return; fi
-    step "A text of $megabytes MB, from those under /usr/share, /usr/include and /usr/lib"
+    step "Gather $megabytes MB of text from /usr/share, /usr/include and /usr/lib"
     : >"$scratch/once"
     { texts 2>/dev/null || true; } | head --bytes="$wanted" >"$scratch/once" &
     while kill -0 $! 2>/dev/null; do
@@ -43,13 +43,13 @@ make_text() {
     done
     progress
     wait $!
-    if [ ! -s "$scratch/once" ]; then echo "There is no text under /usr." >&2 && exit 1; fi
+    if [ ! -s "$scratch/once" ]; then echo "demo.sh: no text found below /usr" >&2 && exit 1; fi
     while cat "$scratch/once"; do :; done 2>/dev/null | head --bytes="$wanted" >"$scratch/text"
     mv "$scratch/text" "$text"
-    echo "It stays in $text for the next time."
+    echo "The next run uses it again: $text"
 }
 
-# What cannot be read is told and left out; what can be read only once is copied.
+# Files that cannot be read are reported and left out. Pipes are copied, since each run reads its input again.
 status=0 files=()
 for file in "$@"; do
     case $file in
@@ -74,8 +74,8 @@ if [ $# -eq 0 ]; then
     files=("$text")
 fi
 
-# This also brings the files into the memory of the system, before any clock runs.
-step "The report of the pools, from its start; $report has all of it"
+# This also loads the files into the page cache before anything is timed.
+step "Start of the report of the pools; the whole report is $report"
 "$program" --report "${files[@]}" >"$report"
 head -n 40 "$report"
 
@@ -94,13 +94,13 @@ for ((round = 1; round <= rounds; ++round)); do
 done
 
 if [ "$rounds" -gt 1 ]; then
-    step "Medians of $rounds rounds; about the same is what the runs do not agree on"
+    step "Medians of $rounds rounds; \"about the same\" means that the runs overlap"
 else
-    step "One round, which shows no difference that another would bear out"
+    step "One round, too few to show a difference"
 fi
 awk -f scripts/demo-table.awk "$scratch/figures"
 
-step "mempool run perl: the distinct words again, by a program that knows nothing of pools"
+step "mempool run perl: the distinct words again, by a program that does not use pools"
 cat -- "${files[@]}" | head --bytes=3000000 >"$scratch/start" || true
 # shellcheck disable=SC2016  # The variables are Perl's.
 build/release/tools/mempool/mempool run --seconds 10 \

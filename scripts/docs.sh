@@ -1,5 +1,5 @@
 #!/usr/bin/env bash
-# Writes the reference of both headers, HTML, into build/docs. A declaration without a comment, or a
+# Writes the HTML reference of the public headers to build/docs. A declaration without a comment, or a
 # comment that doxygen does not understand, is an error.
 # shellcheck source=scripts/build.sh
 source "$(dirname "$0")/build.sh"
@@ -16,6 +16,6 @@ export VERSION BRIEF
 doxygen docs/Doxyfile
 for class in Mgr Heap HeapSettings HeapStats Resource Allocator; do
     [ -n "$(find build/docs/html -name "*1_1${class}.html")" ] ||
-        { echo "The reference has no page of $class." >&2; exit 1; }
+        { echo "The reference has no page for $class." >&2; exit 1; }
 done
 echo "build/docs/html/index.html"

@@ -1,8 +1,7 @@
 #!/usr/bin/env bash
-# Fuzzes the library and the readers of traces: fuzz.sh [MINUTES [TARGET...]]. The minutes, 10 if not
-# said, are shared by the targets, Pools and Traces. What libFuzzer learns is kept in build/fuzz and
-# built on by the next run. Ends with the number of inputs tried and of findings, each with the
-# command that runs it again, and fails if there is one.
+# Fuzzes the library and the readers of traces. Usage: fuzz.sh [MINUTES [TARGET...]]. The targets, Pools
+# and Traces, share the minutes, by default 10. The next run continues from the inputs that libFuzzer
+# keeps in build/fuzz. Prints each finding with the command that repeats it, and fails if there is one.
 # shellcheck source=scripts/build.sh
 source "$(dirname "$0")/build.sh"
 
@@ -25,8 +24,8 @@ for target in "${targets[@]}"; do
     log=$folder/$target.log
     mkdir -p "$corpus"
     step "Fuzz $target"
-    # A finding ends libFuzzer. It goes on from there as long as there is time, but for the same
-    # fault again and again.
+    # libFuzzer stops at a finding. Start it again while there is time, but not more than five times,
+    # in case it finds the same fault.
     deadline=$((SECONDS + minutes * 60 / ${#targets[@]}))
     number=0
     tried=0
@@ -38,10 +37,10 @@ for target in "${targets[@]}"; do
         $found || break
         number=$((number + 1))
         grep -aE -m 3 'Failure|ERROR: |runtime error:' "$log" || tail -n 20 "$log"
-        echo "To run it again: $program $(sed -n 's/.*Test unit written to //p' "$log")"
+        echo "Repeat it with: $program $(sed -n 's/.*Test unit written to //p' "$log")"
     done
     numFindings=$((numFindings + number))
-    summary+=("$target: $tried inputs tried, $(find "$corpus" -type f | wc -l) of them kept, $number findings")
+    summary+=("$target: $tried inputs tried, $(find "$corpus" -type f | wc -l) kept, $number findings")
 done
 
 step "Summary"

@@ -1,7 +1,8 @@
 #!/usr/bin/env bash
-# Installs the Debian packages that the named jobs need and that are missing: build, tools, test, lint,
-# package, docs, abi, bench, fuzz, cross and coverage, in any number. Without the right to install it
-# prints the command that would, and fails.
+# Installs the missing Debian packages for the given jobs: build, tools, test, lint, package, docs, abi,
+# bench, fuzz, cross, coverage. Without root rights it prints the command that installs them, and fails.
+# `test` is the largest job: some 300 packages on a bare Debian, 400 MB to download and 1.7 GB on disk.
+# Chromium, for the test of the report's page, takes 290 MB of that.
 set -euo pipefail
 
 packages=()

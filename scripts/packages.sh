@@ -1,8 +1,8 @@
 #!/usr/bin/env bash
-# Makes the Debian packages, as Debian builds its own, in build/packages; twice, in two folders, to
-# see that both times the same comes out; lets lintian judge them; and installs them in a bare Debian
-# of their own, where foreign hosts are built with them and run. That needs root; without it they are
-# only unpacked, and gdb is not tried.
+# Builds the Debian packages in build/packages, with Debian's own compiler flags. Builds them in a second
+# folder too, to check that they are reproducible; runs lintian; and installs them in a bare Debian below
+# build/packages, where it builds and runs programs that use them. That needs root rights. Without them it
+# unpacks the packages here, and does not test gdb.
 # shellcheck source=scripts/build.sh
 source "$(dirname "$0")/build.sh"
 
@@ -12,8 +12,8 @@ top=$PWD/build/packages
 root=$top/root
 mkdir -p "$top"
 
-# The bare Debian has what the hosts and the tools need. It takes a minute, which the builds share,
-# and stays for the next time.
+# The bare Debian has what the programs and the tools need. It is made while the packages are built, and
+# kept for the next run.
 inRoot=(g++ clang cmake make pkg-config gdb libdw1)
 isBare=true
 [ "$(id -u)" -eq 0 ] || isBare=false
@@ -28,8 +28,8 @@ if $isBare && [ "$(cat "$top/root.made" 2>/dev/null)" != "${inRoot[*]}" ]; then
     ) &
 fi
 
-# in_folder NAME COMMAND...: in that folder, with the flags by which Debian builds. What the command
-# tells is shown only if it fails.
+# in_folder NAME COMMAND...: runs the command in that folder with Debian's compiler flags. Shows its output
+# only if it fails.
 SOURCE_DATE_EPOCH=$(git log -1 --format=%ct)
 export SOURCE_DATE_EPOCH
 in_folder() (
@@ -42,7 +42,7 @@ in_folder() (
     "$@" >"$PWD.log" 2>&1 || { cat "$PWD.log"; exit 1; }
 )
 
-# make_packages NAME: in a folder of that name, of what git tracks here.
+# make_packages NAME: builds the packages in a folder of that name, from the files that git tracks.
 make_packages() {
     step "Build in $1"
     rm -rf "${top:?}/$1"
@@ -62,7 +62,7 @@ in_folder one ctest --test-dir build/tests -j 2 --output-on-failure --no-tests=e
     --exclude-regex 'Consumer|Gdb|Parts'
 tail -n 3 "$top/one.log"
 
-step "Twice the same"
+step "Reproducible"
 packages=("$top"/one/build/package/*.deb)
 [ ${#packages[@]} -eq 3 ]
 for package in "${packages[@]}"; do
@@ -71,8 +71,8 @@ for package in "${packages[@]}"; do
 done
 (cd "$top" && sha256sum ./*.deb)
 
-step "Nothing is left out"
-# An install rule without a component is in no package.
+step "Complete"
+# No package has the files of an install rule without a component.
 cd "$top/one/build/package"
 DESTDIR=$top/whole cmake --install . >/dev/null
 diff <(cd "$top/whole" && find . ! -type d | sort) \
@@ -82,18 +82,18 @@ rm -rf "$top/whole"
 cd - >/dev/null
 
 step "Lintian"
-# What is known of its findings is told in cmake/lintian. Root may run it, which it does not like.
+# cmake/lintian has the known findings. Standard error has only a warning that root runs it.
 lintian --fail-on error,warning --tag-display-limit 0 "${packages[@]}" 2>/dev/null
 
 wait
 if $isBare && [ ! -f "$top/root.made" ]; then
     cat "$top/root.log"
-    echo "No bare Debian could be made."
+    echo "The bare Debian could not be made."
     isBare=false
 fi
 hosts=$top/hosts
 if $isBare; then
-    step "Hosts on the packages installed in a bare Debian"
+    step "Programs with the packages, in a bare Debian"
     hosts=$root/hosts
 fi
 rm -rf "$hosts"
@@ -104,7 +104,7 @@ cp -r tests/consumer "$hosts/tests"
 cp -r examples "$hosts"
 if $isBare; then
     cp "${packages[@]}" "$hosts"
-    # A failure may leave something behind there: it is made anew then. Its mounts go with the shell.
+    # After a failure the bare Debian is made again. Its mounts end with the shell.
     rm "$top/root.made"
     in_root() { timeout 600 unshare --mount sh -c "mount -t proc proc '$root/proc' &&
         exec env -i PATH=/usr/sbin:/usr/bin:/sbin:/bin chroot '$root' sh -euc '$1'"; }
@@ -115,7 +115,7 @@ if $isBare; then
         [ -z "$left" ] || { echo "Left behind: $left"; exit 1; }'
     echo "${inRoot[*]}" >"$top/root.made"
 else
-    step "Hosts on the packages, unpacked only"
+    step "Programs with the packages, unpacked only"
     for package in "${packages[@]}"; do dpkg-deb --extract "$package" "$hosts/unpacked"; done
     library=$hosts/unpacked/usr/lib/$(dpkg-architecture -qDEB_HOST_MULTIARCH)
     cd "$hosts"

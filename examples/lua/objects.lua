@@ -1,5 +1,4 @@
--- Objects with methods, made of smaller ones, made and dropped a generation at a time, as a
--- simulator does.
+-- Like a simulator: creates and drops generations of objects that contain smaller objects.
 local scale = tonumber(os.getenv("SCALE") or 1)
 
 local Particle = {}

@@ -1,4 +1,4 @@
--- Texts: words cut out, joined, counted and sorted, as an analysis tool does.
+-- Like an analysis tool: splits, joins, counts and sorts words.
 local scale = tonumber(os.getenv("SCALE") or 1)
 
 local words = {}

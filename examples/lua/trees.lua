@@ -1,5 +1,4 @@
--- Trees of nodes with named fields, many small and short-lived beside a large one that stays, as a
--- compiler has them.
+-- Like a compiler: builds many small, short-lived trees next to a large one that stays.
 local depth = math.floor(15 + math.log(tonumber(os.getenv("SCALE") or 1), 2))
 
 local function build(level)

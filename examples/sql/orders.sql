@@ -1,4 +1,4 @@
--- A small shop: many rows, indexes, joins, groups and texts, in the memory of one process.
+-- A small shop: many rows, indexes, joins, groups and texts.
 CREATE TABLE customer(id INTEGER PRIMARY KEY, name TEXT, city TEXT);
 CREATE TABLE purchase(id INTEGER PRIMARY KEY, customer INT, item TEXT, price REAL, day INT);
 BEGIN;
