@@ -34,17 +34,10 @@ HeapSettings Settings(bool on) {
     return HeapSettings().On(on).BucketSize(65535).MaxRecordSize(1000).KeepEmptyBuckets(true);
 }
 
-// Lua's one call for all: a `size` of 0 releases, no `block` allocates, anything else resizes. Null
-// makes Lua collect garbage, try again, and at last raise its own "not enough memory". No exception
-// crosses its frames: these operations of a heap throw none.
+// Lua's one call for all. Null makes Lua collect garbage, try again, and at last raise its own "not
+// enough memory". No exception crosses its frames.
 void* FromHeap(void* heap, void* block, std::size_t oldSize, std::size_t size) {
-    auto& pool = *static_cast<Heap*>(heap);
-    if (block == nullptr) { return size == 0 ? nullptr : pool.Malloc(size); }
-    if (size == 0) {
-        pool.Deallocate(block, oldSize);
-        return nullptr;
-    }
-    return pool.Realloc(block, size);
+    return static_cast<Heap*>(heap)->Call(block, oldSize, size);
 }
 
 void* FromMalloc(void*, void* block, std::size_t, std::size_t size) {

@@ -113,6 +113,7 @@ TEST_F(HeapTest, RefusesWhatIsTooMuch) {
         for (const std::size_t size : {Heap::MaxSize() + 1, std::size_t{1} << 32, most - 6, most}) {
             EXPECT_EQ(heap.Malloc(size), nullptr);
             EXPECT_EQ(heap.Calloc(size / 2 + 1, 2), nullptr);
+            EXPECT_EQ(heap.Calloc(2, size / 2 + 1), nullptr);
             EXPECT_THROW(heap.Allocate(size, 4), std::bad_alloc);
             EXPECT_THROW(Allocator<int>(heap).allocate(size / 4 + 1), std::bad_alloc);
         }
@@ -137,6 +138,7 @@ TEST_F(HeapTest, PassesOverNullAndForeignPointers) {
             EXPECT_EQ(heap.UsableSize(foreign), 0);
             EXPECT_EQ(heap.Realloc(foreign, 5) == nullptr, foreign != nullptr);
         }
+        EXPECT_EQ(heap.Call(nullptr, 8, 0), nullptr);
         EXPECT_EQ(NumBlocks(heap), 2);
         EXPECT_EQ(NumBlocks(other), 1);
         EXPECT_EQ(heap.Realloc(block, 0), nullptr);

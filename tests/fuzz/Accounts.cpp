@@ -54,11 +54,8 @@ void Account::Check(bool thoroughly) const {
         ASSERT_EQ(data + block.usable, start + size);
         if (!isOfHeap) { ASSERT_EQ(data, start); }
         // No more is taken than alignment and the smallest size class explain.
-        const std::size_t least = std::max<std::size_t>(block.size, 1);
-        const std::size_t most =
-            block.alignment < 8 ? least : (least + 7) / 8 * 8 + block.alignment - 4;
         const std::size_t rounded =
-            (most + pool->dataAlignment - 1) / pool->dataAlignment * pool->dataAlignment;
+            (block.most + pool->dataAlignment - 1) / pool->dataAlignment * pool->dataAlignment;
         ASSERT_LE(size, std::max<std::size_t>(rounded, pool->minRecordSize + pool->dataAlignment));
     }
 }

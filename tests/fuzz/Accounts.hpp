@@ -26,6 +26,8 @@ struct Block {
     std::size_t alignment;  // Of a block of a Heap, else 1.
     std::size_t usable;     // As the pool says. All of these bytes are filled.
     std::uint8_t fill;
+    std::size_t capacity;  // What Realloc leaves in place: `usable`, or more in a heap that is off.
+    std::size_t most;      // The pool may have been asked for this many bytes.
 };
 using Live = std::map<std::uint8_t*, Block>;
 

@@ -14,6 +14,28 @@ namespace Fuzz {
 
 using namespace OBR::MemPool;
 
+namespace {
+
+// What a pool is asked for at most for a block of a heap.
+std::size_t MostFor(std::size_t size, std::size_t alignment) {
+    const std::size_t least = std::max<std::size_t>(size, 1);
+    return alignment < 8 ? least : (least + 7) / 8 * 8 + alignment - 4;
+}
+
+// What an address is aligned to, up to what a heap can be asked for.
+std::size_t AlignmentAt(const void* address) {
+    const auto bits = reinterpret_cast<std::uintptr_t>(address) | 4096;
+    return bits & (0 - bits);
+}
+
+// In a heap that is off, what lies behind a block for the sake of its alignment counts as well.
+std::size_t CapacityOf(const Heap& heap, const void* block) {
+    return heap.GetMgr().IsEnabled() ? heap.UsableSize(block)
+                                     : detail::PlainHeader::Of(block)->Capacity();
+}
+
+}  // namespace
+
 void World::StepOf(HeapPlace& place) {
     if (place.heap == nullptr) { return Build(place); }
     const std::uint32_t choice = bytes.Byte();
@@ -57,8 +79,10 @@ void World::Build(HeapPlace& place) {
     const bool isOn = (said & 16) != 0 || NUV_OBR_MEMPOOL_ON();
     settings.On(isOn);
     if ((said & 32) != 0) { settings.KeepEmptyBuckets((said & 64) != 0); }
+    place.alignment = (said & 128) != 0 ? std::size_t{1} << bytes.Below(14) : 8;
+    settings.Alignment(place.alignment);
 
-    const bool isTooLarge = sizes.alignment > 65532;
+    const bool isWrong = sizes.alignment > 65532 || place.alignment < 8 || place.alignment > 4096;
     sizes.alignment = std::max((sizes.alignment + 3) / 4 * 4, 4u);
     // A name whose pool has lost its handle is not seen, and would end the process.
     if (accounts.IsTaken(name) && GetMgr(name) == nullptr) { return; }
@@ -69,7 +93,7 @@ void World::Build(HeapPlace& place) {
         } catch (const std::invalid_argument&) { isRefused = true; }
     });
     if (!succeeds) { return; }
-    EXPECT_EQ(isRefused, isTooLarge || !sizes.CanMakePool() || accounts.IsTaken(name));
+    EXPECT_EQ(isRefused, isWrong || !sizes.CanMakePool() || accounts.IsTaken(name));
     if (isRefused) { return; }
     place.account = &accounts.Open(place.heap->GetMgr(), true);
     EXPECT_EQ(place.account->pool->enabled, isOn);
@@ -88,9 +112,9 @@ void World::Take(HeapPlace& place) {
     if (!HasRoom()) { return; }
     Heap& heap = *place.heap;
     std::size_t size = Size(*place.account);
-    std::size_t alignment = 8;
-    const std::uint32_t way = bytes.Below(6);
-    if (way == 1 || way == 2) { alignment = std::size_t{1} << bytes.Below(14); }
+    const std::uint32_t way = bytes.Below(8);
+    std::size_t alignment = way == 0 || way == 3 || way >= 6 ? place.alignment : 8;
+    if (way == 1 || way == 2 || way == 4) { alignment = std::size_t{1} << bytes.Below(14); }
     const bool isZero = way == 3;
     if (isZero) { size = size / 3 * 3; }
     if (way == 5) { size = size / sizeof(std::uint64_t) * sizeof(std::uint64_t); }
@@ -108,7 +132,13 @@ void World::Take(HeapPlace& place) {
                 taken = heap.Calloc(3, size / 3);
                 break;
             case 4:
+                taken = heap.Malloc(size, alignment);
+                break;
+            case 6:
                 taken = heap.Realloc(nullptr, size);
+                break;
+            case 7:
+                taken = heap.Call(nullptr, 0, std::max<std::size_t>(size, 1));
                 break;
             case 5:
                 taken = Allocator<std::uint64_t>(heap).allocate(size / sizeof(std::uint64_t));
@@ -127,10 +157,12 @@ void World::Take(HeapPlace& place) {
     if (isZero) { EXPECT_EQ(std::count(data, data + size, 0), static_cast<long>(size)); }
     const std::size_t usable = heap.UsableSize(data);
     if (!place.account->pool->enabled) { EXPECT_EQ(usable, std::max<std::size_t>(size, 1)); }
-    place.account->Add(data, {size, alignment, usable, FillByte(bytes)});
+    place.account->Add(data, {size, alignment, usable, FillByte(bytes), CapacityOf(heap, data),
+                              MostFor(size, alignment)});
 }
 
-// A block stays in place if it has room, and keeps its bytes in any case.
+// A block stays in place if it has room and uses half of it. It keeps bytes and alignment in any
+// case, and fewer bytes are always granted.
 void World::Resize(HeapPlace& place) {
     Account& account = *place.account;
     const auto one = OneBlock(account);
@@ -138,18 +170,37 @@ void World::Resize(HeapPlace& place) {
     std::uint8_t* const data = one->first;
     Block block = one->second;
     const std::size_t size = std::max(Size(account), 1u);
+    const bool enabled = account.pool->enabled;
+    const bool grows = size > block.capacity;
+    const bool isMuchLess = size < block.capacity / 2 && block.capacity > 64;
+    const std::size_t withRoom = block.capacity + block.capacity / 4 * 3;
+    const bool getsRoom = grows && block.capacity >= 1024 && size < withRoom;
     std::uint8_t* moved = nullptr;
+    bool isRefused = false;
     account.ExpectFilled(one);
-    const bool succeeds = Succeeds([&] {
-        moved = static_cast<std::uint8_t*>(place.heap->Realloc(data, size));
-        if (moved == nullptr) { throw std::bad_alloc(); }
+    Succeeds([&] {
+        moved = static_cast<std::uint8_t*>(place.heap->Call(data, block.size, size));
+        isRefused = HeapSpy::refuseIn == 0;
+        if (isRefused) { throw std::bad_alloc(); }
     });
-    if (!succeeds) { return account.ExpectFilled(one); }
-    EXPECT_EQ(moved == data, size <= block.usable);
-    if (moved == data) { return account.ExpectFilled(one); }
-    EXPECT_EQ(std::count(moved, moved + block.usable, block.fill), static_cast<long>(block.usable));
+    if (moved == nullptr) {
+        EXPECT_TRUE(isRefused && grows);
+        return account.ExpectFilled(one);
+    }
+    const std::size_t kept = std::min(size, block.usable);
+    EXPECT_EQ(std::count(moved, moved + kept, block.fill), static_cast<long>(kept));
+    EXPECT_EQ(moved == data, !grows && (!isMuchLess || isRefused));
+    if (moved != data) {
+        block.capacity = getsRoom && !isRefused ? withRoom : size;
+        block.most = MostFor(block.capacity, std::max<std::size_t>(AlignmentAt(data), 8));
+    }
+    block.size = size;
+    block.usable = place.heap->UsableSize(moved);
+    const std::size_t capacity = CapacityOf(*place.heap, moved);
+    EXPECT_GE(capacity, block.capacity);
+    block.capacity = capacity;
+    if (!enabled) { EXPECT_EQ(block.usable, size); }
     account.live.erase(one);
-    block = {size, 8, place.heap->UsableSize(moved), block.fill};
     account.Add(moved, block);
 }
 

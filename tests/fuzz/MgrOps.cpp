@@ -45,7 +45,8 @@ void World::Alloc(Handle& handle) {
     if (!Succeeds([&] { data = handle.mgr->Alloc(size); })) { return; }
     const std::size_t usable = account.pool->enabled ? handle.mgr->GetSize(data) : size;
     if (account.pool->enabled) { EXPECT_EQ(handle.mgr->Contains(data), usable != 0); }
-    account.Add(static_cast<std::uint8_t*>(data), {size, 1, usable, FillByte(bytes)});
+    account.Add(static_cast<std::uint8_t*>(data),
+                {size, 1, usable, FillByte(bytes), usable, std::max(size, 1U)});
 }
 
 void World::Free(Handle& handle) {

@@ -35,6 +35,7 @@ private:
     struct HeapPlace {
         std::unique_ptr<OBR::MemPool::Heap> heap;
         Account* account = nullptr;
+        std::size_t alignment = 8;  // Of blocks that ask for none.
     };
 
     // Settings, handles and names: WorldOps.cpp.
