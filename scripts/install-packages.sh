@@ -10,12 +10,12 @@ for job in "$@"; do
     case $job in
         build) packages+=(g++ cmake ninja-build libcli11-dev) ;;
         tools) packages+=(zlib1g-dev libzstd-dev libdw-dev libfmt-dev nlohmann-json3-dev) ;;
-        test) packages+=(liblua5.4-dev lua5.4 libsqlite3-dev sqlite3 libgmock-dev zlib1g-dev libzstd-dev libdw-dev libfmt-dev nlohmann-json3-dev libjs-d3 chromium chromium-driver python3-selenium python3-pil clang libclang-rt-14-dev binutils pkg-config gdb pandoc python3 valgrind) ;;
+        test) packages+=(liblua5.4-dev lua5.4 libsqlite3-dev sqlite3 libxml2-dev duktape-dev libgmock-dev zlib1g-dev libzstd-dev libdw-dev libfmt-dev nlohmann-json3-dev libjs-d3 chromium chromium-driver python3-selenium python3-pil clang libclang-rt-14-dev binutils pkg-config gdb pandoc python3 valgrind) ;;
         lint) packages+=(git clang-format clang-tidy shellcheck) ;;
         package) packages+=(git dpkg-dev file lintian mmdebstrap) ;;
         docs) packages+=(doxygen) ;;
         abi) packages+=(abigail-tools) ;;
-        bench) packages+=(liblua5.4-dev libsqlite3-dev libbenchmark-dev zlib1g-dev libzstd-dev libmimalloc2.0 libjemalloc2 libtcmalloc-minimal4
+        bench) packages+=(liblua5.4-dev libsqlite3-dev libxml2-dev duktape-dev libmruby-dev libbenchmark-dev libmimalloc-dev zlib1g-dev libzstd-dev libmimalloc2.0 libjemalloc2 libtcmalloc-minimal4
             libboost-dev gnuplot-nox python3) ;;
         cross) packages+=(g++-aarch64-linux-gnu g++-riscv64-linux-gnu qemu-user-static googletest) ;;
         coverage) packages+=(libgmock-dev gcovr) ;;
