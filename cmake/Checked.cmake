@@ -16,8 +16,9 @@ if(MEMPOOL_HAS_CHECKED)
         ${mempoolSources}
         s/diagnostics/checked/Blocks.cpp
         s/diagnostics/checked/Checkers.cpp
-        s/diagnostics/checked/EndStatus.cpp
+        s/diagnostics/checked/Fault.cpp
         s/diagnostics/checked/Variables.cpp
+        s/diagnostics/checked/Use.cpp
         s/diagnostics/checked/Watch.cpp)
     target_compile_definitions(MemPoolCheckedObjects PRIVATE OBR_MEMPOOL_CHECKED)
     find_path(VALGRIND_INCLUDE_DIR valgrind/valgrind.h)

@@ -10,6 +10,7 @@
 #define OBR_MEMPOOL_CHECKED_HPP
 
 #include <cstdint>
+#include <mutex>
 
 #include "MemPool/Bucket.hpp"
 
@@ -32,6 +33,23 @@ inline std::uint32_t BucketSize(std::uint32_t, std::uint32_t recDataSize) {
 inline bool KeepsEmptyBuckets(bool) {
     return false;
 }
+
+// While it lives, an operation of the host's runs on the pool. An operation of another thread at
+// the same time is reported, once for each pool, and waits for this one.
+class Use {
+public:
+    explicit Use(const BucketMgr& bucketMgr);
+
+    // The pool ends. Another one may be built at its address.
+    void IsLast() const;
+
+private:
+    struct Pool;
+    static Pool& Of(const BucketMgr& bucketMgr);
+
+    Pool& pool;
+    std::unique_lock<std::recursive_mutex> lock;
+};
 
 // A block of `size` bytes was taken from the pool. Returns it. If there is no memory for the notes
 // on it, gives it back and throws std::bad_alloc.
@@ -60,6 +78,9 @@ inline std::uint32_t BucketSize(std::uint32_t bucketSize, std::uint32_t) {
 inline bool KeepsEmptyBuckets(bool keeps) {
     return keeps;
 }
+struct Use {
+    explicit Use(const BucketMgr&) {}
+};
 inline void* Taken(BucketMgr&, void* data, std::uint32_t) {
     return data;
 }

@@ -70,14 +70,17 @@ Mgr& Mgr::operator=(const Mgr& other) {
 }
 
 void* Mgr::Alloc(unsigned int size) {
+    const Checked::Use use(*bucketMgr);
     return Checked::Taken(*bucketMgr, bucketMgr->Alloc(size), size);
 }
 
 bool Mgr::Free(void* data) {
+    const Checked::Use use(*bucketMgr);
     return Checked::MayRelease(*bucketMgr, data) && bucketMgr->Free(data);
 }
 
 void Mgr::Clear() {
+    const Checked::Use use(*bucketMgr);
     Checked::BeforeClear(*bucketMgr);
     bucketMgr->Clear();
 }
@@ -87,10 +90,12 @@ bool Mgr::CollectGarbage() {
 }
 
 bool Mgr::Contains(const void* data) const {
+    const Checked::Use use(*bucketMgr);
     return Checked::MayAskAbout(*bucketMgr, data) && bucketMgr->Contains(data);
 }
 
 unsigned int Mgr::GetSize(const void* data) const {
+    const Checked::Use use(*bucketMgr);
     return Checked::MayAskAbout(*bucketMgr, data) ? bucketMgr->GetSize(data) : 0;
 }
 

@@ -52,6 +52,8 @@ def tells(fault, kind):
                                   r"36 bytes before the data \(prev1\)"),
         "underrun 1, large": r"pool nodes: heap record 0x\w{16}: the header is damaged up to 1 byte"
                              r" before the data \(guard\)",
+        "two threads": r"pool nodes: used by two threads at the same time: "
+                       r"(?=.*\(main)(?=.*\(worker)\d+ \(\w+\) and \d+ \(\w+\)\n(?![^=]*used by)",
         "leak": rf"pool nodes: 1 block, {13 + moved} bytes never freed",
         "leak, large": "pool nodes: 1 block, 2001 bytes never freed",
         "exit": rf"pool kept: 1 block, {13 + moved} bytes never freed",
@@ -74,7 +76,7 @@ found = {"asan": {"read after free": "heap-use-after-free", "write after free": 
 # Ordinary memory that is written beyond a block's bucket is the heap's own.
 all_faults = ["none", "none, large", "double free", "double free, large", "wrong pool",
               "wrong pool, large", "inner", "underrun 1", "underrun 1, large", "underrun 40", "leak",
-              "leak, large", "leak at exit"]
+              "leak, large", "leak at exit", "two threads", "threads in turns"]
 faults = {checker: list(dict.fromkeys([*found[checker], *all_faults])) for checker in found}
 
 for checker, host in {"nothing": plain, "asan": sanitized, "valgrind": plain}.items():
@@ -106,7 +108,7 @@ for checker, host in {"nothing": plain, "asan": sanitized, "valgrind": plain}.it
                 mark = "release after " + mark if mark.startswith("underrun") else mark
                 if not fault.startswith("leak"):
                     expect(f"Faulty.cpp:{line_of('at: ' + mark)}" in told, f"{where} the call", told)
-            if checker != "nothing" and (line or problem):
+            if checker != "nothing" and (line or problem) and fault != "two threads":
                 mark = "at: leak at exit" if fault == "exit" else "// taken here"
                 expect(f"Faulty.cpp:{line_of(mark)}" in told, f"{where} where it was taken", told)
 

@@ -5,11 +5,15 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <atomic>
+#include <chrono>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <iostream>
+#include <mutex>
 #include <string>
+#include <thread>
 
 #include <MemPool>
 #include <MemPoolHeap>
@@ -73,6 +77,23 @@ bool Make(const std::string& fault) {
         int status = -1;
         wait(&status);
         if (status != 0) { std::exit(4); }
+    } else if (is("two threads") || is("threads in turns")) {
+        std::mutex turns[2];
+        std::atomic<int> left = 20;
+        const auto work = [&](std::mutex& turn) {
+            {
+                const std::lock_guard<std::mutex> lock(turn);
+                nodes.Give(nodes.Take(size));  // at: two threads
+            }
+            std::this_thread::sleep_for(std::chrono::microseconds(100));
+        };
+        std::thread worker([&] {
+            pthread_setname_np(pthread_self(), "worker");
+            for (; left > 0; --left) { work(turns[is("two threads")]); }
+        });
+        while (left > 0) { work(turns[0]); }
+        worker.join();
+        return nodes.Give(block);
     } else if (is("ends with 3")) {
         std::exit(3);
     } else if (is("heap leak")) {

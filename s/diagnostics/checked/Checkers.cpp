@@ -25,7 +25,7 @@ namespace {
 
 #ifdef OBR_KNOWS_VALGRIND
 void ValgrindStack() {
-    if (RUNNING_ON_VALGRIND) { VALGRIND_PRINTF_BACKTRACE("found\n"); }
+    if (RUNNING_ON_VALGRIND) { VALGRIND_PRINTF_BACKTRACE("reported here\n"); }
 }
 void ValgrindHistory(const void* address) {
     const std::string command = "v.info location " + PtrText(address);

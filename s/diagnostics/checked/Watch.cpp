@@ -6,7 +6,6 @@
 // recursive: a trace line can run code of the host, its stream's, which may use a pool.
 
 #include <algorithm>
-#include <cstdio>
 #include <cstdlib>
 #include <map>
 #include <mutex>
@@ -16,7 +15,7 @@
 #include "MemPool/Checked.hpp"
 #include "diagnostics/checked/Blocks.hpp"
 #include "diagnostics/checked/Checkers.hpp"
-#include "diagnostics/checked/EndStatus.hpp"
+#include "diagnostics/checked/Fault.hpp"
 #include "diagnostics/checked/Variables.hpp"
 #include "diagnostics/text/Text.hpp"
 #include "diagnostics/text/TraceLine.hpp"
@@ -35,13 +34,6 @@ using Lock = std::lock_guard<std::recursive_mutex>;
 Blocks& blocks = *new Blocks;
 
 bool hasReportedAtExit = false;  // What lives.
-
-void Report(const BucketMgr& pool, const std::string& what) {
-    const std::string line = "mempool: pool " + pool.name + ": " + what + "\n";
-    std::fputs(line.c_str(), stderr);
-    std::fflush(stderr);
-    EndStatus::NoteFault();
-}
 
 std::string Count(std::size_t count, const std::string& unit) {
     return std::to_string(count) + " " + unit + (count == 1 ? "" : "s");
@@ -214,9 +206,11 @@ void BeforeClear(const BucketMgr& pool) {
 }
 
 void BeforeEnd(const BucketMgr& pool) {
+    const Use use(pool);
     const Lock lock(mutex);
     if (!hasReportedAtExit) { ReportLiving(pool); }
     BeforeClear(pool);
+    use.IsLast();
 }
 
 void AtExit() {

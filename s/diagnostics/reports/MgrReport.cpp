@@ -8,6 +8,7 @@
 #include <MemPool>
 
 #include "MemPool/BucketMgr.hpp"
+#include "MemPool/Checked.hpp"
 #include "MemPool/MgrRegistry.hpp"
 #include "diagnostics/reports/Walks.hpp"
 #include "diagnostics/text/Text.hpp"
@@ -109,6 +110,7 @@ namespace {
 // while the stream's buffer grows leaves the report, as it does elsewhere: the stream would swallow
 // it and print half a number.
 void Print(const BucketMgr& pool, bool detailed) {
+    const Checked::Use use(pool);
     const std::ios::iostate told = std::cout.exceptions();
     const bool tellsAll = (told & std::ios::badbit) != 0;
     if (!std::cout.bad()) { std::cout.exceptions(told | std::ios::badbit); }

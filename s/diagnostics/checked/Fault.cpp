@@ -2,7 +2,7 @@
 // registered before main and outside of any library, so that it runs after the destructors of the
 // host and of every library. It also flushes C's streams, which would come after it.
 
-#include "diagnostics/checked/EndStatus.hpp"
+#include "diagnostics/checked/Fault.hpp"
 
 #include <unistd.h>
 
@@ -18,18 +18,18 @@
 // NOLINTNEXTLINE(bugprone-reserved-identifier,readability-identifier-naming)
 extern "C" __attribute__((weak, visibility("default"))) void __lsan_do_leak_check();
 
-namespace OBR::MemPool::EndStatus {
+namespace OBR::MemPool::Checked {
 
 namespace {
 
 std::atomic<pid_t> faulty = 0;  // The process in which a fault was reported, or 0.
 
 #ifdef __GLIBC__
-constexpr const char* variable = "MEMPOOL_CHECK_STATUS";
+constexpr const char* statusVariable = "MEMPOOL_CHECK_STATUS";
 
 void End(int status, void* /*none*/) {
     if (status != 0 || faulty != getpid()) { return; }
-    const int own = Checked::NumberOf(variable, 0, 255, 99);
+    const int own = NumberOf(statusVariable, 0, 255, 99);
     if (own == 0) { return; }
     if (__lsan_do_leak_check != nullptr) { __lsan_do_leak_check(); }
     std::fflush(nullptr);
@@ -39,14 +39,17 @@ void End(int status, void* /*none*/) {
 // A library that can be unloaded must not leave the handler behind. `mempool check` sets the
 // variable and preloads the library, which therefore stays.
 __attribute__((constructor)) void Register() {
-    if (Host_Env::GetEnv(variable) != nullptr) { on_exit(End, nullptr); }
+    if (Host_Env::GetEnv(statusVariable) != nullptr) { on_exit(End, nullptr); }
 }
 #endif
 
 }  // namespace
 
-void NoteFault() {
+void Report(const BucketMgr& pool, const std::string& what) {
+    const std::string line = "mempool: pool " + pool.name + ": " + what + "\n";
+    std::fputs(line.c_str(), stderr);
+    std::fflush(stderr);
     faulty = getpid();
 }
 
-}  // namespace OBR::MemPool::EndStatus
+}  // namespace OBR::MemPool::Checked
