@@ -76,7 +76,7 @@ std::vector<Told> ReadAll(Trace::EventSource& source) {
         EXPECT_EQ(told.line.empty(), event.kind == Kind::Malformed);
         all.push_back(std::move(told));
     }
-    EXPECT_FALSE(source.Next(event)) << "Nothing comes behind the end.";
+    EXPECT_FALSE(source.Next(event)) << "Nothing follows the end.";
     return all;
 }
 
@@ -86,7 +86,7 @@ std::string LinesOf(const std::vector<Told>& events) {
     return lines;
 }
 
-// Follows the steps and knows which blocks live.
+// Follows the steps and knows which blocks are alive.
 class Follower {
 public:
     explicit Follower(Trace::StepReader& stepReader) : reader(stepReader) {}
@@ -131,7 +131,7 @@ public:
     }
 
 private:
-    using Pool = std::map<std::uint32_t, std::uint32_t>;  // Sizes by indices.
+    using Pool = std::map<std::uint32_t, std::uint32_t>;  // Sizes by index.
 
     void Drop(Pool& pool) {
         const std::vector<Trace::Block>& dropped = reader.Blocks().Dropped();
@@ -159,9 +159,11 @@ void FollowSteps(std::string_view bytes, std::size_t pieceSize, const std::vecto
         for (; reader.Next(step); ++numSteps) { follower.Follow(step); }
     } catch (const std::runtime_error&) { isTrace = false; }
     follower.End();
-    const auto isInfo = [](const Told& event) { return event.kind == Kind::Info; };
-    const auto numInfos = std::count_if(events.begin(), events.end(), isInfo);
-    EXPECT_EQ(numSteps + static_cast<std::uint64_t>(numInfos) + reader.Bad().Total(),
+    const auto isNoStep = [](const Told& event) {
+        return event.kind == Kind::Info || event.kind == Kind::Time;
+    };
+    const auto numOthers = std::count_if(events.begin(), events.end(), isNoStep);
+    EXPECT_EQ(numSteps + static_cast<std::uint64_t>(numOthers) + reader.Bad().Total(),
               events.size());
     EXPECT_EQ(isTrace, reader.Bad().Total() < events.size());
 }

@@ -26,7 +26,7 @@ const std::string everyKind =
         "@c:Q\n@a:Q:X:4096\n@a:P:X:127\n@a:P:Y:128\n@x:P\n@d:P\n@f:Q:Y:\n@d:Q\n") +
     "xmpt:a:ffffffffffffffff:8000000000000001:3\nxmpt:a:0000000000000000:0000000000000000:3\n"
     "xmpt:f:0000000000000000:fffffffffffffff0:\nxmpt:f:0000000000000000:0000000000000020:\n"
-    "xmpt:i:program:jq :. \nxmpt:i::\n";
+    "xmpt:i:program:jq :. \nxmpt:i::\nxmpt:t:250\n";
 
 std::string Compact(const std::string& lines) {
     std::string file;
@@ -57,7 +57,7 @@ TEST(Compact, IsReadAsTheLinesThatWereWritten) {
     const Text text = ReadText(Compact(everyKind));
     EXPECT_EQ(text.lines, everyKind);
     EXPECT_EQ(text.problem, "");
-    EXPECT_EQ(text.position, 20U);
+    EXPECT_EQ(text.position, 21U);
     EXPECT_EQ(ReadText(Compact("")).lines, "");
 }
 
@@ -179,8 +179,9 @@ TEST(Compact, RefusesSenselessChunks) {
     for (std::size_t count = 0; count != Trace::maxPools + 1; ++count) { pools.append("\0\1", 2); }
     const std::string one("\x09\x01", 2);
     for (const std::string& plain :
-         {one + "\x02\x07", one + "\x0f", one + "\x08\x80", one + "\x0b\x05xy", one + "\x09",
-          one + "\x08\xff\xff\xff\xff\xff\xff\xff\xff\xff\xff\xff\x01", pools, std::string()}) {
+         {one + "\x02\x07", one + "\x0d", one + "\x0f", one + "\x08\x80", one + "\x0b\x05xy",
+          one + "\x09", one + "\x08\xff\xff\xff\xff\xff\xff\xff\xff\xff\xff\xff\x01", pools,
+          std::string()}) {
         std::string chunk(ZSTD_compressBound(plain.size()), '\0');
         chunk.resize(ZSTD_compress(chunk.data(), chunk.size(), plain.data(), plain.size(), 1));
         const std::string file = std::string(Trace::compactMagic)
@@ -209,15 +210,15 @@ TEST(TextCommand, PrintsAnyTrace) {
     EXPECT_EQ(Shell::Output("gzip -c compact | " + command + "-"), everyKind);
     EXPECT_EQ(Shell::Output(command + "lines"), everyKind);
     EXPECT_EQ(Shell::Output(command + "bad 2>&1 >/dev/null"),
-              "mempool: bad: 1 malformed lines left out\n");
+              "mempool: bad: 1 malformed lines ignored\n");
     EXPECT_EQ(Shell::Output(command + "- <none", 1),
-              "mempool: standard input: 1 malformed lines left out\n"
+              "mempool: standard input: 1 malformed lines ignored\n"
               "mempool: standard input: no trace line\n");
     EXPECT_EQ(Shell::Output(command + "cut", 1),
               "mempool: cut: unexpected end of file; read as far as it goes\n");
     EXPECT_EQ(Shell::Output(command + "lost", 1), "mempool: lost: No such file or directory\n");
     EXPECT_EQ(Shell::Output(command + "compact >/dev/full", 1),
-              "mempool: standard output: No space left on device\n");
+              "mempool: standard output cannot be written to\n");
 }
 
 }  // namespace

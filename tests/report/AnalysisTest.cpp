@@ -25,6 +25,9 @@
 #include "report/Analysis.hpp"
 #include "report/Json.hpp"
 #include "report/MallocSizes.hpp"
+#include "report/Samples.hpp"
+#include "trace/CompactWriter.hpp"
+#include "trace/OpenTrace.hpp"
 
 namespace {
 
@@ -141,7 +144,8 @@ void ExpectTally(const Report::Tally& tally, const PlainTrace& trace, std::uint6
     Report::BlockSum all;
     Report::BlockSum inRecords;
     std::uint64_t padding = 0;
-    std::uint64_t never = 0;
+    Report::BlockSum never;
+    std::uint64_t temporary = 0;
     std::uint64_t cleared = 0;
     std::array<std::uint64_t, Report::numLifetimes> lifetimes = {};
     for (const PlainBlock& block : trace.blocks) {
@@ -153,9 +157,10 @@ void ExpectTally(const Report::Tally& tally, const PlainTrace& trace, std::uint6
         }
         if (block.cleared) { ++cleared; }
         if (!block.freed) {
-            ++never;
+            never.Add(block.size);
             continue;
         }
+        if (!block.cleared && block.died == block.born + 1) { ++temporary; }
         std::size_t bin = 0;
         for (std::uint64_t life = block.died - block.born; life > 10; life = (life + 9) / 10) {
             ++bin;
@@ -166,7 +171,8 @@ void ExpectTally(const Report::Tally& tally, const PlainTrace& trace, std::uint6
     ExpectSum(tally.inRecords, inRecords);
     ExpectSum(tally.atPeak, LiveAt(trace, peak, choose));
     EXPECT_EQ(tally.padding, padding);
-    EXPECT_EQ(tally.never, never);
+    ExpectSum(tally.never, never);
+    EXPECT_EQ(tally.temporary, temporary);
     EXPECT_EQ(tally.dropped, cleared);
     EXPECT_EQ(tally.lifetimes, lifetimes);
 }
@@ -284,8 +290,18 @@ TEST(Analysis, KeepsTheCourseOfALongTrace) {
         EXPECT_EQ(point.most.heap, heap);
         EXPECT_EQ(point.most.chunks, heap + 8 * point.most.blocks);
     }
-    ASSERT_LE(analysis.fill.size(), Report::FillMap::maxColumns);
-    ASSERT_GE(analysis.fill.size(), Report::FillMap::maxColumns / 2 - 1);
+    for (const Report::GrowthPoint& point : analysis.growth) {
+        for (std::size_t i = 0; i < analysis.groups.size(); ++i) {
+            EXPECT_EQ(point.live.at(i), LiveAt(trace, point.event, [&](const PlainBlock& block) {
+                                            return block.group == analysis.groups[i].name;
+                                        }).bytes);
+        }
+    }
+    EXPECT_EQ(std::count_if(analysis.growth.begin(), analysis.growth.end(),
+                            [&](const auto& point) { return point.event == analysis.peak.event; }),
+              1);
+    ASSERT_LE(analysis.fill.size(), Report::maxSamples);
+    ASSERT_GE(analysis.fill.size(), Report::maxSamples / 2 - 1);
     for (std::size_t i = 0; i < analysis.fill.size(); ++i) {
         const Report::FillColumn& column = analysis.fill[i];
         EXPECT_EQ(column.event, (i + 1) * analysis.fill[0].event);
@@ -298,6 +314,33 @@ TEST(Analysis, KeepsTheCourseOfALongTrace) {
                             return block.size <= 996;
                         }).blocks);
     }
+}
+
+// A block is temporary if the next event of its thread frees it, whatever other threads do between.
+TEST(Analysis, KnowsThreadsAndTimes) {
+    std::string file;
+    Trace::CompactWriter writer([&](std::string_view bytes) { file += bytes; });
+    writer.Write({Trace::Kind::Created, 1, 0, 0, {}, {}});
+    writer.WriteOwned();
+    const auto allocate = [&](std::uint64_t thread, std::uint64_t block) {
+        writer.WriteThread(thread);
+        writer.Write({Trace::Kind::Allocated, 1, block, 8, {}, {}});
+    };
+    allocate(1, 0x10);
+    writer.Write({Trace::Kind::Time, 0, 0, 250, {}, {}});
+    allocate(2, 0x20);
+    writer.WriteThread(1);
+    writer.WriteReleased(0x10);
+    allocate(2, 0x30);
+    writer.WriteReleased(0x20);
+    writer.Write({Trace::Kind::Time, 0, 0, 300, {}, {}});
+    writer.Finish();
+    Trace::StepReader reader(Trace::MakeReader(Trace::Input(std::make_unique<TextSource>(file))),
+                             "made");
+    const Report::Analysis analysis = Report::Analyse(reader, usual, [](std::uint64_t) {});
+    EXPECT_EQ(analysis.total.temporary, 1U);
+    EXPECT_EQ(analysis.peak.milliseconds, 250U);
+    EXPECT_EQ(analysis.timeline.front().most.milliseconds, std::nullopt);
 }
 
 // A single pool for all holds no more than one per group, and the same if there is one group.
@@ -318,11 +361,11 @@ TEST(Analysis, SetsOnePoolBesideThoseOfTheGroups) {
 
 TEST(Json, CutsNamesBetweenCharacters) {
     const Report::Analysis analysis =
-        Analyse(Lines("@c:P\n@n:P:a\u00fc\u00fc\u00fc\u00fc\n@a:P:X:8\n@c:Q\n"));
-    const auto json = nlohmann::json::parse(Report::ToJson(analysis, {1, 7, 1}));
+        Analyse(Lines("@c:P\n@n:P:a\u00fc\u00fc\u00fc\u00fc\u00fcb\n@a:P:X:8\n@c:Q\n"));
+    const auto json = nlohmann::json::parse(Report::ToJson(analysis, {1, 11, 1}));
     EXPECT_EQ(json["num_groups"], 2);
     ASSERT_EQ(json["groups"].size(), 1U);
-    EXPECT_EQ(json["groups"][0]["name"], "a\u00fc...");
+    EXPECT_EQ(json["groups"][0]["name"], "a\u00fc...\u00fcb");
 }
 
 std::uint64_t Field(const std::string& report, const std::string& name) {

@@ -1,4 +1,4 @@
-"""The page of `mempool report` in headless Chromium: what a reader sees there is what --json says.
+"""The page of `mempool report` in headless Chromium: its figures are those of --json.
 
 Takes mempool, chromium and chromedriver. Needs Debian's python3-selenium and python3-pil."""
 
@@ -21,7 +21,7 @@ HOSTILE = "</script><script>document.title='broken'</script>\"'&<b>ü\u2028"
 
 
 def write_trace(path):
-    """Some groups of other sizes and lifetimes, one with a name that is no friend of HTML."""
+    """Groups of several sizes and lifetimes, one with a name that HTML could take for markup."""
     chance = random.Random(3)
     names = [HOSTILE, "parse_tree(Node const&)"] + [f"caller_{i}" for i in range(40)]
     with open(path, "w", encoding="utf-8") as out:
@@ -32,6 +32,8 @@ def write_trace(path):
             out.write(f"xmpt:c:{pool:016x}\nxmpt:n:{pool:016x}:{name}\n")
         live = [[] for _ in names]
         for step in range(20000):
+            if step % 500 == 0:
+                out.write(f"xmpt:t:{step * step // 10000}\n")
             pool = min(int(chance.expovariate(0.2)), len(names) - 1)
             if live[pool] and chance.random() < 0.4:
                 out.write(f"xmpt:f:{pool:016x}:{live[pool].pop():016x}:\n")
@@ -108,20 +110,50 @@ class PageTest(unittest.TestCase):
                 value = value[key]
             self.assertEqual(float(one.get_attribute("data-value")), value)
             shown[one.get_attribute("data-figure")] = one.text
-        peak = self.json["peak"]
-        self.assertEqual(shown["peak.asked"], shown_bytes(peak["asked"]))
-        self.assertEqual(shown["peak.pools"], shown_bytes(peak["pools"]))
         self.assertEqual(shown["blocks"], f"{self.json['blocks']:,}")
-        self.assertEqual(shown["never"], shown_percent(self.json["never"], self.json["blocks"]))
+        self.assertEqual(shown["never_bytes"], shown_bytes(self.json["never_bytes"]))
+        for key, part in (("temporary", "temporary"), ("in_records.blocks", "in_records")):
+            part = self.json[part] if part == key else self.json[part]["blocks"]
+            self.assertEqual(shown[key], shown_percent(part, self.json["blocks"]))
         self.assertEqual(shown["allocation_share"], "25.0 %")
+
+        peak, groups = self.json["peak"], self.json["groups"]
+        share = [f"{100 * group['at_peak']['bytes'] / peak['asked']:.0f} % by {group['name']}"
+                 for group in groups[:3]]
+        more = 100 * (peak["pools"] / peak["heap_chunks"] - 1)
+        self.assertGreater(more, 3)
+        self.assertLess(abs(peak["one_pool"] / peak["heap_chunks"] - 1), 0.03)
+        self.assertEqual(self.texts("#verdict"), [
+            f"At the peak the program has asked for {shown_bytes(peak['asked'])} in "
+            f"{peak['blocks']:,} blocks: {share[0]}, {share[1]} and {share[2]}. A pool for each group "
+            f"would hold {shown_bytes(peak['pools'])} for them, {more:.0f} % more than the "
+            f"heap’s {shown_bytes(peak['heap_chunks'])}; a single pool for all "
+            f"{shown_bytes(peak['one_pool'])}, about as much as the heap."])
+        large = [group for group in groups if group["at_peak"]["bytes"] >= 0.001 * peak["asked"]][:12]
+        self.assertEqual(self.texts("#peak text.mark"), [group["name"] for group in large])
+        self.assertEqual(self.texts("#peak text:not(.mark)"), [
+            f"{shown_bytes(group['at_peak']['bytes'])}, "
+            f"{shown_percent(group['at_peak']['bytes'], peak['asked'])}, "
+            f"{group['at_peak']['blocks']:,} blocks" for group in large])
+        widths = self.browser.execute_script(
+            "return Array.from(document.querySelectorAll('#peak rect.bar'),"
+            " bar => Number(bar.getAttribute('width')))")
+        for width, group in zip(widths, large):
+            self.assertAlmostEqual(width / widths[0],
+                                   group["at_peak"]["bytes"] / large[0]["at_peak"]["bytes"], delta=0.01)
+        together = sorted(groups, key=lambda group: -group["together"]["blocks"])[:8]
+        self.assertEqual(self.texts("#together tbody td"), [text for group in together for text in (
+            group["name"], f"{group['together']['blocks']:,}", f"{group['together']['longest']:,}",
+            f"{group['together']['clear_runs']:,}", f"{group['together']['clear_blocks']:,}",
+            shown_percent(group["together"]["clear_blocks"], group["blocks"]))])
         self.assertEqual(self.texts("h1"), ["demo <i>"])
         self.assertIn("2 threads", self.texts("#facts")[0])
         self.assertIn("1 × truncated or malformed", self.texts(".banner:not(noscript *)")[-1])
 
         held = self.texts("#held tbody td")
-        for row, key in enumerate(("asked", "pools", "one_pool", "heap", "heap_chunks")):
+        for row, key in enumerate(("asked", "pools", "one_pool", "heap_chunks", "heap")):
             self.assertEqual(held[4 * row + 1:4 * row + 4], [
-                shown_bytes(peak[key]), shown_percent(peak[key], peak["heap"]),
+                shown_bytes(peak[key]), shown_percent(peak[key], peak["heap_chunks"]),
                 shown_bytes(self.json["most"][key])])
         lifetimes = [blocks for blocks in self.json["lifetimes"]] + [self.json["never"]]
         counted = [int(text.replace(",", "")) for text in
@@ -138,7 +170,10 @@ class PageTest(unittest.TestCase):
             "return Array.from(document.querySelectorAll('#timeline .chart path.line, #timeline "
             "path.line'), path => path.getAttribute('d').split('L').length)")
         self.assertEqual(drawn, [len(lines["event"])] * 4)
-        cells = sum(1 for row in self.json["fill"]["classes"] for records in row["records"] if records)
+        rows = self.json["fill"]["classes"]
+        held = [max(row["records"]) * (row["data_size"] + 4) for row in rows]
+        cells = sum(1 for row, most in zip(rows, held) for records in row["records"]
+                    if records and most >= sum(held) / 100)
         self.assertEqual(len(self.texts("#fill rect.cell")), cells)
         heights = self.browser.execute_script(
             "return Array.from(document.querySelectorAll('#lifetimes rect.bar'),"
@@ -149,22 +184,50 @@ class PageTest(unittest.TestCase):
         for chart in self.browser.find_elements(By.CSS_SELECTOR, ".chart > svg"):
             self.assertTrue(chart.get_attribute("aria-label"))
 
-        # A tooltip tells the figures of the point below the pointer.
+        # A tooltip has the figures of the point below the pointer.
+        point, tip = self.point_in_the_middle("timeline", lines)
+        self.assertAlmostEqual(lines["seconds"][point] / max(lines["seconds"]), 0.5, delta=0.06)
+        self.assertIn(f"Heap: {shown_bytes(lines['heap_chunks'][point])}", tip)
+        self.assertIn(f"Blocks: {lines['blocks'][point]:,}", tip)
+        self.browser.find_elements(By.CSS_SELECTOR, "#unit button")[1].click()
+        point, tip = self.point_in_the_middle("timeline", lines)
+        self.assertAlmostEqual(lines["event"][point] / self.json["events"], 0.5, delta=0.02)
+
+    def point_in_the_middle(self, chart, lines):
         tip = self.browser.execute_script(
-            "const area = document.querySelector('#timeline rect[fill=transparent]');"
+            "const area = document.querySelector(`#${arguments[0]} rect[fill=transparent]`);"
             "const box = area.getBoundingClientRect();"
             "area.dispatchEvent(new MouseEvent('mousemove', {clientX: box.left + box.width / 2,"
             " clientY: box.top + 20, bubbles: true}));"
-            "return document.getElementById('tip').textContent").split("\n")
-        point = lines["event"].index(int(tip[0].replace("Event ", "").replace(",", "")))
-        self.assertAlmostEqual(lines["event"][point] / self.json["events"], 0.5, delta=0.02)
-        self.assertIn(f"Heap: {shown_bytes(lines['heap_chunks'][point])}", tip)
-        self.assertIn(f"Blocks: {lines['blocks'][point]:,}", tip)
+            "return document.getElementById('tip').textContent", chart).split("\n")
+        return lines["event"].index(int(tip[0].replace("Event ", "").replace(",", ""))), tip
+
+    def test_growth_stacks_the_groups(self):
+        lines, groups = self.json["growth"], self.json["growth"]["groups"]
+        self.assertEqual([group["name"] for group in groups],
+                         [group["name"] for group in self.json["groups"][:9]])
+        peak = lines["event"].index(self.json["peak"]["event"])
+        self.assertEqual([group["bytes"][peak] for group in groups],
+                         [group["at_peak"]["bytes"] for group in self.json["groups"][:9]])
+        sums = [sum(parts) for parts in zip(lines["others"], *(group["bytes"] for group in groups))]
+        self.assertEqual(sums[peak], self.json["peak"]["asked"])
+        point, tip = self.point_in_the_middle("growth", lines)
+        self.assertIn(f"In all: {shown_bytes(sums[point])}", tip)
+        self.assertIn(f"caller_5: {shown_bytes(groups[7]['bytes'][point])}", tip)
+        tops = self.browser.execute_script(
+            "return Array.from(document.querySelectorAll('#growth path.layer'), path => path"
+            ".getAttribute('d').slice(1).split('L').map(at => Number(at.split(',')[1])))")
+        self.assertEqual(len(tops), 1 + sum(max(group["bytes"]) >= 0.01 * max(sums)
+                                            for group in groups))
+        scale = (236 - tops[-1][peak]) / sums[peak]
+        for top, total in zip(tops[-1], sums):
+            self.assertAlmostEqual(236 - top, total * scale, delta=0.01)
 
     def test_groups_sort_and_filter(self):
         groups = self.json["groups"]
         names = "#groups tbody td.name"
         self.assertEqual(self.texts(names), [group["name"] for group in groups[:25]])
+        self.browser.find_element(By.CSS_SELECTOR, "#all-groups summary").click()
         self.browser.find_element(By.ID, "groups-more").click()
         heads = self.browser.find_elements(By.CSS_SELECTOR, "#groups th")
         heads[2].find_element(By.TAG_NAME, "button").click()
@@ -187,7 +250,10 @@ class PageTest(unittest.TestCase):
             self.browser.get("file://" + self.page)
             wide = self.browser.execute_script("return document.documentElement.scrollWidth")
             self.assertLessEqual(wide, width)
-            for chart in ("timeline", "sizes", "lifetimes", "fill"):
+            self.assertEqual(self.browser.execute_script(
+                "return getComputedStyle(document.getElementById('together').parentNode, '::before')"
+                ".content") != "none", width == 390)
+            for chart in ("peak", "growth", "timeline", "sizes", "lifetimes", "fill"):
                 element = self.browser.find_element(By.CSS_SELECTOR, f"#{chart} > svg")
                 picture = Image.open(io.BytesIO(element.screenshot_as_png)).convert("L")
                 histogram = picture.histogram()

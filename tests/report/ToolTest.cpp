@@ -18,7 +18,6 @@
 #include "Folder.hpp"
 
 using testing::HasSubstr;
-using testing::Not;
 
 namespace {
 
@@ -78,7 +77,7 @@ TEST(Report, TellsTheFiguresOfASmallTrace) {
 
 TEST(Report, IsAPageUnlessAllIsAskedFor) {
     std::ofstream file(Path("many"));
-    const std::string longName = std::string(80, 'n') + "-the-end";
+    const std::string longName = "<list<int>>" + std::string(80, 'n') + "-the-end";
     for (int group = 100; group < 150; ++group) {
         const std::string pool = ":0000000000000" + std::to_string(group);
         file << "xmpt:c" << pool << "\nxmpt:n" << pool << ':' << group << longName << "\nxmpt:a"
@@ -88,7 +87,7 @@ TEST(Report, IsAPageUnlessAllIsAskedFor) {
     const std::string page = Tool("many");
     EXPECT_LE(std::count(page.begin(), page.end(), '\n'), 45);
     EXPECT_THAT(page, HasSubstr("GROUPS LARGEST AT THE PEAK (7 of 50)"));
-    EXPECT_THAT(page, Not(HasSubstr("-the-end")));
+    EXPECT_THAT(page, HasSubstr("  149nnnnnnnnnnnnnn...nnnnnnnn-the-end\n"));
     const std::string all = Tool("--all many");
     EXPECT_THAT(all, HasSubstr("149" + longName + "\n"));
     EXPECT_THAT(all, HasSubstr("100" + longName + "\n"));
@@ -111,7 +110,10 @@ TEST(Report, WritesAPage) {
     std::string data = page.substr(first, page.find("</script>", first) - first);
     const std::string escape = "\\u003c";
     EXPECT_EQ(data.find('<'), std::string::npos);
-    data.replace(data.find(escape), escape.size(), "<");
+    for (std::size_t place = data.find(escape); place != std::string::npos;
+         place = data.find(escape)) {
+        data.replace(place, escape.size(), "<");
+    }
     EXPECT_EQ(data + "\n", Tool("--json small"));
     EXPECT_THAT(Tool("--html no/where small", 1), HasSubstr("mempool: no/where: No such file"));
     EXPECT_THAT(Tool("--html /dev/full small", 1), HasSubstr("mempool: /dev/full: No space left"));

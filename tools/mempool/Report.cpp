@@ -1,4 +1,4 @@
-// mempool report: what a trace tells about the memory of its program.
+// mempool report: what a trace says about the memory of its program.
 
 #include "mempool/Report.hpp"
 
@@ -26,28 +26,29 @@ namespace Tool {
 namespace {
 
 constexpr const char* description =
-    "Tell from a trace where a program's memory is: by size, lifetime and group";
+    "Show from a trace where the memory of a program is: by group, size and lifetime";
 
 constexpr const char* notes =
-    R"(Nothing runs anew: the trace is read once, and what pools and heap would hold is worked out by the
+    R"(Nothing is run: the trace is read once, and what pools and the heap would hold is computed by the
 rules of the library and of the C library's malloc.
 
-event         An allocation, a release, a Clear, and the begin or the end of a pool.
-group         What the recording has traced as one pool. Those of one name count as one.
+event         An allocation, a release, a Clear, or the creation or the destruction of a pool.
+group         What the recording traced as one pool. Those of one name count as one.
 the peak      The first moment with the most bytes asked for.
-bytes held    Of pools: buckets, heap records and tables. Of the heap: its blocks as it rounds them.
-              Malloc's own headers, 8 bytes a block, are counted in the last line only, and what
-              lies unused between blocks nowhere. Those of records are counted.
+bytes held    By pools: buckets, heap records and tables. By the heap: its blocks as malloc rounds
+              them, with its own headers, 8 bytes per block; the last line is without them. Unused
+              memory between blocks is not counted.
 records       The share of blocks that fit into a bucket. The others are heap records.
 padding       Bytes that rounding adds to those.
-short, never  The shares of blocks that are freed within 100 events, and that are not freed until
-              their pool or the trace ends.
-together      The share of blocks that die in a row of two or more, without an allocation of their
-              group between.
-clear         Of these, those of rows that leave nothing of the group alive: one Clear of a pool
-              would do.
+temporary     The share of blocks that the next event of their thread frees.
+short         The share of blocks that are freed within 100 events.
+leaked        Bytes that are not freed until their pool or the trace ends; never: their share.
+together      The share of blocks that die in a series of two or more releases, without an
+              allocation of their group in between.
+clear         Of these, the series that leave no block of the group alive: one Clear of a pool
+              would replace them.
 
---json has the exact figures; docs/report.md tells its keys.
+--json has the exact figures; docs/report.md lists its keys.
 )";
 
 struct Options {
@@ -109,9 +110,9 @@ void AddReport(Program& program) {
         ->type_name("");
     report.add_flag("--json", options->report.json, "Print all figures as JSON");
     report
-        .add_option("--html", options->report.html,
-                    "Write a page with charts to FILE too; - is standard output, which then has "
-                    "nothing else")
+        .add_option(
+            "--html", options->report.html,
+            "Also write a page with charts to FILE; - is standard output, with the page alone")
         ->type_name("FILE");
     report.add_flag("--all", options->all, "Print every size and every group");
     AddSettings(report, options->report.settings);

@@ -1,4 +1,4 @@
-// The report on a trace, for `mempool report` and for whoever ends with one.
+// The report on a trace, as several subcommands print it.
 
 #ifndef OBR_TOOLS_MEMPOOL_REPORT_HPP
 #define OBR_TOOLS_MEMPOOL_REPORT_HPP
@@ -14,14 +14,14 @@ namespace Tool {
 struct ReportOptions {
     Replay::PoolSettings settings = Replay::PoolSettings::OfProcess();
     Extent extent = Extent::Page;
-    bool json = false;  // In place of the text.
-    std::string html;   // Where the page goes, besides; "-" is the standard output, with the page
-                        // alone. Empty for none.
+    bool json = false;  // Instead of text.
+    std::string html;   // Where to write the page too, or empty. "-" is the standard output, with
+                        // the page alone.
 };
 
 // Reads the trace, shows progress on a terminal, and writes the report to the standard output.
-// Returns the exit status. Bad settings, a trace that is none and a file that cannot be written are
-// a std::runtime_error.
+// Returns the exit status. Throws std::runtime_error if no pool can have the settings, the input is
+// not a trace, or a file cannot be written.
 int WriteReport(Trace::StepReader& reader, const ReportOptions& options);
 
 }  // namespace Tool

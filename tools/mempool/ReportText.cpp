@@ -59,6 +59,17 @@ std::string Fact(const Analysis& analysis, const char* key) {
     return fact == analysis.facts.end() ? "" : SafeText(fact->second);
 }
 
+// A name without the arguments of templates if they make it too long, and then without its middle.
+std::string ShortName(std::string name, std::size_t bytes) {
+    while (name.size() > bytes) {
+        const std::size_t end = name.find('>');
+        const std::size_t begin = end == std::string::npos ? end : name.rfind('<', end);
+        if (begin == std::string::npos) { break; }
+        name.erase(begin, end + 1 - begin);
+    }
+    return Trace::CutText(name, bytes);
+}
+
 // Two columns without headings: what it is, and a text.
 Table Labelled() {
     return Table({{"", 20, Align::Left}, {"", 0, Align::Left}});
@@ -88,8 +99,10 @@ void PrintTotals(std::ostream& out, const Analysis& analysis) {
     const std::uint64_t blocks = total.all.blocks;
     Table totals = Labelled();
     totals.AddRow("events", Count(analysis.events));
-    totals.AddRow("blocks", fmt::format("{} of {} in all, {} never freed", Count(blocks),
-                                        Bytes(total.all.bytes), Percent(total.never, blocks)));
+    totals.AddRow("blocks", fmt::format("{} of {} in all, {} of them temporary; {} of {} leaked",
+                                        Count(blocks), Bytes(total.all.bytes),
+                                        Percent(total.temporary, blocks), Count(total.never.blocks),
+                                        Bytes(total.never.bytes)));
     totals.AddRow("in records",
                   fmt::format("{} of the blocks, {} of the bytes; rounding adds {} to them",
                               Percent(total.inRecords.blocks, blocks),
@@ -107,14 +120,14 @@ void PrintTotals(std::ostream& out, const Analysis& analysis) {
     Table held({{"BYTES HELD", 20, Align::Left}, {"at the peak"}, {"of heap"}, {"most ever", 9}});
     const auto add = [&](const char* label, std::uint64_t Report::Moment::*figure) {
         held.AddRow(label, Bytes(analysis.peak.*figure),
-                    Percent(analysis.peak.*figure, analysis.peak.heap),
+                    Percent(analysis.peak.*figure, analysis.peak.chunks),
                     Bytes(analysis.most.*figure));
     };
     add("asked for", &Report::Moment::asked);
-    add("pools, one a group", &Report::Moment::pools);
+    add("pools, one per group", &Report::Moment::pools);
     add("one pool for all", &Report::Moment::onePool);
-    add("heap (malloc)", &Report::Moment::heap);
-    add("heap with headers", &Report::Moment::chunks);
+    add("heap (malloc)", &Report::Moment::chunks);
+    add("without its headers", &Report::Moment::heap);
     out << '\n';
     held.Write(out);
 }
@@ -182,7 +195,7 @@ void PrintSizes(std::ostream& out, const Analysis& analysis, Extent extent) {
                                           : fmt::format("{}-{}", row->smallest, row->largest),
             Count(blocks), Percent(blocks, analysis.total.all.blocks), Bytes(tally.atPeak.bytes),
             Percent(tally.inRecords.blocks, blocks), Bytes(tally.padding),
-            Percent(ShortLived(tally), blocks), Percent(tally.never, blocks));
+            Percent(ShortLived(tally), blocks), Percent(tally.never.blocks, blocks));
     }
     table.Write(out);
 }
@@ -201,7 +214,7 @@ void PrintLifetimes(std::ostream& out, const Analysis& analysis) {
         cells.push_back(Percent(within, total.all.blocks));
     }
     columns.push_back({"never"});
-    cells.push_back(Percent(total.never, total.all.blocks));
+    cells.push_back(Percent(total.never.blocks, total.all.blocks));
     out << "\n   LIFETIMES (blocks freed within so many events)\n";
     Table table(std::move(columns));
     table.AddCells(std::move(cells));
@@ -215,10 +228,10 @@ void PrintGroups(std::ostream& out, const Analysis& analysis, Extent extent) {
     out << "\n   GROUPS" << (shown < analysis.groups.size() ? " LARGEST AT THE PEAK" : "")
         << Shown(shown, analysis.groups.size()) << '\n';
     Table table({{"at peak", 7},
-                 {"blocks", 9},
-                 {"bytes", 7},
-                 {"short"},
-                 {"never"},
+                 {"in blocks", 9},
+                 {"all blocks", 10},
+                 {"temporary"},
+                 {"leaked", 7},
                  {"together"},
                  {"clear"},
                  {"name", 0, Align::Left}});
@@ -227,10 +240,10 @@ void PrintGroups(std::ostream& out, const Analysis& analysis, Extent extent) {
         const Tally& tally = group.tally;
         const std::uint64_t blocks = tally.all.blocks;
         const std::string name = SafeText(group.name);
-        table.AddRow(Bytes(tally.atPeak.bytes), Count(blocks), Bytes(tally.all.bytes),
-                     Percent(ShortLived(tally), blocks), Percent(tally.never, blocks),
+        table.AddRow(Bytes(tally.atPeak.bytes), Count(tally.atPeak.blocks), Count(blocks),
+                     Percent(tally.temporary, blocks), Bytes(tally.never.bytes),
                      Percent(group.runs.together, blocks), Percent(group.runs.clearable, blocks),
-                     extent == Extent::All ? name : Trace::CutText(name, 36));
+                     extent == Extent::All ? name : ShortName(name, 36));
     }
     table.Write(out);
 }
@@ -243,9 +256,9 @@ void PrintAnalysis(std::ostream& out, const Analysis& analysis, Extent extent) {
     PrintFacts(out, analysis);
     PrintTotals(out, analysis);
     if (extent != Extent::Short) { PrintGraph(out, analysis); }
+    PrintGroups(out, analysis, extent);
     PrintSizes(out, analysis, extent);
     if (extent != Extent::Short) { PrintLifetimes(out, analysis); }
-    PrintGroups(out, analysis, extent);
 }
 
 }  // namespace Tool

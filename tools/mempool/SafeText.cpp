@@ -12,10 +12,10 @@ std::string SafeText(const std::string& text) {
     safe = safe.substr(1, safe.size() - 2);
     for (std::size_t i = 0; i < safe.size(); ++i) {
         const auto byte = static_cast<unsigned char>(safe[i]);
-        // Quotes and backslashes are harmless; JSON escapes them.
+        // JSON escapes quotes and backslashes, which are harmless.
         if (byte == '\\' && (safe[i + 1] == '"' || safe[i + 1] == '\\')) { safe.erase(i, 1); }
         if (byte == 0x7F) { safe[i] = '?'; }
-        // Another set of control characters, which JSON lets pass.
+        // Further control characters, which JSON does not escape.
         const bool isControl = byte == 0xC2 && static_cast<unsigned char>(safe[i + 1]) < 0xA0;
         if (isControl) { safe.replace(i, 2, "?"); }
     }

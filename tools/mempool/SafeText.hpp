@@ -1,5 +1,5 @@
-// Texts of a trace on their way to a terminal. A trace comes from anywhere, and what is called a
-// name there could be a command to the terminal.
+// Makes the texts of a trace safe to print. A trace comes from anywhere, and a name in it could be
+// a command to the terminal.
 
 #ifndef OBR_TOOLS_MEMPOOL_SAFETEXT_HPP
 #define OBR_TOOLS_MEMPOOL_SAFETEXT_HPP
@@ -8,8 +8,8 @@
 
 namespace Tool {
 
-// The text in UTF-8 with escapes as of JSON in place of control characters, and the sign for it
-// where it is no UTF-8.
+// The text in UTF-8, with control characters as in JSON, and the replacement character for bytes
+// that are not UTF-8.
 std::string SafeText(const std::string& text);
 
 }  // namespace Tool

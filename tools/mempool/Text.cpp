@@ -1,15 +1,11 @@
 // mempool text: prints a trace of any form as lines.
 
-#include <cerrno>
 #include <cstddef>
 #include <cstdint>
-#include <cstdio>
 #include <cstdlib>
 #include <iostream>
 #include <memory>
-#include <stdexcept>
 #include <string>
-#include <system_error>
 
 #include "mempool/Program.hpp"
 #include "trace/Event.hpp"
@@ -24,27 +20,20 @@ constexpr const char* description = "Print a trace as lines of text";
 
 constexpr const char* notes =
     R"(TRACE is what mempool record has written, or any text with trace lines among others, plain or
-compressed by gzip. Only the trace lines are printed, those that are malformed left out:
+compressed by gzip. Only well-formed trace lines are printed:
 
-xmpt:c:POOL              A pool begins.
-xmpt:n:POOL:TEXT         What it is called.
+xmpt:c:POOL              A pool is created.
+xmpt:n:POOL:TEXT         Its name.
 xmpt:a:POOL:BLOCK:SIZE   A block is allocated; SIZE bytes were asked for.
 xmpt:f:POOL:BLOCK:       A block is freed.
 xmpt:x:POOL              A pool drops all its blocks.
-xmpt:d:POOL              A pool ends, with all its blocks.
+xmpt:d:POOL              A pool is destroyed, with all its blocks.
 xmpt:i:KEY:TEXT          A fact about the whole recording.
+xmpt:t:MILLISECONDS      When the following happened, since the recording began.
 
-POOL and BLOCK are addresses of 16 hexadecimal digits. A recorded heap has a pool for each group.
+POOL and BLOCK are addresses of 16 hexadecimal digits. The recording of a heap has a pool for each
+group.
 )";
-
-[[noreturn]] void FailAtOutput() {
-    throw std::runtime_error("standard output: " + std::generic_category().message(errno));
-}
-
-void Print(std::string& lines) {
-    if (std::fwrite(lines.data(), 1, lines.size(), stdout) != lines.size()) { FailAtOutput(); }
-    lines.clear();
-}
 
 int PrintTrace(const std::string& path) {
     const std::string name = path == "-" ? "standard input" : path;
@@ -54,15 +43,17 @@ int PrintTrace(const std::string& path) {
     std::uint64_t numEvents = 0;
     std::uint64_t numMalformed = 0;
     Trace::Event event;
-    while (source->Next(event)) {
+    while (std::cout && source->Next(event)) {
         ++(event.kind == Trace::Kind::Malformed ? numMalformed : numEvents);
         Trace::AppendLine(lines, event);
-        if (lines.size() > enough) { Print(lines); }
+        if (lines.size() < enough) { continue; }
+        std::cout << lines;
+        lines.clear();
     }
-    Print(lines);
-    if (std::fflush(stdout) != 0) { FailAtOutput(); }
+    std::cout << lines << std::flush;
+    if (!std::cout) { return EXIT_FAILURE; }  // The caller says why.
     if (numMalformed != 0) {
-        std::cerr << "mempool: " << name << ": " << numMalformed << " malformed lines left out\n";
+        std::cerr << "mempool: " << name << ": " << numMalformed << " malformed lines ignored\n";
     }
     std::string problem = source->Problem();
     if (!problem.empty()) { problem += "; read as far as it goes"; }

@@ -36,6 +36,7 @@ public:
             case Trace::Kind::Created:
             case Trace::Kind::Allocated:
             case Trace::Kind::Info:
+            case Trace::Kind::Time:
             case Trace::Kind::Malformed:
                 break;
         }

@@ -102,6 +102,7 @@ void Run(Side& side, const Recording& recording, std::size_t numSteps) {
                 break;
             case Trace::Kind::Named:
             case Trace::Kind::Info:
+            case Trace::Kind::Time:
             case Trace::Kind::Malformed:
                 break;  // In no recording.
         }

@@ -4,16 +4,24 @@
 
 #include <algorithm>
 #include <cstddef>
+#include <set>
 #include <tuple>
+#include <unordered_map>
 #include <utility>
 
 #include "report/MallocSizes.hpp"
+#include "report/Samples.hpp"
 
 namespace Report {
 
 namespace {
 
-enum class End : std::uint8_t { Freed, Cleared, Destroyed };
+enum class End : std::uint8_t { Freed, FreedAtOnce, Cleared, Destroyed };
+
+// The group of a traced pool.
+const std::string& NameOf(const Trace::Pool& pool) {
+    return pool.name.empty() ? pool.address : pool.name;
+}
 
 class Analyst {
 public:
@@ -22,38 +30,46 @@ public:
         onePool.Create(0);
     }
 
-    // `blocks` is as the step has left it.
-    void Take(const Trace::Step& step, const Trace::Resolver& blocks) {
+    // The last step that the reader has read.
+    void Take(const Trace::Step& step, const Trace::StepReader& reader) {
         if (step.kind == Trace::Kind::Named) { return; }
         ++result.events;
+        std::uint64_t& allocation = lastAllocations[reader.Thread()];
+        const std::uint64_t formerAllocation = std::exchange(allocation, 0);
         switch (step.kind) {
             case Trace::Kind::Created:
                 rows.emplace_back();
                 pools.Create(step.pool);
+                livePools.insert(step.pool);
                 break;
             case Trace::Kind::Allocated:
                 Allocate(step.pool, step.block);
+                allocation = result.events;
                 break;
             case Trace::Kind::Freed:
                 ++result.frees;
                 pools.Free(step.pool, alive[step.block.index].place, step.block.size);
-                Release(step.pool, step.block, End::Freed);
+                Release(step.pool, step.block,
+                        alive[step.block.index].since == formerAllocation ? End::FreedAtOnce
+                                                                          : End::Freed);
                 break;
             case Trace::Kind::Cleared:
                 ++result.clears;
-                Drop(step.pool, blocks.Dropped(), End::Cleared);
+                Drop(step.pool, reader.Blocks().Dropped(), End::Cleared);
                 pools.Clear(step.pool);
                 break;
             case Trace::Kind::Destroyed:
-                Drop(step.pool, blocks.Dropped(), End::Destroyed);
+                Drop(step.pool, reader.Blocks().Dropped(), End::Destroyed);
                 pools.Destroy(step.pool);
+                livePools.erase(step.pool);
                 break;
             case Trace::Kind::Named:
             case Trace::Kind::Info:
+            case Trace::Kind::Time:
             case Trace::Kind::Malformed:
                 return;
         }
-        Look();
+        Look(reader.Milliseconds());
     }
 
     Analysis Finish(const Trace::StepReader& reader) {
@@ -71,6 +87,7 @@ public:
             result.sizes.back().tally.Finish(result.peak.event);
         }
         JoinGroups(reader.Blocks().Pools());
+        AddGrowth(reader.Blocks().Pools());
         return std::move(result);
     }
 
@@ -83,6 +100,12 @@ private:
     struct PoolRow {
         Tally tally;
         Runs runs;
+    };
+    // Live bytes by traced pool.
+    struct LiveColumn {
+        std::uint64_t event = 0;
+        std::optional<std::uint64_t> milliseconds;
+        std::vector<std::pair<std::uint32_t, std::uint64_t>> pools;
     };
 
     void Allocate(std::uint32_t pool, const Trace::Block& block) {
@@ -117,11 +140,12 @@ private:
             tally->Change(result.events, result.peak.event);
             tally->live.Remove(block.size);
             if (end == End::Destroyed) {
-                ++tally->never;
+                tally->never.Add(block.size);
             } else {
                 ++tally->lifetimes[bin];
             }
             if (end == End::Cleared) { ++tally->dropped; }
+            if (end == End::FreedAtOnce) { ++tally->temporary; }
         }
     }
 
@@ -131,17 +155,21 @@ private:
     }
 
     // After each event.
-    void Look() {
+    void Look(std::optional<std::uint64_t> milliseconds) {
         const BlockSum& live = result.total.live;
-        const Moment now = {result.events,
-                            live.bytes,
-                            live.blocks,
-                            pools.BytesHeld(),
-                            onePool.BytesHeld(),
-                            heapBytes,
-                            heapBytes + mallocHeader * live.blocks};
+        const Moment now = {result.events,     milliseconds,
+                            live.bytes,        live.blocks,
+                            pools.BytesHeld(), onePool.BytesHeld(),
+                            heapBytes,         heapBytes + mallocHeader * live.blocks};
         timeline.Add(now);
-        fill.Add(now.event, pools);
+        if (FillColumn* const column = fill.At(now.event)) { *column = FillOf(now.event, pools); }
+        if (LiveColumn* const column = growth.At(now.event)) {
+            column->event = now.event;
+            column->milliseconds = milliseconds;
+            for (const std::uint32_t pool : livePools) {
+                column->pools.emplace_back(pool, rows[pool].tally.live.bytes);
+            }
+        }
         if (std::tie(now.asked, now.blocks) > std::tie(result.peak.asked, result.peak.blocks)) {
             result.peak = now;
         }
@@ -159,8 +187,7 @@ private:
         for (std::size_t pool = 0; pool < rows.size(); ++pool) {
             rows[pool].tally.Finish(result.peak.event);
             rows[pool].runs.End(rows[pool].tally.live.blocks);
-            const Trace::Pool& named = traced[pool];
-            const std::string& name = named.name.empty() ? named.address : named.name;
+            const std::string& name = NameOf(traced[pool]);
             const auto [place, isNew] = places.try_emplace(name, result.groups.size());
             if (isNew) { result.groups.push_back({name, 0, {}, {}}); }
             GroupRow& group = result.groups[place->second];
@@ -176,6 +203,32 @@ private:
                   });
     }
 
+    // After JoinGroups.
+    void AddGrowth(const std::vector<Trace::Pool>& traced) {
+        const std::size_t numGrowing = std::min(result.groups.size(), maxGrowing);
+        std::map<std::string, std::size_t> places;
+        for (std::size_t i = 0; i < numGrowing; ++i) { places.emplace(result.groups[i].name, i); }
+        const std::vector<std::uint64_t> nothing(numGrowing + 1);
+        for (const LiveColumn& column : growth.Columns()) {
+            result.growth.push_back({column.event, column.milliseconds, nothing});
+            for (const auto& [pool, bytes] : column.pools) {
+                const auto place = places.find(NameOf(traced[pool]));
+                result.growth.back().live[place != places.end() ? place->second : numGrowing] +=
+                    bytes;
+            }
+        }
+        GrowthPoint peak = {result.peak.event, result.peak.milliseconds, nothing};
+        for (std::size_t i = 0; i < result.groups.size(); ++i) {
+            peak.live[std::min(i, numGrowing)] += result.groups[i].tally.atPeak.bytes;
+        }
+        const auto place =
+            std::find_if(result.growth.begin(), result.growth.end(),
+                         [&](const GrowthPoint& point) { return point.event >= peak.event; });
+        if (place == result.growth.end() || place->event != peak.event) {
+            result.growth.insert(place, std::move(peak));
+        }
+    }
+
     Analysis result;
     PoolModel pools;
     PoolModel onePool;
@@ -184,7 +237,11 @@ private:
     std::vector<Alive> alive;   // By index of the block.
     std::uint64_t heapBytes = 0;
     Timeline timeline;
-    FillMap fill;
+    Samples<FillColumn> fill;
+    Samples<LiveColumn> growth;
+    std::set<std::uint32_t> livePools;
+    std::unordered_map<std::uint64_t, std::uint64_t>
+        lastAllocations;  // By thread: the event of its last one, or 0 if another event followed.
 };
 
 }  // namespace
@@ -195,7 +252,7 @@ Analysis Analyse(Trace::StepReader& reader, const Replay::PoolSettings& settings
     Analyst analyst(settings);
     Trace::Step step = {};
     for (std::uint64_t number = 1; reader.Next(step); ++number) {
-        analyst.Take(step, reader.Blocks());
+        analyst.Take(step, reader);
         if (number % interval == 0) { atEvent(reader.Position()); }
     }
     return analyst.Finish(reader);

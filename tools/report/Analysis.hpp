@@ -9,9 +9,11 @@
 #ifndef OBR_TOOLS_REPORT_ANALYSIS_HPP
 #define OBR_TOOLS_REPORT_ANALYSIS_HPP
 
+#include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <map>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -33,6 +35,15 @@ struct GroupRow {
     Runs runs;
 };
 
+// The live bytes of groups at one moment.
+struct GrowthPoint {
+    std::uint64_t event = 0;
+    std::optional<std::uint64_t> milliseconds;  // If the trace has times.
+    std::vector<std::uint64_t>
+        live;  // Of the first groups of the analysis; the last is all others.
+};
+constexpr std::size_t maxGrowing = 9;
+
 struct Analysis {
     std::string trace;
     std::map<std::string, std::string> facts;  // What the trace says about itself.
@@ -51,7 +62,8 @@ struct Analysis {
     std::vector<SizeRow> sizes;    // Those that occur, the smallest first.
     std::vector<GroupRow> groups;  // The largest at the peak first.
     std::vector<Point> timeline;
-    std::vector<SizeClass> classes;  // At the end. For their sizes.
+    std::vector<GrowthPoint> growth;  // Of at most `maxGrowing` groups. The peak is a point.
+    std::vector<SizeClass> classes;   // At the end. For their sizes.
     std::vector<FillColumn> fill;
 };
 

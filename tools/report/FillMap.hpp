@@ -1,10 +1,8 @@
-// How full the buckets of each size class are over the course of a trace, at regular moments, whose
-// number is bounded.
+// How full the buckets of each size class are over the course of a trace.
 
 #ifndef OBR_TOOLS_REPORT_FILLMAP_HPP
 #define OBR_TOOLS_REPORT_FILLMAP_HPP
 
-#include <cstddef>
 #include <cstdint>
 #include <vector>
 
@@ -23,23 +21,16 @@ struct FillColumn {
     std::vector<Cell> cells;
 };
 
-class FillMap {
-public:
-    static constexpr std::size_t maxColumns = 128;
-
-    // After each event.
-    void Add(std::uint64_t event, const PoolModel& pools) {
-        if (event % interval == 0) { AddColumn(event, pools); }
+inline FillColumn FillOf(std::uint64_t event, const PoolModel& pools) {
+    FillColumn column = {event, {}};
+    const std::vector<SizeClass>& classes = pools.Classes();
+    for (std::uint32_t number = 0; number < classes.size(); ++number) {
+        const SizeClass& sizeClass = classes[number];
+        if (sizeClass.records == 0) { continue; }
+        column.cells.push_back({number, sizeClass.usedRecords, sizeClass.records});
     }
-
-    const std::vector<FillColumn>& Columns() const { return columns; }
-
-private:
-    void AddColumn(std::uint64_t event, const PoolModel& pools);
-
-    std::vector<FillColumn> columns;
-    std::uint64_t interval = 1;
-};
+    return column;
+}
 
 }  // namespace Report
 

@@ -6,6 +6,7 @@
 #include <charconv>
 #include <cstdint>
 #include <map>
+#include <optional>
 #include <utility>
 #include <vector>
 
@@ -32,7 +33,9 @@ void AddTally(Json& json, const Tally& tally) {
     json["padding"] = tally.padding;
     json["lifetimes"] = tally.lifetimes;
     json["cleared"] = tally.dropped;
-    json["never"] = tally.never;
+    json["temporary"] = tally.temporary;
+    json["never"] = tally.never.blocks;
+    json["never_bytes"] = tally.never.bytes;
 }
 
 Json ToJson(const Runs& runs) {
@@ -41,10 +44,16 @@ Json ToJson(const Runs& runs) {
             {"clear_blocks", runs.clearable}, {"clear_runs", runs.numClears}};
 }
 
+Json Seconds(const std::optional<std::uint64_t>& milliseconds) {
+    if (!milliseconds.has_value()) { return nullptr; }
+    return static_cast<double>(*milliseconds) / 1000;
+}
+
 Json ToJson(const Moment& moment) {
-    return {{"event", moment.event},       {"asked", moment.asked},      {"blocks", moment.blocks},
-            {"pools", moment.pools},       {"one_pool", moment.onePool}, {"heap", moment.heap},
-            {"heap_chunks", moment.chunks}};
+    return {{"event", moment.event}, {"seconds", Seconds(moment.milliseconds)},
+            {"asked", moment.asked}, {"blocks", moment.blocks},
+            {"pools", moment.pools}, {"one_pool", moment.onePool},
+            {"heap", moment.heap},   {"heap_chunks", moment.chunks}};
 }
 
 // A number if the fact is one, null if the trace does not have it.
@@ -87,6 +96,7 @@ void AddTotals(Json& json, const Analysis& analysis) {
     json["peak"] = ToJson(analysis.peak);
     json["most"] = ToJson(analysis.most);
     json["most"].erase("event");
+    json["most"].erase("seconds");
     json["together"] = ToJson(analysis.runs);
     std::vector<std::uint64_t> bounds;
     for (std::uint64_t bound = 10; bounds.size() + 1 < numLifetimes; bound *= 10) {
@@ -119,8 +129,8 @@ void AddGroups(Json& json, const Analysis& analysis, const JsonLimits& limits) {
 
 void AddTimeline(Json& json, const Analysis& analysis) {
     Json lines = Json::object();
-    for (const char* key :
-         {"event", "asked", "least_asked", "blocks", "pools", "one_pool", "heap", "heap_chunks"}) {
+    for (const char* key : {"event", "seconds", "asked", "least_asked", "blocks", "pools",
+                            "one_pool", "heap", "heap_chunks"}) {
         lines[key] = Json::array();
     }
     for (const Point& point : analysis.timeline) {
@@ -129,6 +139,26 @@ void AddTimeline(Json& json, const Analysis& analysis) {
         lines["least_asked"].push_back(point.leastAsked);
     }
     json["timeline"] = std::move(lines);
+}
+
+void AddGrowth(Json& json, const Analysis& analysis, const JsonLimits& limits) {
+    const std::size_t numGrowing = std::min(analysis.groups.size(), maxGrowing);
+    Json growth = {{"event", Json::array()}, {"seconds", Json::array()}, {"groups", Json::array()}};
+    for (std::size_t i = 0; i < numGrowing; ++i) {
+        growth["groups"].push_back(
+            {{"name", Trace::CutText(analysis.groups[i].name, limits.nameBytes)},
+             {"bytes", Json::array()}});
+    }
+    growth["others"] = Json::array();
+    for (const GrowthPoint& point : analysis.growth) {
+        growth["event"].push_back(point.event);
+        growth["seconds"].push_back(Seconds(point.milliseconds));
+        for (std::size_t i = 0; i < numGrowing; ++i) {
+            growth["groups"][i]["bytes"].push_back(point.live[i]);
+        }
+        growth["others"].push_back(point.live.back());
+    }
+    json["growth"] = std::move(growth);
 }
 
 // A row per size class that ever has a bucket; those with the most bytes if they are too many.
@@ -180,6 +210,7 @@ std::string ToJson(const Analysis& analysis, const JsonLimits& limits) {
     AddSizes(json, analysis);
     AddGroups(json, analysis, limits);
     AddTimeline(json, analysis);
+    AddGrowth(json, analysis, limits);
     AddFill(json, analysis, limits);
     return json.dump(-1, ' ', false, Json::error_handler_t::replace);
 }

@@ -42,8 +42,9 @@ struct Tally {
     std::uint64_t padding = 0;  // Bytes that rounding adds to those.
     BlockSum live;
     std::array<std::uint64_t, numLifetimes> lifetimes = {};  // Of released blocks.
-    std::uint64_t dropped = 0;  // Released blocks that went when their pool was cleared.
-    std::uint64_t never = 0;    // Blocks alive when their pool was destroyed, or at the end.
+    std::uint64_t dropped = 0;    // Released blocks that went when their pool was cleared.
+    std::uint64_t temporary = 0;  // Released blocks that the next event of their thread freed.
+    BlockSum never;               // Alive when their pool was destroyed, or at the end.
 
     BlockSum atPeak;  // Alive at the peak of the trace. Set by Finish.
 
@@ -57,7 +58,7 @@ struct Tally {
     // At the end of the trace.
     void Finish(std::uint64_t peak) {
         if (changed <= peak) { atPeak = live; }
-        never += live.blocks;
+        never.Add(live);
     }
 
     void Add(const Tally& other);
@@ -73,7 +74,8 @@ inline void Tally::Add(const Tally& other) {
     live.Add(other.live);
     for (std::size_t bin = 0; bin < numLifetimes; ++bin) { lifetimes[bin] += other.lifetimes[bin]; }
     dropped += other.dropped;
-    never += other.never;
+    temporary += other.temporary;
+    never.Add(other.never);
     atPeak.Add(other.atPeak);
 }
 

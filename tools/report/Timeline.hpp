@@ -6,6 +6,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
 #include <vector>
 
 namespace Report {
@@ -13,6 +14,8 @@ namespace Report {
 // Figures of one moment, the sizes in bytes.
 struct Moment {
     std::uint64_t event = 0;
+    std::optional<std::uint64_t> milliseconds;  // If the trace has times.
+
     std::uint64_t asked = 0;    // Asked for by the live blocks,
     std::uint64_t blocks = 0;   // and their number.
     std::uint64_t pools = 0;    // Held by pools, one per traced pool,

@@ -41,6 +41,7 @@ enum class Entry : std::uint8_t {
     Thread,     // The number of the thread of the following entries.
     Named,      // Pool, text.
     Info,       // Key and value, both texts.
+    Time,       // Milliseconds since the recording began.
 };
 
 constexpr std::uint8_t entryMask = 0x0F;

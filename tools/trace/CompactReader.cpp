@@ -113,6 +113,10 @@ bool CompactReader::ReadEntry(Event& event) {
             event.key = TakeText();
             event.text = TakeText();
             return true;
+        case Entry::Time:
+            event.kind = Kind::Time;
+            event.size = TakeNumber();
+            return true;
     }
     isSound = false;
     return false;

@@ -24,6 +24,7 @@ public:
     bool Next(Event& event) override;
     // The line that `mempool text` prints for the event.
     std::uint64_t Position() const override { return number; }
+    std::uint64_t Thread() const override { return thread; }
     std::string Problem() const override;
 
 private:

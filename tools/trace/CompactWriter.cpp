@@ -55,6 +55,10 @@ void CompactWriter::Write(const Event& event) {
             AppendText(event.key);
             AppendText(event.text);
             break;
+        case Kind::Time:
+            Tag(Entry::Time, 0);
+            AppendNumber(event.size);
+            break;
         case Kind::Malformed:
             break;
     }

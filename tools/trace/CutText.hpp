@@ -1,4 +1,4 @@
-// Cuts texts in UTF-8 between characters. What is not UTF-8 is cut anywhere.
+// Cuts texts in UTF-8 between characters. Bytes that are not UTF-8 are cut anywhere.
 
 #ifndef OBR_TOOLS_TRACE_CUTTEXT_HPP
 #define OBR_TOOLS_TRACE_CUTTEXT_HPP
@@ -9,18 +9,29 @@
 
 namespace Trace {
 
+// Whether a character begins at this place of the text.
+constexpr bool IsCharacterAt(std::string_view text, std::size_t place) {
+    return (static_cast<unsigned char>(text[place]) & 0xC0) != 0x80;
+}
+
 // The longest beginning of the text that has at most `bytes` bytes and ends with a whole character.
 constexpr std::string_view WholeCharacters(std::string_view text, std::size_t bytes) {
     if (text.size() <= bytes) { return text; }
-    while (bytes > 0 && (static_cast<unsigned char>(text[bytes]) & 0xC0) == 0x80) { --bytes; }
+    while (bytes > 0 && !IsCharacterAt(text, bytes)) { --bytes; }
     return text.substr(0, bytes);
 }
 
-// The text, or if it has more than `bytes` bytes, its beginning and "...", together at most as
-// many.
+// The text, or if it has more than `bytes` bytes, its beginning, "..." and its end, with at most as
+// many together.
 inline std::string CutText(std::string_view text, std::size_t bytes) {
     if (text.size() <= bytes) { return std::string(text); }
-    return std::string(WholeCharacters(text, bytes - 3)) + "...";
+    constexpr std::string_view dots = "...";
+    const std::size_t tail = (bytes - dots.size()) / 2;
+    std::size_t start = text.size() - tail;
+    while (start < text.size() && !IsCharacterAt(text, start)) { ++start; }
+    return std::string(WholeCharacters(text, bytes - dots.size() - tail))
+        .append(dots)
+        .append(text.substr(start));
 }
 
 }  // namespace Trace

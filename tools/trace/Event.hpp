@@ -20,6 +20,7 @@ enum class Kind : std::uint8_t {
     Cleared,    // A pool drops all its blocks.
     Named,      // The name of a pool.
     Info,       // A fact about the whole recording.
+    Time,       // When the events that follow happened.
     Malformed,  // A line that begins like an event and has no known form. The last kind.
 };
 
@@ -29,6 +30,7 @@ struct Event {
     std::uint64_t pool = 0;
     std::uint64_t block = 0;
     std::uint64_t size = 0;  // Bytes asked for; the largest number if 64 bits do not hold them.
+                             // Of Time, milliseconds since the recording began.
     std::string_view key;    // Of Info; its value is in `text`.
     std::string_view text;
 };
@@ -45,6 +47,9 @@ public:
 
     // The line number of the last event, from 1 on, for messages.
     virtual std::uint64_t Position() const = 0;
+
+    // The number of the thread of the last event, or 0 if the trace does not have it.
+    virtual std::uint64_t Thread() const { return 0; }
 
     // After the end: why the trace is not complete, or empty if it is.
     virtual std::string Problem() const = 0;

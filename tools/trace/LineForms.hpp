@@ -4,10 +4,10 @@
 //     xmpt:c:POOL               xmpt:x:POOL
 //     xmpt:d:POOL               xmpt:n:POOL:TEXT
 //     xmpt:a:POOL:BLOCK:SIZE    xmpt:i:KEY:TEXT
-//     xmpt:f:POOL:BLOCK:
+//     xmpt:f:POOL:BLOCK:        xmpt:t:MILLISECONDS
 //
-// POOL and BLOCK are addresses of 16 hexadecimal digits, SIZE is decimal. A KEY has no colon. A
-// TEXT ends with the line, and a free ends with an empty field.
+// POOL and BLOCK are addresses of 16 hexadecimal digits, SIZE and MILLISECONDS are decimal. A KEY
+// has no colon. A TEXT ends with the line, and a free ends with an empty field.
 
 #ifndef OBR_TOOLS_TRACE_LINEFORMS_HPP
 #define OBR_TOOLS_TRACE_LINEFORMS_HPP
@@ -42,6 +42,7 @@ inline constexpr LineForm lineForms[] = {
     {Kind::Cleared, 'x', {Field::Pool}},
     {Kind::Named, 'n', {Field::Pool, Field::Text}},
     {Kind::Info, 'i', {Field::Key, Field::Text}},
+    {Kind::Time, 't', {Field::Size}},
 };
 static_assert(std::size(lineForms) == static_cast<std::size_t>(Kind::Malformed),
               "Every kind of event has the form of its line.");

@@ -17,7 +17,7 @@ constexpr std::uint64_t maxBlockSize = 0x3FFFFFFF;  // Of any pool.
 std::optional<Fault> Resolver::Resolve(const Event& event, Step& step) {
     step = {event.kind, 0, {}};
     if (event.kind == Kind::Malformed) { return Fault::Malformed; }
-    if (event.kind == Kind::Info) { return std::nullopt; }
+    if (event.kind == Kind::Info || event.kind == Kind::Time) { return std::nullopt; }
     if (event.kind == Kind::Created) { return Create(event.pool, step); }
 
     const auto found = livePools.find(event.pool);
@@ -41,6 +41,7 @@ std::optional<Fault> Resolver::Resolve(const Event& event, Step& step) {
             break;
         case Kind::Created:
         case Kind::Info:
+        case Kind::Time:
         case Kind::Malformed:
             break;  // Handled above.
     }

@@ -47,7 +47,7 @@ inline constexpr std::array faultNames = {
 
 class Resolver {
 public:
-    // Sets `step`, of which an Info has only the kind, or returns why there is none.
+    // Sets `step`, or returns why there is none. Only the kind of an Info or a Time is set.
     std::optional<Fault> Resolve(const Event& event, Step& step);
 
     // The blocks that the last step, a Cleared or a Destroyed, has dropped, by index, which is

@@ -29,8 +29,13 @@ bool StepReader::Next(Step& step) {
             continue;
         }
         anyGood = true;
-        if (step.kind != Kind::Info) { return true; }
-        facts[std::string(event.key)] = event.text;
+        if (step.kind == Kind::Info) {
+            facts[std::string(event.key)] = event.text;
+        } else if (step.kind == Kind::Time) {
+            milliseconds = event.size;
+        } else {
+            return true;
+        }
     }
     CheckEnd();
     return false;

@@ -8,6 +8,7 @@
 #include <cstdint>
 #include <map>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -36,12 +37,17 @@ public:
     // Messages call the trace `traceName`.
     StepReader(std::unique_ptr<EventSource> events, std::string traceName);
 
-    // Reads the next step, never an Info; false at the end. Throws std::runtime_error if the input
-    // has no valid line at all: it is not a trace.
+    // Reads the next step, never an Info or a Time; false at the end. Throws std::runtime_error if
+    // the input has no valid line at all: it is not a trace.
     bool Next(Step& step);
 
     const std::string& Name() const { return name; }
     std::uint64_t Position() const { return source->Position(); }
+    std::uint64_t Thread() const { return source->Thread(); }
+
+    // When the last step happened, since the recording began. Empty if the trace does not say it.
+    std::optional<std::uint64_t> Milliseconds() const { return milliseconds; }
+
     const Resolver& Blocks() const { return resolver; }
     Resolver& Blocks() { return resolver; }
     const BadLines& Bad() const { return badLines; }
@@ -61,6 +67,7 @@ private:
     Resolver resolver;
     BadLines badLines;
     std::map<std::string, std::string> facts;
+    std::optional<std::uint64_t> milliseconds;
     bool anyGood = false;
 };
 

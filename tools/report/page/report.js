@@ -1,10 +1,10 @@
-// Draws the page from the JSON in it, whose keys docs/report.md tells. Names come from the trace,
-// that is from anywhere: they become text, never markup.
+// Draws the page from the JSON in it. docs/report.md lists its keys. Names come from the trace, so
+// from anywhere: they become text, never markup.
 "use strict";
 
 const data = JSON.parse(document.getElementById("data").textContent);
 
-// Numbers as the text report has them: 1,234,567; three digits and a unit; a share in per cent.
+// Numbers as in the text report: 1,234,567; three digits and a unit; a share in per cent.
 
 const count = (number) => number.toLocaleString("en-US");
 
@@ -20,7 +20,7 @@ function bytes(value) {
 
 const percent = (part, whole) => (whole === 0 ? "-" : (100 * part / whole).toFixed(1) + " %");
 
-// The same for an axis, whose ticks need no more digits than they have.
+// The same for an axis, without zeros at the end.
 const bytesTick = (value) => bytes(value).replace(/\.0+ |(\.\d*?)0+ /, "$1 ");
 const countTick = (value) =>
   value >= 1e9 ? value / 1e9 + " G" : value >= 1e6 ? value / 1e6 + " M" : count(value);
@@ -32,6 +32,27 @@ const sizeText = (row) =>
   row.smallest === row.largest ? count(row.smallest) : count(row.smallest) + "–" + count(row.largest);
 
 const tracedPools = sum(data.groups.map((group) => group.pools));
+const colours = ["#4e79a7", "#f28e2b", "#59a14f", "#b07aa1", "#e15759", "#76b7b2", "#edc948", "#9c755f", "#ff9da7", "#9aa0a6"];
+
+// Without the arguments of templates, and if it is still too long, without its middle.
+function shortName(name, most) {
+  for (let longer = ""; name.length > most && name !== longer;) {
+    longer = name;
+    name = name.replace(/<[^<>]*>/g, "");
+  }
+  const letters = Array.from(name);
+  if (letters.length <= most) { return name; }
+  const tail = Math.floor((most - 1) / 2);
+  return letters.slice(0, most - 1 - tail).join("") + "…" + letters.slice(-tail).join("");
+}
+
+// Lets a long name break at its punctuation.
+function breakable(selection) {
+  selection.each(function () {
+    const parts = this.textContent.split(/(?<=[^\w\s([{<])|(?=[([{<])/);
+    this.replaceChildren(...parts.flatMap((part) => [part, document.createElement("wbr")]));
+  });
+}
 
 // A tooltip follows the pointer and stays within the window.
 
@@ -53,7 +74,7 @@ function tipFor(selection, text) {
     .on("mouseout", hideTip);
 }
 
-// An SVG as wide as its place, with a name and a text for those who do not see it.
+// An SVG as wide as its place, with a title and a description for those who do not see it.
 function chart(id, height, margin, title, description) {
   const place = byId(id);
   place.selectAll("*").remove();
@@ -82,9 +103,29 @@ function label(box, text, x, y, anchor) {
   box.plot.append("text").attr({x: x, y: y, "text-anchor": anchor || "start"}).text(text);
 }
 
-function eventAxis(box, x) {
+// The axis of time, in seconds if the trace has them and the reader wants them.
+
+const hasSeconds = data.timeline.seconds.some((value) => value !== null);
+let unit = hasSeconds ? "seconds" : "event";
+
+const times = (lines) => lines[unit].map((value) => value || 0);
+
+function timeScale(box, key) {
+  const end = key === "event" ? data.events : d3.max(data.timeline.seconds.concat(data.growth.seconds)) || 1;
+  return d3.scale.linear().domain([0, end]).range([0, box.width]);
+}
+
+function timeAxis(box, x, key) {
   axis(box, x, "bottom", Math.max(2, Math.floor(box.width / 110)), countTick);
-  label(box, "events", box.width, box.height + 36, "end");
+  label(box, key === "event" ? "events" : key, box.width, box.height + 36, "end");
+}
+
+function unitChoice() {
+  if (!hasSeconds) { return; }
+  byId("unit").selectAll("button").data(["seconds", "event"]).enter().append("button").attr("type", "button")
+    .text((key) => (key === "event" ? "events" : key))
+    .on("click", (key) => { unit = key; unitChoice(); growth(); timeline(); });
+  byId("unit").selectAll("button").attr("aria-pressed", (key) => String(key === unit));
 }
 
 function legend(id, entries, draw) {
@@ -97,16 +138,22 @@ function legend(id, entries, draw) {
   });
 }
 
-// A table of plain text.
+// A table of plain text. A name may break.
 function table(id, heads, rows) {
   const place = byId(id);
   place.append("thead").append("tr").selectAll("th").data(heads).enter().append("th")
     .attr("scope", "col").text(String);
   place.append("tbody").selectAll("tr").data(rows).enter().append("tr")
     .selectAll("td").data((row) => row).enter().append("td").text(String);
+  if (heads[0] === "Group") { breakable(place.selectAll("td:first-child").attr("class", "name")); }
 }
 
-// What stands on top.
+// Says of a table that is wider than its place that it scrolls.
+function markWide() {
+  d3.selectAll(".scroll").classed("wide", function () { return this.scrollWidth > this.clientWidth; });
+}
+
+// The top of the page.
 
 function figure(path) {
   return path.split(".").reduce((value, key) => value[key], data);
@@ -115,7 +162,7 @@ function figure(path) {
 function heading() {
   const program = data.program || data.trace;
   document.title = "Memory of " + program;
-  byId("name").text(program);
+  byId("name").text(program).classed("long", program.length > 50);
   const facts = [];
   if (data.program) { facts.push(data.trace); }
   facts.push(count(data.events) + " events");
@@ -130,28 +177,33 @@ function heading() {
   if (data.bad_lines.total > 0) {
     const faults = Object.keys(data.bad_lines.faults)
       .map((fault) => count(data.bad_lines.faults[fault]) + " × " + fault);
-    banners.push("Left out as bad lines: " + faults.join(", "));
+    banners.push("Ignored bad lines: " + faults.join(", "));
   }
   byId("banners").selectAll("p").data(banners).enter().append("p").attr("class", "banner").text(String);
+}
+
+// "65 % of it by parse, 20 % by lex": the groups that hold most of the peak, if there are several.
+function holders() {
+  const shares = data.groups.filter((group) => group.at_peak.bytes >= 0.05 * data.peak.asked).slice(0, 3)
+    .map((group) => `${(100 * group.at_peak.bytes / data.peak.asked).toFixed(0)} % by ${shortName(group.name, 60)}`);
+  if (data.num_groups < 2 || shares.length === 0) { return ""; }
+  return ": " + (shares.length > 1 ? shares.slice(0, -1).join(", ") + " and " : "") + shares[shares.length - 1];
 }
 
 function verdict() {
   const peak = data.peak;
   const beside = (held) => {
-    const ratio = peak.heap > 0 ? held / peak.heap_chunks - 1 : 0;
-    return Math.abs(ratio) < 0.03 ? "about as much memory as"
-      : (100 * Math.abs(ratio)).toFixed(0) + " % " + (ratio < 0 ? "less memory than" : "more memory than");
+    const ratio = peak.heap_chunks > 0 ? held / peak.heap_chunks - 1 : 0;
+    return Math.abs(ratio) < 0.03 ? "about as much as"
+      : (100 * Math.abs(ratio)).toFixed(0) + (ratio < 0 ? " % less than" : " % more than");
   };
-  const parts = [tracedPools > 1
-    ? `At the peak a pool for each group would hold ${beside(peak.pools)} the heap with its headers, a single pool for all ${beside(peak.one_pool)} it.`
-    : `At the peak pools would hold ${beside(peak.pools)} the heap with its headers.`,
-    `${percent(data.in_records.blocks, data.blocks)} of the blocks fit into a bucket.`];
-  if (data.together.clear_runs > 0) {
-    parts.push(`${percent(data.together.clear_blocks, data.blocks)} could go with ` +
-      `${count(data.together.clear_runs)} ${data.together.clear_runs === 1 ? "Clear" : "Clears"} ` +
-      `instead of one by one.`);
-  }
-  byId("verdict").text(data.blocks === 0 ? "The trace has no block." : parts.join(" "));
+  const heap = `the heap’s ${bytes(peak.heap_chunks)}`;
+  byId("verdict").text(data.blocks === 0 ? "The trace has no block." :
+    `At the peak the program has asked for ${bytes(peak.asked)} in ${count(peak.blocks)} blocks${holders()}. ` +
+    (tracedPools > 1
+      ? `A pool for each group would hold ${bytes(peak.pools)} for them, ${beside(peak.pools)} ${heap}; ` +
+        `a single pool for all ${bytes(peak.one_pool)}, ${beside(peak.one_pool)} the heap.`
+      : `Pools would hold ${bytes(peak.pools)} for them, ${beside(peak.pools)} ${heap}.`));
 
   const tile = (name, path, show, note) => {
     const place = byId("tiles").append("div");
@@ -160,18 +212,14 @@ function verdict() {
     place.append("dd").text(note);
   };
   const ofBlocks = (value) => percent(value, data.blocks);
-  tile("Asked for at the peak", "peak.asked", bytes, `in ${count(peak.blocks)} blocks`);
-  tile("Pools hold then", "peak.pools", bytes, `${percent(peak.pools, peak.heap_chunks)} of the heap’s ${bytes(peak.heap_chunks)}, ` +
-    `${percent(peak.pools, peak.heap)} without its headers`);
-  tile("Blocks in all", "blocks", count, `of ${bytes(data.bytes)}, ${percent(shortLived(data), data.blocks)} freed within 100 events`);
-  tile("Fit into a bucket", "in_records.blocks", ofBlocks, `rounding adds ${percent(data.padding, data.in_records.bytes)} to their bytes`);
-  tile("One Clear would free", "together.clear_blocks", ofBlocks, `of the blocks, in ${count(data.together.clear_runs)} rows of frees`);
-  tile("Never freed", "never", ofBlocks, "of the blocks, while their pool lives");
-  // Rows of three, or of four.
+  tile("Blocks in all", "blocks", count, `of ${bytes(data.bytes)}`);
+  tile("Temporary", "temporary", ofBlocks, "of the blocks, freed by the next event of their thread");
+  tile("Leaked", "never_bytes", bytes, `in ${count(data.never)} blocks that are never freed`);
+  tile("Fit into a bucket", "in_records.blocks", ofBlocks, `of the blocks; rounding adds ${percent(data.padding, data.in_records.bytes)} to their bytes`);
+  // Rows of four, or of five.
   byId("tiles").classed("many", typeof data.allocation_share === "number");
   if (typeof data.allocation_share === "number") {
-    tile("Most blocks at any time", "most.blocks", count, `${count(peak.blocks)} at the peak`);
-    tile("Time in allocation calls", "allocation_share", (share) => percent(share, 1), "of the processor time: no allocator can save more");
+    tile("Time in allocation calls", "allocation_share", (share) => percent(share, 1), "of the processor time, estimated");
   }
   byId("settings").text(`buckets of ${data.settings.bucket_size} bytes, records of ` +
     `${data.settings.min_record_size} to ${data.settings.max_record_size}, sizes rounded to ` +
@@ -179,12 +227,80 @@ function verdict() {
     (data.settings.keep_empty_buckets ? "kept" : "released"));
 }
 
-// Live bytes. One pool for all is another thing only where there are several.
+// The groups at the peak, a bar each. Those that the chart of live bytes has too have its colours.
+
+function peakBars() {
+  const shown = data.groups.filter((group, i) => i === 0 || group.at_peak.bytes >= 0.001 * data.peak.asked).slice(0, 12);
+  const row = 34;
+  const box = chart("peak", Math.max(shown.length, 1) * row, {left: 0, right: 0, top: 0, bottom: 0}, "Bytes at the peak by group",
+    shown.map((group) => `${group.name}: ${bytes(group.at_peak.bytes)}`).join(", "));
+  const isNarrow = box.width < 480;
+  const x = d3.scale.linear().domain([0, data.peak.asked || 1]).range([0, box.width]);
+  const bars = box.plot.selectAll("g").data(shown).enter().append("g").attr("transform", (group, i) => `translate(0,${i * row})`);
+  bars.append("rect").attr({class: "bar", y: 18, height: 9, rx: 2, width: (group) => Math.max(x(group.at_peak.bytes), 1),
+    fill: (group, i) => colours[Math.min(i, colours.length - 1)]});
+  bars.append("text").attr({class: "mark", y: 13}).text((group) => shortName(group.name, Math.floor((box.width - (isNarrow ? 110 : 220)) / 7.5)));
+  bars.append("text").attr({x: box.width, y: 13, "text-anchor": "end"}).text((group) =>
+    `${bytes(group.at_peak.bytes)}, ${percent(group.at_peak.bytes, data.peak.asked)}` +
+    (isNarrow ? "" : `, ${count(group.at_peak.blocks)} blocks`));
+  tipFor(bars.append("rect").attr({class: "hit", width: box.width, height: row - 2}), (group) =>
+    `${group.name}\nAt the peak: ${bytes(group.at_peak.bytes)} in ${count(group.at_peak.blocks)} blocks\n` +
+    `In all: ${bytes(group.bytes)} in ${count(group.blocks)} blocks`);
+  byId("peak-note").text(shown.length < data.num_groups ? `The ${shown.length} largest of ${count(data.num_groups)}.` : "");
+}
+
+// Live bytes, the groups stacked, the largest at the bottom. Those that never hold a hundredth of the
+// peak are among the others.
+
+function growth() {
+  const lines = data.growth;
+  const points = d3.range(lines.event.length);
+  const sums = points.map((i) => lines.others[i] + sum(lines.groups.map((group) => group.bytes[i])));
+  const layers = lines.groups.map((group, i) => ({name: group.name, bytes: group.bytes, colour: colours[i]}))
+    .filter((layer) => d3.max(layer.bytes) >= 0.01 * d3.max(sums));
+  const others = points.map((i) => sums[i] - sum(layers.map((layer) => layer.bytes[i])));
+  if (d3.max(others) > 0) { layers.push({name: "all others", bytes: others, colour: colours[colours.length - 1]}); }
+  const box = chart("growth", 300, {left: 62, right: 10, top: 22, bottom: 42}, "Live bytes over time by group",
+    `At the peak ${bytes(data.peak.asked)} are live.`);
+  const x = timeScale(box, unit);
+  const y = d3.scale.linear().domain([0, d3.max(sums) || 1]).nice().range([box.height, 0]);
+  axis(box, y, "left", 5, bytesTick);
+  timeAxis(box, x, unit);
+  label(box, "bytes", -6, -10, "end");
+  const at = times(lines).map(x);
+  const below = points.map(() => 0);
+  layers.forEach((layer) => {
+    const low = below.slice();
+    layer.bytes.forEach((value, i) => { below[i] += value; });
+    box.plot.append("path").attr({class: "layer", fill: layer.colour,
+      d: d3.svg.area().x((i) => at[i]).y0((i) => y(low[i])).y1((i) => y(low[i] + layer.bytes[i]))(points)});
+  });
+  pointer(box, at, (i) => [`Event ${count(lines.event[i])}`].concat(hasSeconds ? `${lines.seconds[i] || 0} s` : [],
+    `In all: ${bytes(sums[i])}`, layers.map((layer) => `${shortName(layer.name, 40)}: ${bytes(layer.bytes[i])}`)));
+  legend("growth-legend", layers.map((layer) => ({name: shortName(layer.name, 48), colour: layer.colour})),
+    (svg, entry) => svg.append("rect").attr({width: 12, height: 12, rx: 2, fill: entry.colour}));
+  byId("growth-legend").selectAll("svg").attr("width", 12);
+}
+
+// A line at the point nearest to the pointer, with the figures of it.
+function pointer(box, at, lines) {
+  const cursor = box.plot.append("line").attr({class: "cursor", y1: 0, y2: box.height}).style("display", "none");
+  const move = function () {
+    const i = Math.min(d3.bisectLeft(at, d3.mouse(this)[0]), at.length - 1);
+    cursor.attr({x1: at[i], x2: at[i]}).style("display", null);
+    showTip(lines(i).join("\n"));
+  };
+  box.plot.append("rect").attr({width: box.width, height: box.height, fill: "transparent"})
+    .on("mousemove", move).on("touchstart", move).on("touchmove", move)
+    .on("mouseout", () => { cursor.style("display", "none"); hideTip(); });
+}
+
+// What is held. One pool for all is a line of its own if there are several pools.
 
 const series = [
-  {key: "asked", name: "Asked for, and in grey how far it falls in between", title: "Asked for"},
-  {key: "heap_chunks", name: "Heap, with its headers", title: "Heap"},
-  {key: "pools", name: tracedPools > 1 ? "Pools, one a group" : "Pools", title: tracedPools > 1 ? "Pools, one a group" : "Pools"},
+  {key: "asked", name: "Asked for, and in grey the range within each interval", title: "Asked for"},
+  {key: "heap_chunks", name: "Heap", title: "Heap"},
+  {key: "pools", name: tracedPools > 1 ? "Pools, one per group" : "Pools", title: tracedPools > 1 ? "Pools, one per group" : "Pools"},
   {key: "one_pool", name: "One pool for all", title: "One pool for all"},
 ].filter((line) => line.key !== "one_pool" || tracedPools > 1);
 
@@ -192,17 +308,18 @@ function timeline() {
   const lines = data.timeline;
   const highest = d3.max(series, (line) => d3.max(lines[line.key])) || 1;
   const box = chart("timeline", 320, {left: 62, right: 10, top: 22, bottom: 42},
-    "Live bytes over the trace",
+    "What pools and the heap would hold",
     `Asked for at the peak, event ${count(data.peak.event)}: ${bytes(data.peak.asked)}. ` +
     `Pools hold ${bytes(data.peak.pools)} then, the heap ${bytes(data.peak.heap_chunks)}.`);
-  const x = d3.scale.linear().domain([0, data.events]).range([0, box.width]);
+  const x = timeScale(box, unit);
   const y = d3.scale.linear().domain([0, highest]).nice().range([box.height, 0]);
   axis(box, y, "left", 5, bytesTick);
-  eventAxis(box, x);
+  timeAxis(box, x, unit);
   label(box, "bytes", -6, -10, "end");
 
   const points = d3.range(lines.event.length);
-  const at = (i) => x(lines.event[i]);
+  const places = times(lines).map(x);
+  const at = (i) => places[i];
   const area = (low) => d3.svg.area().x(at).y0((i) => y(low(i))).y1((i) => y(lines.asked[i]))(points);
   box.plot.append("path").attr({class: "asked-area", d: area(() => 0)});
   box.plot.append("path").attr({class: "asked-band", d: area((i) => lines.least_asked[i])});
@@ -211,25 +328,15 @@ function timeline() {
       d: d3.svg.line().x(at).y((i) => y(lines[line.key][i]))(points)});
   });
 
-  const px = x(data.peak.event);
+  const px = x(data.peak[unit] || 0);
   const side = px > box.width - 130 ? -1 : 1;
   box.plot.append("circle").attr({cx: px, cy: y(data.peak.asked), r: 4, fill: "var(--text)"});
   const top = y(d3.max(series, (line) => data.peak[line.key]));
   box.plot.append("text").attr({class: "mark", x: px + 8 * side, y: Math.max(top - 8, -8),
     "text-anchor": side < 0 ? "end" : "start"}).text("peak: asked for " + bytes(data.peak.asked));
 
-  const cursor = box.plot.append("line").attr({class: "cursor", y1: 0, y2: box.height})
-    .style("display", "none");
-  const move = function () {
-    const event = x.invert(d3.mouse(this)[0]);
-    const i = Math.min(d3.bisectLeft(lines.event, event), points.length - 1);
-    cursor.attr({x1: at(i), x2: at(i)}).style("display", null);
-    showTip([`Event ${count(lines.event[i])}`].concat(series.map((line) =>
-      `${line.title}: ${bytes(lines[line.key][i])}`), `Blocks: ${count(lines.blocks[i])}`).join("\n"));
-  };
-  box.plot.append("rect").attr({width: box.width, height: box.height, fill: "transparent"})
-    .on("mousemove", move).on("touchstart", move).on("touchmove", move)
-    .on("mouseout", () => { cursor.style("display", "none"); hideTip(); });
+  pointer(box, places, (i) => [`Event ${count(lines.event[i])}`].concat(series.map((line) =>
+    `${line.title}: ${bytes(lines[line.key][i])}`), `Blocks: ${count(lines.blocks[i])}`));
 
   legend("timeline-legend", series, (svg, line) => {
     if (line.key === "asked") {
@@ -334,20 +441,23 @@ function lifetimes() {
       (bin.kind === "never" ? "" : `\nuntil then ${percent(bin.within, data.blocks)}`));
 }
 
-// Fill of the size classes as a heat map, with the most that each held at its right.
+// Fill of the size classes as a heat map, with the most that each held at its right. Classes that
+// never hold a hundredth of the bytes are left to the table.
 
 function fillMap() {
   const columns = data.fill.event;
-  const classes = data.fill.classes.slice().reverse();  // The smallest at the bottom.
+  const heldAt = (row) => d3.max(row.records) * (row.data_size + 4);
+  const all = sum(data.fill.classes.map(heldAt));
+  const classes = data.fill.classes.filter((row) => heldAt(row) >= all / 100).reverse();  // The smallest at the bottom.
   const held = (row, i) => row.records[i] * (row.data_size + 4);
-  const most = classes.map((row) => d3.max(row.records) * (row.data_size + 4));
+  const most = classes.map(heldAt);
   const cell = classes.length > 24 ? 11 : 16;
   const box = chart("fill", classes.length * cell + 64, {left: 48, right: 70, top: 20, bottom: 42},
     "Fill of the size classes over the trace", "A table behind the chart has each class at its fullest.");
   if (classes.length === 0) { return; }
   const style = getComputedStyle(document.documentElement);
   const colour = d3.interpolateLab(style.getPropertyValue("--fill-low").trim(), style.getPropertyValue("--fill-high").trim());
-  const x = d3.scale.linear().domain([0, data.events]).range([0, box.width]);
+  const x = timeScale(box, "event");
   const cells = [];
   classes.forEach((row, r) => row.records.forEach((records, i) => {
     if (records > 0) { cells.push({row: row, r: r, i: i, fill: row.used[i] / records}); }
@@ -368,7 +478,7 @@ function fillMap() {
     (value, r) => `Up to ${classes[r].data_size} bytes: at most ${bytes(value)} in buckets`);
   label(box, "bytes of a record", -42, -8);
   label(box, "at most", box.width + 8, -8);
-  eventAxis(box, x);
+  timeAxis(box, x, "event");
 
   const place = byId("fill-legend");
   place.selectAll("*").remove();
@@ -388,10 +498,11 @@ const groupColumns = [
   {name: "Blocks", value: (group) => group.blocks, text: (group) => count(group.blocks),
    share: (group) => (data.blocks > 0 ? group.blocks / data.blocks : 0)},
   {name: "Bytes", value: (group) => group.bytes, text: (group) => bytes(group.bytes)},
+  {name: "Leaked", value: (group) => group.never_bytes, text: (group) => bytes(group.never_bytes)},
+  {name: "Temporary", part: (group) => group.temporary},
   {name: "In records", part: (group) => group.in_records.blocks},
   {name: "Padding", value: (group) => group.padding, text: (group) => bytes(group.padding)},
   {name: "Short-lived", part: shortLived},
-  {name: "Never freed", part: (group) => group.never},
   {name: "Die together", part: (group) => group.together.blocks},
   {name: "One Clear", part: (group) => group.together.clear_blocks},
 ].map((column) => (column.part === undefined ? column : {
@@ -419,6 +530,8 @@ function groups() {
     .attr("class", (one) => (one.isName ? "name" : one.share >= 0 ? "share" : null))
     .style("--share", (one) => (one.share >= 0 ? 100 * one.share + "%" : null))
     .text((one) => one.text);
+  breakable(body.selectAll("td.name"));
+  markWide();
   const left = found.length - Math.min(found.length, shown.rows);
   byId("groups-more").attr("hidden", left > 0 ? null : "").text(`Show ${count(left)} more`);
   const all = data.num_groups > data.groups.length
@@ -446,9 +559,9 @@ function groupsTable() {
 }
 
 function tables() {
-  const names = {asked: "Asked for", pools: "Pools, one a group", one_pool: "One pool for all", heap: "Heap", heap_chunks: "Heap, with its headers"};
+  const names = {asked: "Asked for", pools: "Pools, one per group", one_pool: "One pool for all", heap_chunks: "Heap", heap: "Heap, without its headers"};
   table("held", ["", "At the peak", "Of the heap", "Most at any time"], Object.keys(names).map((key) =>
-    [names[key], bytes(data.peak[key]), percent(data.peak[key], data.peak.heap), bytes(data.most[key])]));
+    [names[key], bytes(data.peak[key]), percent(data.peak[key], data.peak.heap_chunks), bytes(data.most[key])]));
   const rows = data.sizes.slice().sort((a, b) => b.blocks - a.blocks).slice(0, 40);
   table("sizes-table", ["Bytes", "Blocks", "Share", "At the peak", "In records", "Padding", "Freed within 100 events", "Never freed"],
     rows.map((row) => [sizeText(row), count(row.blocks), percent(row.blocks, data.blocks), bytes(row.at_peak.bytes),
@@ -458,6 +571,13 @@ function tables() {
     lifetimeBins().map((bin) => [bin.name, count(bin.blocks), percent(bin.blocks, data.blocks), percent(bin.within, data.blocks)]));
   const left = data.fill.num_classes - data.fill.classes.length;
   byId("fill-note").text(left > 0 ? `The ${data.fill.classes.length} classes with the most bytes of ${data.fill.num_classes}.` : "");
+  const together = data.groups.filter((group) => group.together.blocks > 0)
+    .sort((a, b) => b.together.blocks - a.together.blocks).slice(0, 8);
+  byId("together-note").text(`${count(data.together.clear_runs)} ${data.together.clear_runs === 1 ? "Clear" : "Clears"} would replace ` +
+    `${percent(data.together.clear_blocks, data.frees + data.cleared)} of the releases.`);
+  table("together", ["Group", "Die together", "Longest series", "Clears", "Releases replaced", "Of its blocks"], together.map((group) =>
+    [group.name, count(group.together.blocks), count(group.together.longest), count(group.together.clear_runs),
+      count(group.together.clear_blocks), percent(group.together.clear_blocks, group.blocks)]));
   table("fill-table", ["Bytes of a record", "Records", "Used then", "In buckets"], data.fill.classes.map((row) => {
     const i = row.records.indexOf(d3.max(row.records));
     return [count(row.data_size), count(row.records[i]), percent(row.used[i], row.records[i]), bytes(row.records[i] * (row.data_size + 4))];
@@ -465,17 +585,22 @@ function tables() {
 }
 
 function charts() {
+  peakBars();
+  growth();
   timeline();
   sizes();
   lifetimes();
   fillMap();
+  markWide();
 }
 
 heading();
 verdict();
 tables();
 groupsTable();
+unitChoice();
 charts();
+d3.selectAll("details").on("toggle", markWide);
 
 let drawnWidth = window.innerWidth;
 window.addEventListener("resize", () => {
