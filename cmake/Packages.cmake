@@ -71,8 +71,8 @@ string(JOIN "\n" CPACK_DEBIAN_DEV_DESCRIPTION
     "which CMake and pkg-config find the library, and the documentation.")
 string(JOIN "\n" CPACK_DEBIAN_TOOLS_DESCRIPTION
     "tools for programs and their memory pools"
-    "${about}This package contains mempool, which records the allocations of any program"
-    "and shows what pools would gain for it, and the checked library, on which mempool"
-    "runs a program to find its memory errors.")
+    "${about}This package contains mempool, which records the allocations of any"
+    "program and shows what pools would gain for it, and the checked library, on"
+    "which mempool runs a program to find its memory errors.")
 
 include(CPack)

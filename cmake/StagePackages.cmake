@@ -51,7 +51,7 @@ foreach(component IN LISTS CPACK_COMPONENTS_ALL)
     file(WRITE ${doc}/changelog.Debian "${changelog}")
     run(gzip -9nf ${doc}/changelog.Debian)
     if(NOT component STREQUAL "runtime")  # A page links to others, so each package has all of them.
-        file(COPY ${sources}/README.md ${sources}/CHANGELOG.md DESTINATION ${doc})
+        file(COPY ${sources}/README.md DESTINATION ${doc})
         file(COPY ${sources}/docs DESTINATION ${doc} FILES_MATCHING
             PATTERN *.md PATTERN *.svg PATTERN *.png
             PATTERN man EXCLUDE PATTERN reference.md EXCLUDE)
