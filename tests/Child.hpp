@@ -1,5 +1,5 @@
-// Death tests compare what a process writes on standard error. The helpers here lead standard
-// output there, and turn the test's process into another program with an environment of its own.
+// Death tests compare what a process writes on standard error. These helpers redirect standard
+// output there, and replace the test's process by another program with an environment of its own.
 
 #ifndef OBR_TESTS_CHILD_HPP
 #define OBR_TESTS_CHILD_HPP
@@ -18,7 +18,7 @@ using Environment = std::vector<std::pair<const char*, const char*>>;
 
 enum class Captured { out, both };
 
-// From now on what the death test compares is the output asked for; the rest is dropped.
+// From now on the death test compares the output asked for; the rest is dropped.
 inline void Capture(Captured streams) {
     dup2(STDERR_FILENO, STDOUT_FILENO);
     if (streams == Captured::out) { dup2(open("/dev/null", O_WRONLY), STDERR_FILENO); }

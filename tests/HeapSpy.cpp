@@ -1,4 +1,4 @@
-// The replaced operators. What they remember of a block stands ahead of it.
+// The replaced operators, which keep a header of their own before each block.
 
 #include "HeapSpy.hpp"
 
@@ -72,7 +72,7 @@ void* operator new(std::size_t size) {
 void* operator new[](std::size_t size) {
     return HeapSpy::Request(size, HeapSpy::Form::array);
 }
-// A sanitizer brings one of its own, whose blocks are none of ours. std::stable_sort asks for it.
+// A sanitizer has one of its own, with blocks that are not ours. std::stable_sort calls it.
 void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
     try {
         return operator new(size);

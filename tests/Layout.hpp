@@ -1,5 +1,5 @@
-// The bytes of a pool's memory, told once more for the tests: none of these figures comes from the
-// library's headers, so that nothing moves there unseen.
+// The layout of a pool's memory, written out again for the tests: none of these numbers comes from
+// the library's headers, so that a change there is noticed.
 
 #ifndef OBR_TESTS_LAYOUT_HPP
 #define OBR_TESTS_LAYOUT_HPP
@@ -9,16 +9,16 @@
 
 namespace Layout {
 
-constexpr std::uint32_t sizeAt = 40;      // Where a bucket's `size` stands,
+constexpr std::uint32_t sizeAt = 40;      // Offset of a bucket's `size`,
 constexpr std::uint32_t freeHeadAt = 44;  // `freeHead`,
 constexpr std::uint32_t recsBase = 46;    // and `numFree`, from which offsets count.
 constexpr std::uint32_t firstOffset = 2;  // Of the first record.
-constexpr std::uint32_t recHdr = 4;       // Ahead of a record's data: link, type, guard.
+constexpr std::uint32_t recHdr = 4;       // Before a record's data: link, type, guard.
 constexpr std::uint8_t typeFree = 0;
 constexpr std::uint8_t typeUsed = 1;
 
-constexpr std::uint32_t extRec = 24;    // Ahead of a heap record's data.
-constexpr std::uint32_t lengthAt = 16;  // Where its `length` stands, and behind that:
+constexpr std::uint32_t extRec = 24;    // Before a heap record's data.
+constexpr std::uint32_t lengthAt = 16;  // Offset of its `length`; then comes:
 constexpr std::uint8_t extRecHdr[recHdr] = {0xAA, 0xBB, 2, 0xCC};
 
 inline std::uint8_t* Bytes(const void* start) {

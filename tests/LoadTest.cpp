@@ -1,6 +1,6 @@
-// The library comes and goes in a process that is not linked to it: it is loaded with a plugin that
-// uses it, unloaded, and its exit step runs while the host still has pools. A second plugin brings
-// a copy of its own.
+// The library in a process that is not linked to it: it is loaded with a plugin that uses it and
+// unloaded again, and its exit step runs while the host still has pools. A second plugin contains a
+// copy of its own.
 
 #include <dlfcn.h>
 #include <malloc.h>
@@ -39,8 +39,8 @@ private:
     }
 };
 
-// A leak checker finds what the pools alive hold through `kept`. All else the library must release,
-// and the loader keeps nothing of it either.
+// A leak checker finds the memory of living pools through `kept`. The library must release
+// everything else, and the loader must keep nothing of it.
 TEST(Load, LoadingAndUnloadingLeavesNothingBehind) {
     Child::SetEnvironment({{"NUV_OBR_MEMPOOL_ON", "1"}});
     static Place kept[20];
@@ -69,7 +69,7 @@ const Plugin* plugin = nullptr;
 Place first, second, third;
 
 // `atExit` is what the destructors of a host's statics do. It is registered before the library is
-// loaded and thus runs behind the library's exit step.
+// loaded and thus runs after the library's exit step.
 void LoadBehind(void (*atExit)()) {
     Child::Capture(Child::Captured::both);
     Child::SetEnvironment({{"NUV_OBR_MEMPOOL_TRACE", "1"}, {"NUV_OBR_MEMPOOL_ON", "1"}});
@@ -78,7 +78,7 @@ void LoadBehind(void (*atExit)()) {
     plugin->build(&first, "first");
 }
 
-// Only the plugin's static tells of its end.
+// Only the pool in the plugin's static traces its end.
 TEST(Load, APoolAliveAtUnloadIsLeftAloneInSilence) {
     const auto run = [] {
         LoadBehind([] { std::puts("exit"); });
@@ -91,8 +91,8 @@ TEST(Load, APoolAliveAtUnloadIsLeftAloneInSilence) {
 }
 
 // The third handle has left its own pool, which nothing destroys, for the first one's, and the
-// first handle has moved on to the second one's. What looks like a handle where the first one stood
-// is nobody's.
+// first handle has moved on to the second one's. What looks like a handle where the first one was
+// is not one.
 TEST(Load, PoolsOutliveTheExitStep) {
     const auto run = [] {
         LoadBehind([] {
@@ -123,7 +123,7 @@ TEST(Load, PoolsOutliveTheExitStep) {
 }
 
 // Each copy has its own names, settings and pools, and one outlives the other.
-TEST(Load, TwoCopiesInAProcessKnowNothingOfEachOther) {
+TEST(Load, TwoCopiesInAProcessAreIndependent) {
     const auto run = [] {
         LoadBehind([] {});
         const Plugin other{PLUGIN_WITH_ARCHIVE};

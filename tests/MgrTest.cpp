@@ -1,5 +1,5 @@
-// Handles and the registry: names, the lists of all pools, and what is left when memory runs out.
-// Handles that share a pool come, go and are assigned in any order in tests/fuzz.
+// Handles and the registry: names, the lists of all pools, and what is left if memory is exhausted.
+// tests/fuzz makes, assigns and destroys handles that share a pool in any order.
 
 #include <MemPool>
 
@@ -89,7 +89,7 @@ TEST_F(MgrTest, AllPoolsAreAppendedInTheOrderOfTheirNames) {
     GetMgrs(standard);
     EXPECT_EQ(standard, expected);
 
-    // Room is made for what there is and not for what the vector holds already.
+    // Room is reserved for the pools, without those that the vector holds already.
     OBR::vector<Mgr*> compact;
     compact.push_back(nullptr);
     GetMgrs(compact);
@@ -120,7 +120,7 @@ TEST_F(MgrTest, AHandlePassesEverythingOn) {
     EXPECT_EQ(CheckInvariants(pool).size(), 0u);
 }
 
-// Each request of the heap behind a new handle is refused in turn.
+// Each heap request of a new handle is refused in turn.
 TEST_F(MgrTest, ARefusedPoolLeavesNothingButAGapInTheNumbers) {
     Mgr other("other");
     const int number = Number(Mgr());

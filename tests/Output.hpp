@@ -11,7 +11,7 @@
 #include <sstream>
 #include <string>
 
-// Stands in for standard output while it lives. Each flush is a moment to look around at.
+// Replaces standard output while it lives. A test can act at each flush.
 class Output final : public std::stringbuf {
 public:
     Output() : former(std::cout.rdbuf(this)) {}
@@ -44,7 +44,7 @@ class Grouping final : public std::numpunct<char> {
 };
 inline const std::locale groupingLocale(std::locale::classic(), new Grouping);
 
-// Leaves standard output with a setting of each kind that is not the usual one.
+// Gives standard output an unusual setting of each kind.
 inline void SetStreamState() {
     std::cout.imbue(groupingLocale);
     std::cout << std::left << std::boolalpha << std::hex << std::showbase << std::uppercase

@@ -1,6 +1,6 @@
-// What every test of a pool starts from, checks on the way and ends with: settings of its own, the
-// invariants of a pool's memory, restated from the outside where they can be, and a heap on which
-// nothing is left behind and every block went back in the form in which it came.
+// What all tests of a pool share: settings to start with, a check of the invariants of a pool's
+// memory, and at the end a heap to which every block went back, in the form in which it was
+// requested.
 
 #ifndef OBR_TESTS_POOLFIXTURE_HPP
 #define OBR_TESTS_POOLFIXTURE_HPP
@@ -46,22 +46,22 @@ protected:
 
 private:
     static std::size_t NumLive() {
-        { SCOPED_TRACE(""); }  // The first one of all leaves blocks of the framework's own behind.
+        { SCOPED_TRACE(""); }  // The first one leaves blocks of the framework behind.
         return HeapSpy::numLive;
     }
 
     const std::size_t numLive = NumLive();
-    // The trace sends every request down the slow path. Nobody reads it here.
+    // The trace is enabled only for the slow path, which it forces. Its lines are dropped.
     std::streambuf* const output = std::cout.rdbuf(nullptr);
 };
 
-// The nodes of a list, which must be whole in both directions: a list in a circle is not.
+// The nodes of a list, which must be intact in both directions.
 template <typename Node>
 std::vector<const Node*> ListOf(const Node* front, Node* Node::*next, Node* Node::*prev) {
     std::vector<const Node*> nodes;
     for (const Node* node = front; node != nullptr; node = node->*next) {
         if (node->*prev != (nodes.empty() ? nullptr : nodes.back())) {
-            ADD_FAILURE() << "A link back leads elsewhere.";
+            ADD_FAILURE() << "A link back is wrong.";
             break;
         }
         nodes.push_back(node);
@@ -80,8 +80,7 @@ inline Buckets FreeBuckets(const Group& group) {
 // The blocks that a pool has given out: their usable bytes by their data.
 using Blocks = std::map<const std::uint8_t*, std::uint32_t>;
 
-// The records of a bucket follow each other, each of them is either on the free list, once, or USED
-// and known to the pool.
+// Each record of a bucket must be on the free list once, or USED and known to the pool.
 inline void CheckBucket(const BucketMgr& pool, const Group& group, const Bucket& bucket,
                         Blocks& blocks) {
     const std::uint32_t recSize = group.recDataSize + Layout::recHdr;
@@ -97,7 +96,7 @@ inline void CheckBucket(const BucketMgr& pool, const Group& group, const Bucket&
     for (std::uint32_t offset = bucket.freeHead; offset != 0;
          offset = Layout::Link(Layout::Record(&bucket, offset))) {
         ASSERT_LT(offset, bucket.size);
-        ASSERT_FALSE(isFree[offset]) << "The free list runs in a circle.";
+        ASSERT_FALSE(isFree[offset]) << "The free list is circular.";
         isFree[offset] = true;
     }
     EXPECT_EQ(std::count(isFree.begin(), isFree.end(), true), bucket.numFree);
@@ -116,8 +115,8 @@ inline void CheckBucket(const BucketMgr& pool, const Group& group, const Bucket&
     EXPECT_EQ(numUsed + bucket.numFree, totalRecs);
 }
 
-// Both lists of a group have the counts that they should, and a bucket is on the second while it
-// has a free record.
+// Both lists of a group must have the right counts, and a bucket must be on the second exactly
+// while it has a free record.
 inline void CheckGroup(const BucketMgr& pool, const Group& group, Blocks& blocks) {
     ASSERT_EQ(group.parent, &pool);
     const Buckets all = AllBuckets(group);

@@ -1,5 +1,5 @@
-// A pool from within: which group serves a request, which requests go to the heap, what is taken
-// back and what is not, and what is left when the heap refuses.
+// The inside of a pool: which group serves a request, which requests go to the heap, and which
+// pointers are taken back.
 
 #include <algorithm>
 #include <cstdint>
@@ -83,8 +83,8 @@ std::uint8_t* ForgeRecord(std::uint8_t* bucket, const Group* parent, std::uint16
 
 }  // namespace
 
-// All sizes up to well above the largest record live at once, the smallest or the largest asked for
-// first, on the fast path or the slow one.
+// Blocks of all sizes up to well above the largest record live at once, allocated in ascending or
+// descending order, on the fast path or the slow one.
 TEST_F(PoolTest, EverySizeIsServedByItsClass) {
     for (const SizeSettings& is : sizeSettings) {
         std::vector<SizeClass> classes;
@@ -123,7 +123,7 @@ TEST_F(PoolTest, EverySizeIsServedByItsClass) {
     }
 }
 
-// At the ends of what 16 bits hold, a minimum above 15 of them too.
+// Sizes up to the limits of 16 bits, with a minimum above 15 bits too.
 TEST_F(PoolTest, TheLargestRecordsAreServedByTheirClasses) {
     for (const std::uint32_t minimum : {5u, 40000u}) {
         Use(70000, 1, 65531, minimum);
@@ -180,7 +180,7 @@ TEST_F(PoolTest, EachTestOfAHeapRecordCounts) {
         ExpectNone(pool, Layout::SetExtRec(block, 0));
     }
 
-    // The newest is in front, and whose it is, is no test.
+    // The newest is in front, and a pool recognises the heap records of others.
     BucketMgr other(nullptr, "other");
     for (const std::uint32_t size : {2001u, 2002u}) {
         void* const data = other.Alloc(size);
@@ -210,14 +210,15 @@ TEST_F(PoolTest, ADisabledPoolIsTheHeap) {
             EXPECT_FALSE(pool.Contains(data));
             EXPECT_EQ(pool.GetSize(data), 0u);
             pool.Clear();
-            EXPECT_TRUE(HeapSpy::IsArray(data, size)) << "Clear is not for blocks of the heap.";
+            EXPECT_TRUE(HeapSpy::IsArray(data, size))
+                << "Clear must leave plain heap blocks alone.";
             EXPECT_EQ(CheckInvariants(pool), Blocks());
             EXPECT_TRUE(pool.Free(data));
             EXPECT_EQ(HeapSpy::lastRelease, data);
             EXPECT_FALSE(pool.Free(nullptr));
         }
     }
-    // Its questions still know the heap record of an enabled pool.
+    // Its queries still recognise the heap record of an enabled pool.
     BucketMgr enabled(nullptr, "enabled");
     EXPECT_EQ(pool.GetSize(enabled.Alloc(2000)), 2000u);
 }

@@ -1,5 +1,5 @@
-// Requests that end the process: what stands on standard output, to the character, the exit status,
-// and that the end is an orderly one.
+// Requests that end the process: the exact output, the exit status, and that exit handlers and
+// destructors run.
 
 #include <sys/wait.h>
 #include <unistd.h>
@@ -62,7 +62,7 @@ TEST(Process, ASizeAboveTheLimitStops) {
     }
 }
 
-// A pool that is switched off is refused like any other, and each has traced its creation.
+// A disabled pool is refused like an enabled one, and each has traced its creation.
 TEST(Process, SettingsThatCannotMakeAPoolStop) {
     const std::string tooLarge =
         "1988: Unexpected condition: the maximum record size is larger than the bucket size ";
@@ -99,8 +99,8 @@ TEST(Process, SettingsThatCannotMakeAPoolStop) {
     }
 }
 
-// The number of a message takes the stream's justification and fill. A handler may meet the next
-// message.
+// The number of a message has the stream's justification and fill. An exit handler may cause
+// another message.
 TEST(Process, ExitHandlersAndStaticDestructorsStillRun) {
     const std::string message =
         "ERROR:../s/MemPool:1645*: Duplicate Obr_MemPool::Mgr name encountered 'a'\n";
@@ -116,7 +116,7 @@ TEST(Process, ExitHandlersAndStaticDestructorsStillRun) {
     });
 }
 
-// The host ends while a line of a report is on its way, and its handler prints the report whole.
+// The host ends in the middle of a report, and an exit handler prints the whole report.
 TEST(Process, MayEndInsideAReport) {
     NUV_OBR_MEMPOOL_ON(true);
     Mgr pool("reported");
@@ -142,7 +142,7 @@ TEST(Process, MayEndInsideAReport) {
     EXPECT_EXIT(run(), testing::ExitedWithCode(3), testing::Eq(whole.str()));
 }
 
-// Either process goes on with its own copies of all pools, and no line is written twice.
+// Each process continues with its own copies of all pools, and no line is written twice.
 TEST(Process, MayForkWithPoolsThatLive) {
     const auto run = [] {
         Child::Capture(Child::Captured::out);

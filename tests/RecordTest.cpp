@@ -1,5 +1,5 @@
-// The memory of a bucket, byte by byte, and the order in which a group's records and buckets come
-// and go.
+// The memory of a bucket, byte by byte, and the order in which a group takes records and makes and
+// releases buckets.
 
 #include <algorithm>
 #include <array>
@@ -28,15 +28,15 @@ Bytes RecordsOf(const Bucket* bucket) {
     return Bytes(Layout::Record(bucket, Layout::firstOffset), Layout::Record(bucket, bucket->size));
 }
 
-// Says what the header of the record at `offset` is to be.
+// Sets the expected header of the record at `offset`.
 void Expect(Bytes& records, std::uint32_t offset, std::uint8_t type, std::uint32_t link) {
     Layout::SetHeader(&records[offset - Layout::firstOffset], type, link);
 }
 
 }  // namespace
 
-// From the cradle to the grave: every byte of a bucket, when it is made, when all records have been
-// taken, when they came back in any order, and when it ends.
+// Every byte of a bucket when it is made, when all records have been taken, when they have come
+// back in any order, and when it is destroyed.
 TEST_F(RecordTest, EveryByteOfABucketIsAsDrawn) {
     constexpr struct {
         std::uint32_t bucketSize, dataSize, totalRecs, size;

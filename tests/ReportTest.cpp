@@ -1,6 +1,6 @@
-// Every report against its whole text in expected/. An address is shown as the number of the object
-// that it lies in, in the order in which they appear, and its distance from there: 0x, 8 digits
-// each. The variable OBR_MEMPOOL_APPROVE, set to anything, makes the tests write the texts anew.
+// Compares every report with its whole text in expected/. An address is written as the number of
+// the object that it lies in, in the order of appearance, and the offset in that object: 0x and 8
+// digits for each. If the variable OBR_MEMPOOL_APPROVE is set, the tests write the texts anew.
 
 #include <MemPool>
 #include <algorithm>
@@ -38,7 +38,7 @@ using testing::ExitedWithCode;
 
 namespace {
 
-// What `print` writes on standard output, where each line must be flushed by itself.
+// Returns what `print` writes on standard output. Each line must be flushed.
 template <typename Print>
 std::string Printed(Print print) {
     Output output;
@@ -52,7 +52,7 @@ std::string Printed(Print print) {
 
 using Blocks = std::vector<std::pair<const void*, std::size_t>>;  // Addresses and sizes.
 
-// All memory of a pool but its table of groups.
+// All memory of a pool except its table of groups.
 void AddBlocks(Blocks& blocks, const BucketMgr& pool) {
     blocks.push_back({&pool, sizeof pool});
     ForEachGroup(pool, [&](std::uint32_t, const Group& group) {
@@ -120,7 +120,7 @@ std::vector<void*> Alloc(Mgr& pool, unsigned int size, int times) {
     return blocks;
 }
 
-// What `print` writes about the pool, of which it changes no byte.
+// Returns what `print` writes about the pool. It must not change a byte of the pool.
 template <typename Print>
 std::string Printed(const Mgr& pool, Print print) {
     Blocks blocks;
@@ -142,7 +142,7 @@ TEST_F(Report, OfAPool) {
     std::string text = Plain(idle);
     Use(4010, 1000);
 
-    // A group that lost its buckets still shows its data size.
+    // A group without buckets still shows its data size.
     Mgr lost("lost");
     void* const only = lost.Alloc(20);
     lost.Alloc(4);
@@ -165,7 +165,7 @@ TEST_F(Report, OfAPool) {
         oldest.DbgBucket(std::cout, 1234, 2, false, true);
     });
 
-    // A disabled pool knows nothing of its blocks.
+    // A disabled pool does not know its blocks.
     Settings::off = true;
     Mgr disabled("disabled");
     void* const block = disabled.Alloc(10);
@@ -247,8 +247,8 @@ TEST_F(Report, DrawsTheRecordsOfABucketAsAMap) {
     ExpectText("maps", map(1, 0) + map(7, 7) + map(8, 4) + map(9, 0) + map(16, 9));
 }
 
-// What the host has set counts until a report sets it, and what a report sets stays. The numbers
-// behind each report show what it leaves.
+// The host's settings of the stream hold until a report changes them, and the changes remain. The
+// numbers after each report show what it leaves.
 TEST_F(Report, TakesTheStreamAsItIsWhereItSetsNothing) {
     Use(50, 40);
     Mgr pool("stream");
@@ -271,19 +271,19 @@ TEST_F(Report, TakesTheStreamAsItIsWhereItSetsNothing) {
     ExpectText("stream-state", text);
 }
 
-// A host that has its stream throw hears of all else that fails, and others of nothing.
+// Only a host that has enabled the stream's exceptions gets those of a failed write.
 TEST_F(Report, TellsOfAFailedWriteWhereTheStreamDoes) {
     const Mgr pool("failing");
     Output output;
     output.onFlush = [] { throw "no device"; };
     EXPECT_NO_THROW(pool.Dbg());
-    EXPECT_NO_THROW(pool.Dbg()) << "The stream is marked now.";
+    EXPECT_NO_THROW(pool.Dbg()) << "The stream is in a failed state now.";
     std::cout.clear();
     std::cout.exceptions(std::ios::badbit);
     EXPECT_THROW(pool.Dbg(), const char*);
     std::cout.exceptions(std::ios::goodbit);
 
-    // Exhausted memory ends the report at any place, and the stream is as before.
+    // Exhausted memory throws at each request of a report, and the stream is as before.
     const auto print = [&pool] {
         const Output growing;
         pool.Dbg();
@@ -298,7 +298,7 @@ const std::string used = notFree + "USED\n";
 const std::string unknown = notFree + "UNKN\n";
 const std::string tooLong = "ERROR:../s/MemPool: 2648: Exceeded the total number of recs 4 > 3\n";
 
-// What may befall a bucket of three records, at the offsets 2, 18 and 34, the first in use.
+// Kinds of damage to a bucket of three records, at the offsets 2, 18 and 34, the first in use.
 const struct {
     const char* name;
     void (*damage)(Bucket&);
@@ -329,7 +329,7 @@ const struct {
     {"no record size", [](Bucket& bucket) { bucket.recSize = 0; }, unknown},
 };
 
-// The bucket lies in a block of exactly the size that its header tells.
+// The bucket lies in a block of exactly the size that its header states.
 TEST_F(Report, OfADamagedBucketStaysWithinIt) {
     std::string text;
     for (const auto& [name, damage, fault] : damages) {
@@ -376,7 +376,7 @@ TEST_F(Report, WarnsOnStandardOutputWhereverItGoes) {
     EXPECT_EQ(elsewhere.str().find("WARNING"), std::string::npos);
 }
 
-// The first free record but one is damaged, so that the operation itself does not meet it.
+// The second free record is damaged, which the operation itself does not read.
 TEST_F(Report, ABuildWithChecksLooksAtEachBucketTouched) {
 #ifdef OBR_MEMPOOL_CHECKS
     const std::string fault = unknown;

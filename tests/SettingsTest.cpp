@@ -1,6 +1,6 @@
-// The settings: what each environment leaves at the start-up, the banner, the pair of record sizes
-// that is refused, and the accessors. A host's own layer stands in for the environment; two
-// processes of another host show a real one.
+// The settings: the result of each environment, the banner, the record sizes that are refused, and
+// the accessors. A host layer of the test's own replaces the environment; two tests start another
+// host with a real one.
 
 #include <MemPool>
 #include <csignal>
@@ -13,6 +13,7 @@
 #include <string>
 #include <vector>
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include "Child.hpp"
@@ -21,12 +22,14 @@
 #include "Output.hpp"
 
 using namespace OBR::MemPool;
+using testing::HasSubstr;
+using testing::StartsWith;
 
 namespace {
 
 using Values = std::map<std::string, const char*>;
 
-// Local statics, since the start-up runs ahead of this file's own.
+// Local statics, since the start-up runs before this file's other statics exist.
 Values& Environment() {
     static Values values;
     return values;
@@ -41,7 +44,7 @@ const Mgr* earlyPool = nullptr;
 
 }  // namespace
 
-// Nothing keeps a host's layer from building a pool when it is first asked.
+// A host's layer may build a pool when it is first asked.
 const char* Host_Env::GetEnv(const char* name) {
     if (earlyPool == nullptr) { earlyPool = new (early) Mgr("early"); }
     Asked().push_back(name);
@@ -61,7 +64,7 @@ constexpr const char* dataAlignment = "NUV_OBR_MEMPOOL_DATA_ALIGNMENT";
 constexpr const char* keepEmptyBuckets = "NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS";
 constexpr const char* info = "NUV_OBR_MEMPOOL_INFO";
 
-// `values` are those of the lines from the bucket size on.
+// The banner with these values from the bucket size on.
 template <typename... Values>
 std::string Banner(Values... values) {
     char text[1000];
@@ -82,27 +85,24 @@ INFO:../s/MemPool: 3269: # Use Heap           : %d
     return text;
 }
 
-// The variables in the README's table, and their defaults, 0 where one is told in words.
+// The README's table: the variables, and the other cells of the row of each.
 struct Readme {
     std::vector<std::string> variables;
-    std::map<std::string, unsigned int> defaults;
+    std::map<std::string, std::string> cells;
 
     Readme() {
         std::ifstream file(README);
         for (std::string line; std::getline(file, line);) {
-            char name[64] = "NUV_";
-            unsigned int byDefault = 0;
-            if (std::sscanf(line.c_str(), "| `NUV_%50[^`]` | %u", name + 4, &byDefault) < 1) {
-                continue;
-            }
-            variables.push_back(name);
-            defaults[name] = byDefault;
+            if (line.compare(0, 7, "| `NUV_") != 0) { continue; }
+            const std::size_t end = line.find('`', 3);
+            variables.push_back(line.substr(3, end - 3));
+            cells[variables.back()] = line.substr(end + 1);
         }
     }
 };
 
-// Starts the settings up once more, under these values. Returns what stands on standard output and
-// the settings that are other than at their defaults, or the refusal.
+// Starts the settings up again with these variables. Returns what is printed, and then the settings
+// that differ from their defaults, or the refusal.
 std::string StartUp(const Values& values) {
     Environment() = values;
     Asked().clear();
@@ -121,22 +121,19 @@ std::string StartUp(const Values& values) {
     std::string text = output.Take();
     if (refusal != nullptr) { return text + refusal; }
 
-    static Readme readme;
-    const auto show = [&text](const char* key, unsigned int value, const char* variable) {
-        if (value == readme.defaults[variable]) { return; }
-        text += std::string(" ") + key + "=" + std::to_string(value);
-    };
-    show("on", NUV_OBR_MEMPOOL_ON(), on);
-    show("trace", NUV_OBR_MEMPOOL_TRACE(), trace);
-    show("bucket", NUV_OBR_MEMPOOL_BUCKET_SIZE(), bucketSize);
-    show("max", NUV_OBR_MEMPOOL_MAX_RECORD_SIZE(), maxRecordSize);
-    show("min", NUV_OBR_MEMPOOL_MIN_RECORD_SIZE(), minRecordSize);
-    show("alignment", NUV_OBR_MEMPOOL_DATA_ALIGNMENT(), dataAlignment);
-    show("keep", NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS(), keepEmptyBuckets);
+    const PoolSettings settings = PoolSettings::OfProcess();
+    if (NUV_OBR_MEMPOOL_ON()) { text += " on"; }
+    if (NUV_OBR_MEMPOOL_TRACE()) { text += " trace"; }
+    for (const Setting& row : SettingTable::all) {
+        const unsigned int value = row.In(settings);
+        if (value != row.In(PoolSettings())) {
+            text += std::string(" ") + row.key + "=" + std::to_string(value);
+        }
+    }
     return text;
 }
 
-// At load, and with the second variable only asked for where the first one leaves the pools off.
+// At load. The second variable is read only if the first leaves pools off.
 TEST(Settings, TheStartUpFindsTheRegistryReadyAndAsksAsTheReadmeTells) {
     std::vector<std::string> order = Readme().variables;
     EXPECT_EQ(Asked(), order);
@@ -148,40 +145,54 @@ TEST(Settings, TheStartUpFindsTheRegistryReadyAndAsksAsTheReadmeTells) {
     EXPECT_EQ(Asked(), order);
 }
 
+TEST(Settings, TheReadmeHasTheDefaultsAndBoundsOfTheTable) {
+    Readme readme;
+    for (const Setting& row : SettingTable::all) {
+        const std::string byDefault = row.IsFlag() ? "off" : std::to_string(row.In(PoolSettings()));
+        EXPECT_THAT(readme.cells[row.variable], StartsWith(" | " + byDefault + " | "));
+    }
+    EXPECT_THAT(readme.cells[maxRecordSize],
+                HasSubstr(" to " + std::to_string(SettingTable::maxRecordSize.largest) + " | "));
+    EXPECT_THAT(
+        readme.cells[minRecordSize],
+        HasSubstr(" | " + std::to_string(SettingTable::minRecordSize.smallest) + " or more | "));
+}
+
 const auto defaults = Banner(4010, 4, 0, 1000, 8, 0, 1);
 
 std::string Refusal(const std::string& sizes) {
     return "EXCEPTION:../s/MemPool:3337: MIN_RECORD_SIZE >= MAX_RECORD_SIZE (" + sizes + ")";
 }
 
-// Each row finds what the one before has left, and what is not stored anew would show.
+// Each row starts with the settings of the row before: one that is not reset would show.
 TEST(Settings, EachEnvironmentLeavesItsSettings) {
     const struct {
         Values environment;
         std::string expected;
     } rows[] = {
-        {{{on, "1"}, {shortOn, "0"}}, " on=1"},
-        {{{on, "0"}, {shortOn, "1"}}, " on=1"},
+        {{{on, "1"}, {shortOn, "0"}}, " on"},
+        {{{on, "0"}, {shortOn, "1"}}, " on"},
         {{{on, "-1"}, {shortOn, "-1"}}, ""},
         {{{on, "yes"}}, ""},
         {{{bucketSize, "-1"}}, ""},
-        {{{bucketSize, "0"}}, " bucket=0"},
-        {{{bucketSize, ""}}, " bucket=0"},
-        {{{bucketSize, " +8000 bytes"}}, " bucket=8000"},
-        {{{maxRecordSize, "32767"}}, " max=32767"},
+        {{{bucketSize, "0"}}, " bucket_size=0"},
+        {{{bucketSize, ""}}, " bucket_size=0"},
+        {{{bucketSize, " +8000 bytes"}}, " bucket_size=8000"},
+        {{{maxRecordSize, "32767"}}, " max_record_size=32767"},
         {{{maxRecordSize, "32768"}}, ""},
-        {{{maxRecordSize, "010"}}, " max=10"},
+        {{{maxRecordSize, "010"}}, " max_record_size=10"},
         {{{maxRecordSize, "-1"}}, ""},
-        {{{minRecordSize, "4"}}, " min=4"},
+        {{{minRecordSize, "4"}}, " min_record_size=4"},
         {{{minRecordSize, "3"}}, ""},
-        {{{minRecordSize, "2000"}, {maxRecordSize, "2001"}}, " max=2001 min=2000"},
-        {{{dataAlignment, "3"}}, " alignment=3"},
-        {{{dataAlignment, "0"}}, " alignment=1"},
-        {{{dataAlignment, "-3"}}, " alignment=1"},
-        {{{dataAlignment, "65536"}}, " alignment=0"},
+        {{{minRecordSize, "2000"}, {maxRecordSize, "2001"}},
+         " max_record_size=2001 min_record_size=2000"},
+        {{{dataAlignment, "3"}}, " data_alignment=3"},
+        {{{dataAlignment, "0"}}, " data_alignment=1"},
+        {{{dataAlignment, "-3"}}, " data_alignment=1"},
+        {{{dataAlignment, "65536"}}, " data_alignment=0"},
         {{{keepEmptyBuckets, "-1"}}, ""},
         {{{keepEmptyBuckets, "0"}}, ""},
-        {{{keepEmptyBuckets, "1"}}, " keep=1"},
+        {{{keepEmptyBuckets, "1"}}, " keep_empty_buckets=1"},
         {{{info, "-1"}}, ""},
         {{{info, "please"}}, defaults},
         {{{minRecordSize, "1000"}, {info, "0"}},
@@ -190,14 +201,14 @@ TEST(Settings, EachEnvironmentLeavesItsSettings) {
         {{{maxRecordSize, "3"}}, Refusal("8>=3")},
         {{{maxRecordSize, "0"}}, Refusal("8>=0")},
         {{{trace, "-1"}}, ""},
-        {{{trace, "1"}}, " trace=1"},
-        {{{trace, "0"}}, " trace=1"},  // The one setting that no start-up switches off.
+        {{{trace, "1"}}, " trace"},
+        {{{trace, "0"}}, " trace"},  // The only setting that no start-up resets.
     };
     for (const auto& row : rows) { EXPECT_EQ(StartUp(row.environment), row.expected); }
     NUV_OBR_MEMPOOL_TRACE(false);
 }
 
-// Standard output works at that time, though the host itself does not make it ready.
+// Standard output works then, although the host does not initialise it.
 TEST(Settings, TheLoadShowsTheBannerAheadOfTheHost) {
     const auto load = [](const Child::Environment& environment) {
         Child::Run(Child::Captured::out, environment, HOST);
@@ -215,7 +226,7 @@ TEST(Settings, TheLoadShowsTheBannerAheadOfTheHost) {
                 testing::Eq(Banner(70000, 16, 1, 1500, 20, 1, 0) + "on\n"));
 }
 
-// The host's own code never runs. The last line is that of the standard library about an exception
+// The host's own code never runs. The standard library prints the last line, about an exception
 // that nothing catches.
 TEST(Settings, RecordSizesThatCannotWorkEndTheLoad) {
     EXPECT_EXIT(Child::Run(Child::Captured::both, {{minRecordSize, "1000"}}, HOST),

@@ -1,5 +1,5 @@
-// The trace, line by line, the moment of each line within its event, and that no line needs the
-// heap or a stream that works.
+// The trace, line by line; the moment of each line within its event; and that no line needs the
+// heap or a working stream.
 
 #include <MemPool>
 #include <iostream>
@@ -47,7 +47,7 @@ protected:
 INSTANTIATE_TEST_SUITE_P(, Trace, testing::Values(true, false),
                          [](const auto& param) { return param.param ? "Enabled" : "Disabled"; });
 
-// Whatever the host has set on the stream, which stays as it is.
+// Whatever the host has set on the stream, which is not changed.
 TEST_P(Trace, EachEventWritesItsLine) {
     SetStreamState();
     auto pool = std::make_unique<Mgr>("traced");
@@ -82,8 +82,8 @@ TEST_P(Trace, EachEventWritesItsLine) {
     EXPECT_EQ(output.Take(), Line("d", address) + "\n");
 }
 
-// Wherever the output has to grow while the heap refuses its n-th request, once or for good, each
-// flush fails, and the host wants to hear of all that fails.
+// The heap refuses its n-th request, once or for good, wherever the output has to grow; each flush
+// fails; and the host has enabled all exceptions of the stream.
 TEST_P(Trace, AnEventIsAWholeLineOrNoneAndDoesItsWork) {
     for (std::size_t filled = 0; filled <= 512 && !HasFailure(); ++filled) {
         for (const bool forGood : {false, true}) {
@@ -119,14 +119,14 @@ TEST_P(Trace, AnEventIsAWholeLineOrNoneAndDoesItsWork) {
     }
 }
 
-// A buffer of the host's own that has put down a time, and then fails.
+// A buffer of the host's that writes the time and then fails.
 TEST(TraceOfFailures, OnlyTheLineItselfIsTakenBack) {
     struct : std::stringbuf {
         std::streamsize xsputn(const char*, std::streamsize) override {
             return std::stringbuf::xsputn("12:00 ", 6) - 6;
         }
         int sync() override {
-            ADD_FAILURE() << "What is to be taken back would be out.";
+            ADD_FAILURE() << "What is to be taken back would be written.";
             return 0;
         }
     } stamping;
@@ -138,8 +138,8 @@ TEST(TraceOfFailures, OnlyTheLineItselfIsTakenBack) {
     EXPECT_EQ(stamping.str(), "12:00 12:00 ");
 }
 
-// A pool enters the registry behind its "c:" line and leaves it ahead of its "d:" line. A block is
-// in use at the moments of both its lines, and at the end of its pool. A failed Free is told like
+// A pool enters the registry after its "c:" line and leaves it before its "d:" line. A block is in
+// use when either of its lines is written, and at the end of its pool. A failed Free is traced like
 // another.
 TEST(TraceOfMoments, EachLineHasItsMoment) {
     NUV_OBR_MEMPOOL_ON(true);

@@ -1,4 +1,4 @@
-// The compact vector: its growth, its limit of 32 bits, and what it holds after a failure.
+// The compact vector: its growth, its limit of 32 bits, and its contents after a failure.
 
 #include <MemPool>
 
@@ -17,7 +17,7 @@ namespace {
 
 using Counts = std::vector<std::size_t>;
 
-// An allocator that writes down what it is asked for and can refuse it.
+// An allocator that records its requests and can refuse them.
 Counts requests;
 std::size_t elementsOut;
 bool refuses;
@@ -52,10 +52,12 @@ protected:
         requests.clear();
         refuses = false;
     }
-    ~VectorTest() override { EXPECT_EQ(elementsOut, 0u) << "A block goes back with its count."; }
+    ~VectorTest() override {
+        EXPECT_EQ(elementsOut, 0u) << "A block must be released with its count.";
+    }
 };
 
-// The text of the failure, if it is one of memory.
+// The text of the std::bad_alloc that the action throws.
 template <typename Action>
 std::string Failure(Action action) {
     try {
@@ -81,7 +83,7 @@ TEST_F(VectorTest, GrowsByDoublingAndKeepsEveryElement) {
     EXPECT_EQ(requests, (Counts{1, 2, 4, 8, 16}));
     EXPECT_EQ(numbers.capacity, 16u);
     while (numbers.size < 17) { numbers.push_back(numbers[8]); }
-    EXPECT_EQ(numbers[16], 8) << "An element of the vector's own, which moves.";
+    EXPECT_EQ(numbers[16], 8) << "The argument is an element that is moved.";
 }
 
 TEST_F(VectorTest, ReservesExactlyAndNeverShrinks) {
@@ -93,7 +95,7 @@ TEST_F(VectorTest, ReservesExactlyAndNeverShrinks) {
     EXPECT_EQ(numbers.capacity, 8u);
 }
 
-// Up to the limit the allocator is asked, which refuses; beyond it, it is not.
+// Up to the limit the allocator is asked, and refuses; above it, it is not asked.
 TEST_F(VectorTest, StaysAsItWasIfItCannotGrow) {
     constexpr std::size_t limit = 0xFFFFFFFF;
     const std::string refusal = std::bad_alloc().what();
@@ -103,7 +105,7 @@ TEST_F(VectorTest, StaysAsItWasIfItCannotGrow) {
     refuses = true;
     EXPECT_EQ(Failure([&] { numbers.reserve(limit); }), refusal);
     EXPECT_EQ(Failure([&] { numbers.reserve(limit + 1); }), "bad allocation");
-    // As full as no test can fill it: the block is never looked at.
+    // A vector as full as no test can fill it: its block is never read.
     for (const std::uint32_t full : {0x80000000u, 0x7FFFFFFFu, 1u}) {
         numbers.size = numbers.capacity = full;
         EXPECT_EQ(Failure([&] { numbers.push_back(2); }),
