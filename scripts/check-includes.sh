@@ -34,7 +34,7 @@ git grep -nE '^ *#include ("|<MemPool)' -- include s tools | awk -F '[:"<>]' -v 
     from < to { print "Upward: " $0; bad = 1 }
     END { exit bad }'
 
-for readme in $(git ls-files s/README.md tools/README.md); do
+for readme in s/README.md tools/README.md; do
     tree=${readme%/*}
     git ls-files "$tree" | sed -n "s:^$tree/\(.*\)/[^/]*$:\1:p" | sort -u | while read -r folder; do
         grep -qE "\`${folder}[/\`]" "$readme" || { echo "$readme does not name $folder" && exit 1; }
