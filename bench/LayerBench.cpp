@@ -1,14 +1,14 @@
-// What hosts build on the pools, beside the same on their peers, one subject a process:
+// What hosts build on the pools, compared with the same on other allocators. A process runs one
+// subject:
 //
 //     LayerBench --subject=layer|raw|heap|pmr [Google Benchmark's options]
 //
-// layer is a Heap (MemPoolHeap), raw the bare Mgr below it, heap is new and delete, and with
-// LD_PRELOAD the allocator that took their place, and pmr is std::pmr's pool for one thread. Each
-// is a memory resource here, so that one row serves all, except that blocks alone are asked for by
-// the subject's own calls.
+// layer is a Heap (MemPoolHeap), raw a bare Mgr, heap is new and delete or, with LD_PRELOAD, the
+// allocator that replaces them, and pmr is std::pmr's pool for one thread. Containers use each of
+// them through a memory resource, single blocks through the subject's own calls.
 //
-// The rows "live N" and "drop N" show how cost grows with work: the time of an operation while N
-// blocks are live, and the time a block to drop all of them at once.
+// The rows "live N" and "drop N" show how cost grows with work: the time per operation while N
+// blocks are live, and the time per block to drop all of them at once.
 
 #include <MemPoolHeap>
 
@@ -43,7 +43,7 @@ struct Layer {
     void DropAll(const std::vector<void*>&) { heap.FreeAll(); }
 };
 
-// Its blocks are aligned to 4 bytes only: enough for x86-64, and for this comparison alone.
+// Its blocks are aligned to 4 bytes only, which is enough on x86-64.
 class RawMemory : public std::pmr::memory_resource {
 public:
     explicit RawMemory(Mgr& ofMgr) : mgr(ofMgr) {}
@@ -101,7 +101,7 @@ void Pair(benchmark::State& state) {
     SetOperations(state, 2);
 }
 
-// A tree of a compiler's kind: it is built in one go and dropped whole.
+// A tree as a compiler builds it, and drops it whole.
 struct TreeNode {
     TreeNode* left;
     TreeNode* right;
@@ -120,7 +120,7 @@ TreeNode* BuildTree(Subject& subject, int depth) {
     return node;
 }
 
-// A host without a pool drops node by node.
+// Without a pool a host drops a tree node by node.
 template <typename Subject>
 void DropTree(Subject& subject, TreeNode*) {
     subject.DropAll({});

@@ -1,16 +1,15 @@
-// The pool and its peers at the same work, one subject a process:
+// The pool and other allocators at the same work. A process runs one subject:
 //
 //     PoolBench --subject=NAME [Google Benchmark's options]
 //
-// pool, pool-keep (empty buckets stay) and pool-64k (buckets of 65535 bytes) call the shared
-// library as a host does. heap calls malloc and free, and with LD_PRELOAD the allocator that took
-// their place: so every malloc is measured through the same two calls into a shared library, and
-// none lives off another's leavings. boost (where all blocks have one size) and pmr are pools of
-// headers.
+// pool, pool-keep (which keeps empty buckets) and pool-64k (buckets of 65535 bytes) call the shared
+// library as a host does. heap calls malloc and free or, with LD_PRELOAD, the allocator that
+// replaces them, so that every malloc is measured through the same two calls into a shared library.
+// boost, for blocks of one size, and pmr are headers.
 //
-// Each row is one function over a subject. Sizes, orders and traces are made before the clock runs,
-// the first byte of every block is written as a host would, and the time is that of one operation:
-// an Alloc, a Free, an event, or a block built and dropped.
+// Each row is a function over a subject. Sizes, orders and traces are made before the clock runs.
+// The first byte of every block is written. The time is that of one operation: an Alloc, a Free, an
+// event of a trace, or a block that is built and dropped.
 
 #include <MemPool>
 
@@ -43,7 +42,7 @@ namespace {
 
 using Blocks = std::vector<void*>;
 
-// The subjects. A subject is told the size of what it takes back, for those that must know.
+// The subjects. Free is given the size, which some need.
 
 struct Pool {
     OBR::MemPool::Mgr mgr;
@@ -263,7 +262,7 @@ void ManyPools(benchmark::State& state) {
     SetOperations(state, names.size());
 }
 
-// The names of the rows, in the order of the tables.
+// The rows, in the order of the tables.
 
 using Row = std::function<void(benchmark::State&)>;
 

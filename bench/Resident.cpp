@@ -1,10 +1,10 @@
-// What a live block costs in memory, one subject and one size a process:
+// What a live block costs in memory. A process measures one subject and one size:
 //
 //     Resident pool|heap|boost|pmr SIZE
 //
-// prints the resident bytes a block, and for the pool the bytes a block that it holds from the
-// heap. heap is whatever malloc is, LD_PRELOAD included. All blocks are written whole, and together
-// they are large beside what a process needs anyway.
+// prints the resident bytes per block and, for the pool, the bytes per block that it holds from the
+// heap. heap is malloc or, with LD_PRELOAD, what replaces it. All blocks are written whole, and
+// together they are large compared with the rest of the process.
 
 #include <MemPool>
 
@@ -24,10 +24,10 @@
 
 namespace {
 
-std::size_t askedInArrayForm = 0;  // By the library, which makes its buckets in this form.
+std::size_t askedInArrayForm = 0;  // The library allocates its buckets in this form.
 
 std::size_t ResidentBytes() {
-    std::ifstream smaps("/proc/self/smaps_rollup");  // To the page, where statm is approximate.
+    std::ifstream smaps("/proc/self/smaps_rollup");  // Exact to the page; statm is not.
     std::string word;
     while (smaps >> word && word != "Rss:") {}
     std::size_t kilobytes = 0;
@@ -38,7 +38,7 @@ std::size_t ResidentBytes() {
 template <typename Alloc>
 void Measure(unsigned size, bool showHeld, Alloc alloc) {
     const std::size_t number = std::size_t{64} * 1024 * 1024 / size;
-    std::memset(alloc(), 1, size);  // The first block brings the subject's own tables along.
+    std::memset(alloc(), 1, size);  // The first block makes the subject allocate its own tables.
     const std::size_t before = ResidentBytes();
     askedInArrayForm = 0;
     for (std::size_t i = 0; i < number; ++i) { std::memset(alloc(), 1, size); }

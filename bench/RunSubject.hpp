@@ -1,5 +1,5 @@
-// What the benchmark programs share: the choice of a subject, and the state of the heap that their
-// rows begin with.
+// What the benchmark programs share: the choice of a subject, and the state in which their rows
+// find the heap.
 
 #ifndef OBR_MEMPOOL_BENCH_RUNSUBJECT_HPP
 #define OBR_MEMPOOL_BENCH_RUNSUBJECT_HPP
@@ -13,9 +13,9 @@
 
 #include <benchmark/benchmark.h>
 
-// Makes the heap as long as that of a host with other data, some of them at its end. Otherwise the
-// C library hands the memory that a round has freed back to the system and asks for it again in the
-// next, and that is what a row would measure.
+// Makes the heap as long as that of a host with other data, and keeps a block at its end. Otherwise
+// the C library returns the memory that a round has freed to the system and asks for it again in
+// the next, and a row would measure that.
 inline void LengthenHeap() {
     constexpr std::size_t size = 65536;
     std::vector<void*> blocks(3000);
@@ -25,8 +25,8 @@ inline void LengthenHeap() {
     std::for_each(blocks.begin(), blocks.end(), std::free);
 }
 
-// Runs the rows of the subject that the first argument names and `registerRows` knows; the rest are
-// Google Benchmark's own options. Returns the status to exit with.
+// Runs the rows that `registerRows` adds for the subject that the first argument names. The other
+// arguments are Google Benchmark's options. Returns the exit status.
 template <typename RegisterRows>
 int RunSubject(int argc, char** argv, const char* usage, RegisterRows registerRows) {
     const std::string option = "--subject=";

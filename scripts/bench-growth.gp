@@ -1,5 +1,5 @@
-# The second picture of docs/performance.md: how cost grows with work. Left the time of an operation
-# by the blocks that are live, right the time to drop all of them.
+# The picture of growth in docs/performance.md: on the left the time per operation by the number of
+# live blocks, on the right the time to drop all of them.
 set terminal svg size 960,420 font "sans,12" background "white"
 set output output
 set logscale xy
@@ -12,7 +12,7 @@ set multiplot layout 1,2
 subjects = "pool glibc mimalloc jemalloc std::pmr"
 colours = "#c02020 #303030 #2060c0 #209040 #b08000"
 mark(i) = int(word("7 5 9 13 11", i))
-set title "Nanoseconds an operation, by live blocks of 32 bytes"
+set title "Nanoseconds per operation, by live blocks of 32 bytes"
 plot for [i=1:5] data index i-1 using 1:2 with linespoints pt mark(i) ps 0.8 lw 1.5 \
     lc rgb word(colours, i) title word(subjects, i)
 set title "Milliseconds to drop all blocks"

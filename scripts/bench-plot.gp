@@ -1,7 +1,8 @@
-# The picture of docs/performance.md: time beside glibc, a row of marks for each piece of work.
+# The picture of single operations in docs/performance.md: time compared with glibc, a row of marks
+# for each piece of work.
 set terminal svg size 960,560 font "sans,12" background "white"
 set output output
-set title "Time of an operation, glibc's malloc = 1 (less is better)"
+set title "Time per operation, glibc's malloc = 1 (less is better)"
 set logscale x 2
 set xrange [0.03125:16]
 set xtics ("1/32" 0.03125, "1/16" 0.0625, "1/8" 0.125, "1/4" 0.25, "1/2" 0.5, "1" 1, "2" 2, "4" 4, "8" 8, "16" 16)
