@@ -15,6 +15,7 @@ s/MemPool
 s/diagnostics/checked
 s/diagnostics/reports
 include/MemPoolHeap
+tools/system
 tools/trace
 tools/replay
 tools/record

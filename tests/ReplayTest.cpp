@@ -119,17 +119,12 @@ TEST(Replay, ReportsOnEachTrace) {
 }
 
 TEST(Replay, RefusesACommandLineThatMakesNoSense) {
-    EXPECT_EQ(Command(MEMPOOL " rpelay x", 1),
-              "mempool: 'rpelay' is no subcommand\nSee 'mempool --help'.\n");
-    EXPECT_THAT(Command(MEMPOOL, 1), HasSubstr("A subcommand is required"));
-    EXPECT_THAT(Command(MEMPOOL " --version", 0), HasSubstr("mempool 1."));
     EXPECT_EQ(Tool("", 1), "mempool: TRACE is required\nSee 'mempool replay --help'.\n");
     EXPECT_THAT(Tool("--rounds 0 x", 1), HasSubstr("--rounds"));
     for (const char* option : {"--bucket-size 65536", "--max-record 32768", "--min-record 3",
                                "--alignment 0", "--alignment 65536"}) {
-        EXPECT_THAT(Tool(std::string(option) + " x", 1), HasSubstr(" not in range "));
+        EXPECT_THAT(Tool(std::string(option) + " x", 1), HasSubstr(" is not between "));
     }
-    EXPECT_THAT(Tool("--help"), HasSubstr("]=11\n"));
 }
 
 // One step more or less, and the library would stop the process.

@@ -213,7 +213,7 @@ TEST(TextCommand, PrintsAnyTrace) {
               "mempool: bad: 1 malformed lines ignored\n");
     EXPECT_EQ(Shell::Output(command + "- <none", 1),
               "mempool: standard input: 1 malformed lines ignored\n"
-              "mempool: standard input: no trace line\n");
+              "mempool: standard input: not a trace\n");
     EXPECT_EQ(Shell::Output(command + "cut", 1),
               "mempool: cut: unexpected end of file; read as far as it goes\n");
     EXPECT_EQ(Shell::Output(command + "lost", 1), "mempool: lost: No such file or directory\n");

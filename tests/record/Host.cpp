@@ -8,6 +8,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
@@ -29,7 +30,9 @@ void* Keep(void* block) {
     return block;
 }
 void Use(std::size_t size) {
+    errno = ENOTTY;
     std::free(Keep(std::malloc(size)));
+    if (errno != ENOTTY) { std::abort(); }
 }
 
 // A block that was there before main, and one that nobody frees.
@@ -150,6 +153,35 @@ void Spin() {
     for (int count = 0; count != 50000; ++count) { Use(200); }
 }
 
+void Allocate() {
+    for (int count = 0; count != 1000000; ++count) { Use(200); }
+}
+
+// With nobody to drain the channel, which fills.
+void Stop() {
+    kill(getppid(), SIGSTOP);
+    Allocate();
+    std::puts("done");
+}
+
+void CountInterrupts() {
+    static volatile std::sig_atomic_t number = 0;
+    std::signal(SIGINT, [](int) { number = number + 1; });
+    std::puts("ready");
+    std::fflush(stdout);
+    while (number == 0) { usleep(1000); }
+    usleep(200000);
+    std::printf("%d\n", static_cast<int>(number));
+}
+
+// Allocates now and then until it is killed.
+void Run() {
+    Use(70001);
+    std::puts("ready");
+    std::fflush(stdout);
+    while (usleep(1000) == 0) { Use(16); }
+}
+
 void Environment() {
     for (char** variable = environ; *variable != nullptr; ++variable) { std::puts(*variable); }
     for (int descriptor = 3; descriptor != 1024; ++descriptor) {
@@ -180,9 +212,10 @@ int main(int argc, char** argv) {
     if (what == "load") { Load(); }
     if (what == "signals") { Signals(); }
     if (what == "spin") { Spin(); }
-    if (what == "allocate") {
-        for (int count = 0; count != 1000000; ++count) { Use(200); }
-    }
+    if (what == "allocate") { Allocate(); }
+    if (what == "stop") { Stop(); }
+    if (what == "interrupts") { CountInterrupts(); }
+    if (what == "run") { Run(); }
     if (what == "environment") { Environment(); }
     if (what == "callers") {
         FirstCaller();
@@ -195,12 +228,6 @@ int main(int argc, char** argv) {
     if (what == "abort") {
         Use(70001);
         std::abort();
-    }
-    if (what == "sleep") {
-        Use(70001);
-        std::puts("ready");
-        std::fflush(stdout);
-        pause();
     }
     return 0;
 }

@@ -115,7 +115,12 @@ TEST(Report, WritesAPage) {
         data.replace(place, escape.size(), "<");
     }
     EXPECT_EQ(data + "\n", Tool("--json small"));
-    EXPECT_THAT(Tool("--html no/where small", 1), HasSubstr("mempool: no/where: No such file"));
+    EXPECT_EQ(Tool("--html no/where small", 1), "mempool: no/where: No such file or directory\n");
+    EXPECT_EQ(Tool("--html small small", 1),
+              "mempool: small: input and output are the same file\n");
+    EXPECT_EQ(Tool("--html small - <small", 1),
+              "mempool: small: input and output are the same file\n");
+    EXPECT_EQ(Bytes(Path("small")), trace);
     EXPECT_THAT(Tool("--html /dev/full small", 1), HasSubstr("mempool: /dev/full: No space left"));
     for (const char* lost : {"small", "--json small", "--help"}) {
         EXPECT_EQ(Tool(std::string(lost) + " >/dev/full", 1),
@@ -125,7 +130,10 @@ TEST(Report, WritesAPage) {
 
 TEST(Report, TellsWhatIsWrongWithATrace) {
     std::ofstream(Path("other")) << "nothing of the kind\n";
-    EXPECT_EQ(Tool("other", 1), "mempool: other: no trace line\n");
+    EXPECT_EQ(Tool("other", 1), "mempool: other: not a trace\n");
+    EXPECT_EQ(Tool("/dev/null", 1), "mempool: /dev/null: not a trace\n");
+    EXPECT_EQ(Tool("- <$(printf '\\0\\377' >bytes; echo bytes)", 1),
+              "mempool: standard input: not a trace\n");
     EXPECT_EQ(Tool("/nowhere", 1), "mempool: /nowhere: No such file or directory\n");
     EXPECT_THAT(Tool("--bucket-size 1003 other", 1),
                 HasSubstr("mempool: these settings make no pool: "));

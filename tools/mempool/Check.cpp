@@ -1,10 +1,6 @@
 // mempool check: runs a program with pools on, over the checked library, and under a checker.
 
-#include <unistd.h>
-
-#include <cerrno>
 #include <cstdlib>
-#include <cstring>
 #include <filesystem>
 #include <iostream>
 #include <map>
@@ -16,10 +12,12 @@
 
 #include <MemPoolSettings>
 
-#include "mempool/Command.hpp"
+#include "mempool/CommandLine.hpp"
 #include "mempool/HostFile.hpp"
 #include "mempool/Program.hpp"
-#include "record/Command.hpp"
+#include "system/Child.hpp"
+#include "system/ExitStatus.hpp"
+#include "system/ProgramFile.hpp"
 
 namespace Tool {
 
@@ -82,7 +80,7 @@ fs::path CheckedLibrary() {
 }
 
 With Choose(const Options& options, const HostFile& host, const std::string& program) {
-    const bool hasValgrind = Record::FindProgram("valgrind") != "valgrind";
+    const bool hasValgrind = System::FindProgram("valgrind") != "valgrind";
     const With fitting = host.isSanitized ? With::asan
                          : hasValgrind    ? With::valgrind
                                           : With::nothing;
@@ -119,21 +117,10 @@ void SetEnvironment(const Options& options) {
     Prepend("ASAN_OPTIONS", "redzone=128:verify_asan_link_order=0");
 }
 
-// Becomes the program.
-[[noreturn]] void Become(const std::vector<std::string>& command) {
-    std::vector<char*> words;
-    words.reserve(command.size() + 1);
-    for (const std::string& word : command) { words.push_back(const_cast<char*>(word.c_str())); }
-    words.push_back(nullptr);
-    execvp(words[0], words.data());
-    const int reason = errno;
-    throw Record::Refusal(reason == ENOENT ? 127 : 126, command[0] + ": " + std::strerror(reason));
-}
-
 [[noreturn]] void Check(const Options& options, std::vector<std::string> command) {
     const std::string program = command[0];
-    Record::CheckProgram(program, "checked");
-    const HostFile host = ReadHostFile(Record::FindProgram(program));
+    System::CheckPreload(program, "checked");
+    const HostFile host = ReadHostFile(System::FindProgram(program));
     if (host.holdsLibrary) {
         throw std::runtime_error(program +
                                  " contains the library (libObrMemPool.a); to check it, " +
@@ -154,7 +141,7 @@ void SetEnvironment(const Options& options) {
         valgrind.emplace_back("--");
         command.insert(command.begin(), valgrind.begin(), valgrind.end());
     }
-    Become(command);
+    System::Become(command);
 }
 
 }  // namespace
@@ -168,23 +155,12 @@ void AddCheck(Program& program) {
     check.add_option("--with", options->with, "The checker that the program runs under")
         ->type_name("CHECKER")
         ->check(CLI::IsMember(&checkers));
-    check.add_option(alignment.option, options->alignment, alignment.help)
-        ->type_name("BYTES")
-        ->check(CLI::Range(1, 64).description(""))
-        ->capture_default_str();
+    AddNumber(check, alignment.option, options->alignment, 1, 64, alignment.help)
+        .type_name("BYTES");
     check.callback([&program, options] {
         const std::vector<std::string> command = program.command;
         if (command.empty()) { throw CLI::RequiredError("PROGRAM"); }
-        program.job = [options, command] {
-            int status = ownFailure;
-            try {
-                Check(*options, command);
-            } catch (const Record::Refusal& refusal) {
-                status = refusal.Status();
-                Say(refusal.what());
-            } catch (const std::exception& error) { Say(error.what()); }
-            return status;
-        };
+        program.job = [options, command]() -> int { Check(*options, command); };
     });
 }
 

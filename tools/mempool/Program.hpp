@@ -1,9 +1,10 @@
-// The program `mempool`: a subcommand adds itself to the command line and leaves there what is to
+// The program `mempool`: a subcommand adds itself to the command line, and leaves here what is to
 // be done once that is read.
 
 #ifndef OBR_TOOLS_MEMPOOL_PROGRAM_HPP
 #define OBR_TOOLS_MEMPOOL_PROGRAM_HPP
 
+#include <cstdlib>
 #include <functional>
 #include <string>
 #include <vector>
@@ -14,13 +15,13 @@ namespace Tool {
 
 struct Program {
     CLI::App commandLine;
-    std::function<int()> job;  // Of the subcommand that was asked for; returns the exit status.
+    std::function<int()> job;    // Of the subcommand that was asked for; returns the exit status.
+    int failure = EXIT_FAILURE;  // The exit status of a failure of the subcommand itself.
     std::vector<const CLI::App*> runners;  // The subcommands that run a program.
     std::vector<std::string> command;      // That program and its arguments.
 };
 
-// One line a subcommand, each in the file of its name; main.cpp calls them in the order of the
-// help.
+// Each is in the file of its subcommand; main.cpp calls them in the order of the help.
 void AddRun(Program& program);
 void AddRecord(Program& program);
 void AddReplay(Program& program);

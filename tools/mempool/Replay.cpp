@@ -17,6 +17,7 @@
 #include "advise/Advice.hpp"
 #include "advise/ForkedMeter.hpp"
 #include "mempool/AdviceText.hpp"
+#include "mempool/CommandLine.hpp"
 #include "mempool/Print.hpp"
 #include "mempool/Program.hpp"
 #include "mempool/Progress.hpp"
@@ -38,7 +39,8 @@ constexpr const char* notes =
     R"(A TRACE is what 'mempool record' has written, or the output of a program that ran with
 NUV_OBR_MEMPOOL_TRACE=1, plain or compressed by gzip. Of text only lines "xmpt:..." count.
 
-Settings without an option come from the variables NUV_OBR_MEMPOOL_....
+A setting without an option here is that of its environment variable, such as
+NUV_OBR_MEMPOOL_BUCKET_SIZE.
 
 pool          One enabled pool for each traced pool.
 heap          operator new[] and delete[]. What a pool drops is freed on the heap too, block by
@@ -59,7 +61,7 @@ bad lines     Left out of the replay. The library's own trace does not show Mgr:
 struct Options {
     bool sweep = false;
     unsigned int seconds = 30;
-    Replay::PoolSettings settings = Replay::PoolSettings::OfProcess();
+    Replay::PoolSettings settings;
     std::vector<std::string> paths;
     unsigned int rounds = 11;
     bool dbg = false;
@@ -178,16 +180,14 @@ void AddReplay(Program& program) {
         ->required()
         ->type_name("");
     AddSettings(replay, options->settings);
-    replay.add_option("--rounds", options->rounds, "Timed replays a side")
-        ->type_name("N")
-        ->check(CLI::Range(1, 1000000))
-        ->capture_default_str();
+    AddNumber(replay, "--rounds", options->rounds, 1, 1000000, "Timed replays a side");
     replay.add_flag("--dbg", options->dbg, "Print the report of each pool at the peak");
     replay.add_flag("--sweep", options->sweep,
                     "Try many settings in place of one, and print a table of them");
     AddSeconds(replay, options->seconds);
     replay.callback([&program, &replay, options] {
         CheckSweep(replay, options->sweep);
+        TakeEnvironment(replay, options->settings);
         program.job = [options] { return ReplayAll(*options); };
     });
 }

@@ -2,24 +2,23 @@
 
 #include "mempool/Report.hpp"
 
-#include <cerrno>
 #include <cstdlib>
 #include <exception>
-#include <fstream>
 #include <iostream>
 #include <memory>
 #include <new>
 #include <stdexcept>
 #include <string>
-#include <system_error>
 
 #include "mempool/Print.hpp"
 #include "mempool/Program.hpp"
 #include "mempool/Progress.hpp"
+#include "mempool/ReportText.hpp"
 #include "mempool/Settings.hpp"
 #include "report/Analysis.hpp"
 #include "report/Json.hpp"
 #include "report/Page.hpp"
+#include "trace/StepReader.hpp"
 
 namespace Tool {
 
@@ -48,28 +47,47 @@ together      The share of blocks that die in a series of two or more releases, 
 clear         Of these, the series that leave no block of the group alive: one Clear of a pool
               would replace them.
 
---json has the exact figures; docs/report.md lists its keys.
+--json has the exact figures; docs/report.md lists its keys. A setting without an option here is that
+of its environment variable, such as NUV_OBR_MEMPOOL_BUCKET_SIZE.
 )";
 
 struct Options {
-    ReportOptions report;
     std::string path;
+    OBR::MemPool::PoolSettings settings;
     bool all = false;
+    bool json = false;  // In place of the text.
+    std::string html;   // Where the page goes, besides; "-" is the standard output, with the page
+                        // alone. Empty for none.
 };
 
-void WriteFile(const std::string& path, const std::string& text) {
-    std::ofstream file(path, std::ios::binary);
-    file << text;
-    file.close();
-    if (!file) { throw std::system_error(errno, std::generic_category(), path); }
+// Returns the exit status.
+int WriteReport(Trace::StepReader& reader, const Options& options, System::OutputFile* page) {
+    CheckSettings(options.settings);
+    const Progress progress(reader.Name());
+    const Report::Analysis analysis = Report::Analyse(reader, options.settings, [&](auto position) {
+        progress.Show("line " + std::to_string(position));
+    });
+    progress.Clear();
+
+    if (options.html == "-") {
+        WritePage(*page, analysis);
+        return WarnOfBrokenTrace(reader);
+    }
+    if (options.json) {
+        std::cout << Report::ToJson(analysis) << '\n';
+    } else {
+        PrintAnalysis(std::cout, analysis, options.all ? Extent::All : Extent::Page);
+    }
+    std::cout << std::flush;
+    if (page != nullptr) { WritePage(*page, analysis); }
+    return WarnOfBrokenTrace(reader);
 }
 
 int ReportOn(const Options& options) {
-    ReportOptions report = options.report;
-    if (options.all) { report.extent = Extent::All; }
     try {
         Trace::StepReader reader(options.path);
-        return WriteReport(reader, report);
+        const auto page = OpenPage(options.html, {options.path});
+        return WriteReport(reader, options, page.get());
     } catch (const std::bad_alloc&) {
         std::cerr << "mempool: " << options.path << ": out of memory\n";
     }
@@ -78,27 +96,16 @@ int ReportOn(const Options& options) {
 
 }  // namespace
 
-int WriteReport(Trace::StepReader& reader, const ReportOptions& options) {
-    CheckSettings(options.settings);
-    if (!options.html.empty()) { Report::CheckCanMakePage(); }
-    const Progress progress(reader.Name());
-    const Report::Analysis analysis = Report::Analyse(reader, options.settings, [&](auto position) {
-        progress.Show("line " + std::to_string(position));
-    });
-    progress.Clear();
+std::unique_ptr<System::OutputFile> OpenPage(const std::string& path,
+                                             const std::vector<std::string>& inputs) {
+    if (path.empty()) { return nullptr; }
+    Report::CheckCanMakePage();
+    return std::make_unique<System::OutputFile>(path, inputs);
+}
 
-    if (options.html == "-") {
-        std::cout << Report::MakePage(analysis);
-        return WarnOfBrokenTrace(reader);
-    }
-    if (options.json) {
-        std::cout << Report::ToJson(analysis) << '\n';
-    } else {
-        PrintAnalysis(std::cout, analysis, options.extent);
-    }
-    std::cout << std::flush;
-    if (!options.html.empty()) { WriteFile(options.html, Report::MakePage(analysis)); }
-    return WarnOfBrokenTrace(reader);
+void WritePage(System::OutputFile& file, const Report::Analysis& analysis) {
+    file.Write(Report::MakePage(analysis));
+    file.Commit();
 }
 
 void AddReport(Program& program) {
@@ -108,16 +115,18 @@ void AddReport(Program& program) {
     report.add_option("TRACE", options->path, "File to report on; - is standard input")
         ->required()
         ->type_name("");
-    report.add_flag("--json", options->report.json, "Print all figures as JSON");
+    report.add_flag("--json", options->json, "Print all figures as JSON");
     report
         .add_option(
-            "--html", options->report.html,
+            "--html", options->html,
             "Also write a page with charts to FILE; - is standard output, with the page alone")
         ->type_name("FILE");
     report.add_flag("--all", options->all, "Print every size and every group");
-    AddSettings(report, options->report.settings);
-    report.callback(
-        [&program, options] { program.job = [options] { return ReportOn(*options); }; });
+    AddSettings(report, options->settings);
+    report.callback([&program, &report, options] {
+        TakeEnvironment(report, options->settings);
+        program.job = [options] { return ReportOn(*options); };
+    });
 }
 
 }  // namespace Tool

@@ -1,28 +1,23 @@
-// The report on a trace, as several subcommands print it.
+// The page of a report, for the subcommands that write one.
 
 #ifndef OBR_TOOLS_MEMPOOL_REPORT_HPP
 #define OBR_TOOLS_MEMPOOL_REPORT_HPP
 
+#include <memory>
 #include <string>
+#include <vector>
 
-#include "mempool/ReportText.hpp"
-#include "replay/PoolSettings.hpp"
-#include "trace/StepReader.hpp"
+#include "report/Analysis.hpp"
+#include "system/OutputFile.hpp"
 
 namespace Tool {
 
-struct ReportOptions {
-    Replay::PoolSettings settings = Replay::PoolSettings::OfProcess();
-    Extent extent = Extent::Page;
-    bool json = false;  // Instead of text.
-    std::string html;   // Where to write the page too, or empty. "-" is the standard output, with
-                        // the page alone.
-};
+// Opens the file of a page before any work is done for it; null if `path` is empty. A
+// std::runtime_error if it cannot be written, is one of the inputs, or no page can be made.
+std::unique_ptr<System::OutputFile> OpenPage(const std::string& path,
+                                             const std::vector<std::string>& inputs);
 
-// Reads the trace, shows progress on a terminal, and writes the report to the standard output.
-// Returns the exit status. Throws std::runtime_error if no pool can have the settings, the input is
-// not a trace, or a file cannot be written.
-int WriteReport(Trace::StepReader& reader, const ReportOptions& options);
+void WritePage(System::OutputFile& file, const Report::Analysis& analysis);
 
 }  // namespace Tool
 

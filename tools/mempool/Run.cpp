@@ -7,7 +7,6 @@
 #include <cstdlib>
 #include <exception>
 #include <filesystem>
-#include <fstream>
 #include <iostream>
 #include <memory>
 #include <stdexcept>
@@ -16,15 +15,18 @@
 
 #include "advise/Advice.hpp"
 #include "mempool/AdviceText.hpp"
-#include "mempool/Command.hpp"
+#include "mempool/CommandLine.hpp"
 #include "mempool/Print.hpp"
 #include "mempool/Program.hpp"
 #include "mempool/Progress.hpp"
-#include "mempool/Record.hpp"
+#include "mempool/RecordCommand.hpp"
+#include "mempool/Report.hpp"
 #include "mempool/ReportText.hpp"
 #include "mempool/Settings.hpp"
 #include "report/Analysis.hpp"
-#include "report/Page.hpp"
+#include "system/Child.hpp"
+#include "system/ExitStatus.hpp"
+#include "system/ProgramFile.hpp"
 #include "trace/OpenTrace.hpp"
 
 namespace Tool {
@@ -44,9 +46,9 @@ Ctrl-C ends the program, and what was recorded is told; once more ends that too.
 )";
 
 struct Options {
-    Options() { order.by = Record::By::Caller; }
+    Options() { order.by = Recorder::By::Caller; }
 
-    Record::Order order;
+    Recorder::Order order;
     std::string html;
     unsigned int seconds = 15;
 };
@@ -81,38 +83,20 @@ private:
     const int descriptor;
 };
 
-// Ahead of a run that may take long.
-void CheckPage(const std::string& path) {
-    if (path.empty()) { return; }
-    Report::CheckCanMakePage();
-    const bool isNew = !std::filesystem::exists(path);
-    if (!std::ofstream(path, std::ios::app)) {
-        throw std::system_error(errno, std::generic_category(), path);
-    }
-    if (isNew) { std::filesystem::remove(path); }
-}
-
-void WritePage(const std::string& path, const Report::Analysis& analysis) {
-    std::ofstream file(path, std::ios::binary);
-    file << Report::MakePage(analysis);
-    file.close();
-    if (!file) { throw std::system_error(errno, std::generic_category(), path); }
-}
-
 Trace::StepReader Open(const NamelessFile& trace, const Options& options) {
     return {Trace::OpenTrace(trace.Path()), options.order.command.front()};
 }
 
-void ReportOn(const NamelessFile& trace, const Options& options) {
+void ReportOn(const NamelessFile& trace, const Options& options, System::OutputFile* page) {
     Trace::StepReader reader = Open(trace, options);
     const Progress progress("mempool");
     const Report::Analysis analysis =
-        Report::Analyse(reader, Replay::PoolSettings::OfProcess(),
+        Report::Analyse(reader, OBR::MemPool::PoolSettings(),
                         [&](auto position) { progress.Show("event " + std::to_string(position)); });
     progress.Clear();
     std::cerr << '\n';
     PrintAnalysis(std::cerr, analysis, Extent::Short);
-    if (!options.html.empty()) { WritePage(options.html, analysis); }
+    if (page != nullptr) { WritePage(*page, analysis); }
 }
 
 void AdviseOn(const NamelessFile& trace, const Options& options) {
@@ -129,28 +113,23 @@ void AdviseOn(const NamelessFile& trace, const Options& options) {
 }
 
 int Run(Options options) {
+    const auto page =
+        OpenPage(options.html, {System::FindProgram(options.order.command.front()), "-"});
+    const NamelessFile trace;
+    options.order.tracePath = trace.Path();
+    Recorder::Outcome outcome;
     try {
-        CheckPage(options.html);
-        const NamelessFile trace;
-        options.order.tracePath = trace.Path();
-        Record::Outcome outcome;
-        try {
-            outcome = RecordAsOrdered(options.order);
-        } catch (const Record::Refusal& refusal) {
-            std::cerr << "mempool: " << trace.Named(refusal.what()) << '\n';
-            return refusal.Status();
-        }
-        ReportOn(trace, options);
-        try {
-            AdviseOn(trace, options);
-        } catch (const std::exception& error) {
-            std::cerr << "mempool: no advice: " << error.what() << '\n';
-        }
-        return EndLike(outcome);
-    } catch (const std::exception& error) {
-        std::cerr << "mempool: " << error.what() << '\n';
-        return ownFailure;
+        outcome = RecordAsOrdered(options.order);
+    } catch (const System::Failure& failure) {
+        throw System::Failure(failure.Status(), trace.Named(failure.what()));
     }
+    ReportOn(trace, options, page.get());
+    try {
+        AdviseOn(trace, options);
+    } catch (const std::exception& error) {
+        std::cerr << "mempool: no advice: " << error.what() << '\n';
+    }
+    return System::EndLike(outcome.waitStatus);
 }
 
 }  // namespace

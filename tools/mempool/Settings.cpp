@@ -1,9 +1,12 @@
 #include "mempool/Settings.hpp"
 
+#include <cstdlib>
 #include <stdexcept>
 #include <string>
 
 #include <MemPoolSettings>
+
+#include "mempool/CommandLine.hpp"
 
 namespace Tool {
 
@@ -15,17 +18,27 @@ void AddSettings(CLI::App& subcommand, OBR::MemPool::PoolSettings& settings) {
         }
         const std::string bounds =
             ", " + std::to_string(row.smallest) + " to " + std::to_string(row.largest);
-        subcommand.add_option(row.option, settings.*row.size, row.help + bounds)
-            ->check(CLI::Range(row.smallest, row.largest).description(""))
-            ->type_name("BYTES");
+        AddNumber(subcommand, row.option, settings.*row.size, row.smallest, row.largest,
+                  row.help + bounds)
+            .type_name("BYTES");
+    }
+}
+
+void TakeEnvironment(const CLI::App& subcommand, OBR::MemPool::PoolSettings& settings) {
+    for (const OBR::MemPool::Setting& row : OBR::MemPool::SettingTable::all) {
+        const char* const value = std::getenv(row.variable);
+        if (value == nullptr || *value == '\0' || subcommand.count(row.option) != 0) { continue; }
+        const unsigned int number = ParseNumber(row.variable, value, row.smallest, row.largest);
+        if (row.IsFlag()) {
+            settings.*row.flag = number != 0;
+        } else {
+            settings.*row.size = number;
+        }
     }
 }
 
 void AddSeconds(CLI::App& subcommand, unsigned int& seconds) {
-    subcommand.add_option("--seconds", seconds, "How long to search, about")
-        ->type_name("N")
-        ->check(CLI::Range(1, 100000))
-        ->capture_default_str();
+    AddNumber(subcommand, "--seconds", seconds, 1, 100000, "How long to search, about");
 }
 
 void CheckSettings(const OBR::MemPool::PoolSettings& settings) {

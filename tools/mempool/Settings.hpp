@@ -11,6 +11,10 @@ namespace Tool {
 // Adds an option for each setting, which stores it in `settings`. The others keep their values.
 void AddSettings(CLI::App& subcommand, OBR::MemPool::PoolSettings& settings);
 
+// Takes the settings for which no option was given from the environment, for the callback of the
+// subcommand. A bad value is an error like a bad option.
+void TakeEnvironment(const CLI::App& subcommand, OBR::MemPool::PoolSettings& settings);
+
 // Adds --seconds, the length of a search.
 void AddSeconds(CLI::App& subcommand, unsigned int& seconds);
 

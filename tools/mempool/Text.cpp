@@ -57,7 +57,7 @@ int PrintTrace(const std::string& path) {
     }
     std::string problem = source->Problem();
     if (!problem.empty()) { problem += "; read as far as it goes"; }
-    if (numEvents == 0 && problem.empty()) { problem = "no trace line"; }
+    if (numEvents == 0 && problem.empty()) { problem = "not a trace"; }
     if (problem.empty()) { return EXIT_SUCCESS; }
     std::cerr << "mempool: " << name << ": " << problem << '\n';
     return EXIT_FAILURE;

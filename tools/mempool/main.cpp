@@ -1,49 +1,53 @@
 // Reads the command line and does what the subcommand asks for.
 
-#include <algorithm>
+#include <fcntl.h>
+#include <unistd.h>
+
 #include <cstdio>
 #include <cstdlib>
 #include <exception>
 #include <iostream>
 #include <string>
-#include <utility>
 #include <vector>
 
-#include "mempool/Command.hpp"
+#include "mempool/CommandLine.hpp"
 #include "mempool/Program.hpp"
+#include "system/Child.hpp"
+#include "system/ExitStatus.hpp"
 
 namespace {
 
 constexpr const char* description =
-    R"(Tells what memory pools do, or would do, for a program: where its memory is, which settings suit it,
-and the faults that it makes with them. 'mempool run PROGRAM' is where to start.)";
+    R"(Shows what memory pools do, or would do, for a program: where its memory is, which settings suit
+it, and the faults that it makes with them. Start with 'mempool run PROGRAM'.)";
+
+// A standard stream that is closed would become the first file that is opened. In its place comes
+// one that cannot be written, and that the programs that are run do not inherit.
+void OccupyStandardStreams() {
+    for (int stream = STDIN_FILENO; stream <= STDERR_FILENO; ++stream) {
+        if (fcntl(stream, F_GETFD) < 0) { open("/dev/null", O_RDONLY | O_CLOEXEC); }
+    }
+}
+
+// Before work is done for it.
+bool CanWriteOutput() {
+    return (fcntl(STDOUT_FILENO, F_GETFL) & O_ACCMODE) != O_RDONLY;
+}
 
 // Whether all that went to the standard output has got there, which only a flush can tell. The C
-// streams are asked too: who writes through them does not change the state of the other.
+// streams are asked too: a write through them does not change the state of the others.
 bool IsOutputWritten() {
     std::cout.flush();
     return std::cout.good() && std::ferror(stdout) == 0;
 }
 
-// The status to end with: that of a failure, told in a line, if output is lost.
-int Checked(int status, int failure) {
-    if (IsOutputWritten()) { return status; }
-    std::cerr << "mempool: standard output cannot be written to\n";
-    return failure;
-}
-
-int Run(int argc, char** argv) {
-    Tool::Program program;
+int Run(Tool::Program& program, std::vector<std::string> words) {
     CLI::App& app = program.commandLine;
     app.name("mempool");
     app.description(description);
-    app.set_version_flag("--version", "mempool " MEMPOOL_VERSION);
+    app.set_help_flag("-h,--help", "Print this help");
+    app.set_version_flag("-V,--version", "mempool " MEMPOOL_VERSION, "Print the version");
     app.require_subcommand(1);
-    app.failure_message([](const CLI::App* whole, const CLI::Error& error) {
-        std::string asked = "mempool";
-        for (const CLI::App* sub : whole->get_subcommands()) { asked += " " + sub->get_name(); }
-        return "mempool: " + std::string(error.what()) + "\nSee '" + asked + " --help'.\n";
-    });
 
     Tool::AddRun(program);
     Tool::AddRecord(program);
@@ -53,30 +57,29 @@ int Run(int argc, char** argv) {
     Tool::AddText(program);
     Tool::AddCheck(program);
 
-    const std::string first = argc > 1 ? argv[1] : "-";
-    const auto isFirst = [&](const CLI::App* sub) { return sub->check_name(first); };
-    if (first.substr(0, 1) != "-" && app.get_subcommands(isFirst).empty()) {
-        std::cerr << "mempool: '" << first << "' is no subcommand\nSee 'mempool --help'.\n";
-        return EXIT_FAILURE;
-    }
-    std::vector<std::string> words(argv + 1, argv + argc);
-    const int failure = Tool::CutCommand(program, words) ? Tool::ownFailure : EXIT_FAILURE;
-    try {
-        std::reverse(words.begin(), words.end());  // As the parser takes them.
-        app.parse(std::move(words));
-    } catch (const CLI::ParseError& error) {
-        return Checked(app.exit(error) == 0 ? EXIT_SUCCESS : failure, failure);
-    }
-    return Checked(program.job(), failure);
+    int status = EXIT_SUCCESS;
+    const bool isToRun = Tool::ReadCommandLine(program, std::move(words), status);
+    // Where a program is run, the output is the program's.
+    const bool canWrite = program.failure == System::ownFailure || CanWriteOutput();
+    if (isToRun && canWrite) { status = program.job(); }
+    if (canWrite && IsOutputWritten()) { return status; }
+    std::cerr << "mempool: standard output cannot be written to\n";
+    return program.failure;
 }
 
 }  // namespace
 
 int main(int argc, char** argv) {
+    OccupyStandardStreams();
+    System::SurviveFileSizeLimit();
+    Tool::Program program;
     try {
-        return Run(argc, argv);
+        return Run(program, std::vector<std::string>(argv + 1, argv + argc));
+    } catch (const System::Failure& failure) {
+        std::cerr << "mempool: " << failure.what() << '\n';
+        return program.failure == System::ownFailure ? failure.Status() : EXIT_FAILURE;
     } catch (const std::exception& error) {
         std::cerr << "mempool: " << error.what() << '\n';
-        return EXIT_FAILURE;
+        return program.failure;
     }
 }

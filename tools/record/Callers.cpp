@@ -16,7 +16,7 @@
 #include <ctime>
 #include <initializer_list>
 
-namespace Record {
+namespace Recorder {
 
 namespace {
 
@@ -191,4 +191,4 @@ std::uint64_t FindCaller(Channel& channel, const void* returnAddress, const void
     return index;
 }
 
-}  // namespace Record
+}  // namespace Recorder

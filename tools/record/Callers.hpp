@@ -7,12 +7,12 @@
 
 #include "record/Channel.hpp"
 
-namespace Record {
+namespace Recorder {
 
 // The index into the channel's callers. The function that is called was entered from
 // `returnAddress`, with `frame` as its canonical frame address.
 std::uint64_t FindCaller(Channel& channel, const void* returnAddress, const void* frame);
 
-}  // namespace Record
+}  // namespace Recorder
 
 #endif

@@ -11,7 +11,7 @@
 #include <cstddef>
 #include <cstdint>
 
-namespace Record {
+namespace Recorder {
 
 // Tells the recorder in the program the descriptor of the channel.
 constexpr const char* channelVariable = "MEMPOOL_RECORD_CHANNEL";
@@ -116,6 +116,6 @@ constexpr std::uint64_t numCalibrationEvents = 1024;
 // One call in so many is timed, on average.
 constexpr std::uint32_t samplePeriod = 64;
 
-}  // namespace Record
+}  // namespace Recorder
 
 #endif

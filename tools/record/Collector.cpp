@@ -11,7 +11,7 @@
 #include <climits>
 #include <cstring>
 
-namespace Record {
+namespace Recorder {
 
 namespace {
 
@@ -146,4 +146,4 @@ std::string Collector::NameOfPool(std::uint64_t group, std::uint64_t pool) {
     return "heap";
 }
 
-}  // namespace Record
+}  // namespace Recorder

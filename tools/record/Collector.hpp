@@ -12,7 +12,7 @@
 #include "record/Symbols.hpp"
 #include "trace/CompactWriter.hpp"
 
-namespace Record {
+namespace Recorder {
 
 class Collector {
 public:
@@ -40,6 +40,6 @@ private:
     std::uint64_t numEvents = 0;
 };
 
-}  // namespace Record
+}  // namespace Recorder
 
 #endif

@@ -17,7 +17,7 @@
 #include "record/Callers.hpp"
 #include "record/Recorder.hpp"
 
-namespace Record {
+namespace Recorder {
 
 namespace {
 
@@ -182,6 +182,13 @@ void* Reallocate(void* block, std::size_t size, const CallSite& site) {
 
 }  // namespace
 
+// AddressSanitizer asks for its options. Otherwise it refuses to run after another library that has
+// been preloaded.
+RECORDER_API const char* SanitizerOptions() asm("__asan_default_options");
+const char* SanitizerOptions() {
+    return "verify_asan_link_order=0";
+}
+
 RECORDER_API void* malloc(std::size_t size) noexcept {
     if (!IsReady()) { return EarlyAllocate(size); }
     return Allocate(size, CALL_SITE, [=] { return next.Malloc(size); });
@@ -255,4 +262,4 @@ RECORDER_API std::size_t malloc_usable_size(void* block) noexcept {
     return IsEarly(block) ? EarlySize(block) : next.UsableSize(block);
 }
 
-}  // namespace Record
+}  // namespace Recorder

@@ -16,7 +16,7 @@
 #define MGR(name) asm("_ZN3OBR7MemPool3Mgr" name)
 #define MGR_CONST(name) "_ZNK3OBR7MemPool3Mgr" name
 
-namespace Record {
+namespace Recorder {
 
 namespace {
 
@@ -163,4 +163,4 @@ void Clear(void* mgr) {
     Put(*channel, Op::PoolCleared, PoolOf(mgr), 0, 0);
 }
 
-}  // namespace Record
+}  // namespace Recorder

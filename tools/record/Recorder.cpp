@@ -15,7 +15,7 @@
 #include <cstring>
 #include <ctime>
 
-namespace Record {
+namespace Recorder {
 
 namespace {
 
@@ -183,4 +183,4 @@ void Sample::End() {
     samples.ticks.fetch_add(counted, std::memory_order_relaxed);
 }
 
-}  // namespace Record
+}  // namespace Recorder

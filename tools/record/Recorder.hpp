@@ -12,7 +12,7 @@
 
 #define RECORDER_API extern "C" __attribute__((visibility("default")))
 
-namespace Record {
+namespace Recorder {
 
 // On a page of its own, which the kernel clears in a forked child: the child goes on unrecorded,
 // however it was made.
@@ -116,6 +116,6 @@ private:
     std::uint64_t inside = 0;
 };
 
-}  // namespace Record
+}  // namespace Recorder
 
 #endif

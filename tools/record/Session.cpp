@@ -3,7 +3,6 @@
 
 #include "record/Session.hpp"
 
-#include <fcntl.h>
 #include <sys/mman.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -19,73 +18,25 @@
 #include <iomanip>
 #include <sstream>
 #include <string_view>
-#include <system_error>
-#include <utility>
 
 #include "record/Collector.hpp"
 #include "record/Ticks.hpp"
+#include "system/Child.hpp"
+#include "system/Descriptor.hpp"
+#include "system/ExitStatus.hpp"
+#include "system/OutputFile.hpp"
+#include "system/ProgramFile.hpp"
 #include "trace/CompactWriter.hpp"
 
-namespace Record {
+namespace Recorder {
 
 namespace {
 
 using Clock = std::chrono::steady_clock;
 
-constexpr int ownFailure = 125;
-
 [[noreturn]] void Fail(const std::string& what) {
-    throw Refusal(ownFailure, what + ": " + std::generic_category().message(errno));
+    throw System::Failure(System::ownFailure, what, errno);
 }
-
-class Descriptor {
-public:
-    explicit Descriptor(int number) : descriptor(number) {}
-    Descriptor(const Descriptor&) = delete;
-    Descriptor& operator=(const Descriptor&) = delete;
-    ~Descriptor() { Close(); }
-
-    int Number() const { return descriptor; }
-    bool IsOpen() const { return descriptor >= 0; }
-    int Close() { return descriptor < 0 ? 0 : close(std::exchange(descriptor, -1)); }
-
-private:
-    int descriptor;
-};
-
-// The file of the trace. What goes wrong is kept until the program has ended: it shall not notice.
-class TraceFile {
-public:
-    explicit TraceFile(std::string filePath)
-        : path(std::move(filePath)),
-          file(open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0666)) {
-        if (!file.IsOpen()) { Fail(path); }
-    }
-
-    void Write(std::string_view bytes) {
-        while (!bytes.empty() && error == 0) {
-            const ssize_t number = write(file.Number(), bytes.data(), bytes.size());
-            if (number < 0 && errno == EINTR) { continue; }
-            if (number < 0) { error = errno; }
-            bytes.remove_prefix(number < 0 ? 0 : static_cast<std::size_t>(number));
-            size += number < 0 ? 0 : static_cast<std::uint64_t>(number);
-        }
-    }
-    void Close() {
-        if (file.Close() != 0 && error == 0) { error = errno; }
-    }
-    void Check() const {
-        if (error == 0) { return; }
-        throw Refusal(ownFailure, path + ": " + std::generic_category().message(error));
-    }
-    std::uint64_t Size() const { return size; }
-
-private:
-    const std::string path;
-    Descriptor file;
-    int error = 0;
-    std::uint64_t size = 0;
-};
 
 // The channel's memory, which has no name and goes with the last of its users.
 class SharedChannel {
@@ -110,7 +61,7 @@ public:
     int Number() const { return descriptor.Number(); }
 
 private:
-    Descriptor descriptor;
+    System::Descriptor descriptor;
     Channel* channel = nullptr;
 };
 
@@ -161,50 +112,26 @@ std::string FindRecorder(bool pools) {
         const std::filesystem::path path = (folder / place / name).lexically_normal();
         if (!exists(path)) { continue; }
         if (path.string().find_first_of(" :") != std::string::npos) {
-            throw Refusal(ownFailure, path.string() +
-                                          ": a blank or a colon in its path keeps the "
-                                          "recorder from being loaded");
+            throw System::Failure(System::ownFailure,
+                                  path.string() +
+                                      ": a blank or a colon in its path keeps the "
+                                      "recorder from being loaded");
         }
         return path;
     }
-    throw Refusal(ownFailure, name + ": not found beside mempool");
+    throw System::Failure(System::ownFailure, name + ": not found beside mempool");
 }
 
-// Turns the forked child into the program. What fails is told through `errors`.
-[[noreturn]] void Become(const Order& order, const SharedChannel& channel,
-                         const std::string& recorder, const Signals& signals, int errors) {
+// What the recorder in the program needs, in the child that becomes the program.
+void Prepare(const Order& order, const SharedChannel& channel, const std::string& recorder,
+             const Signals& signals) {
     channel->pid = getpid();
+    if (order.tracePath == "-") { dup2(STDERR_FILENO, STDOUT_FILENO); }
     const char* const preloaded = std::getenv("LD_PRELOAD");
     const bool isAlone = preloaded == nullptr || *preloaded == '\0';
     setenv("LD_PRELOAD", (isAlone ? recorder : recorder + ":" + preloaded).c_str(), 1);
     setenv(channelVariable, std::to_string(channel.Number()).c_str(), 1);
-    std::vector<char*> arguments;
-    for (const std::string& word : order.command) {
-        arguments.push_back(const_cast<char*>(word.c_str()));
-    }
-    arguments.push_back(nullptr);
     signals.Restore();
-    execvp(arguments.front(), arguments.data());
-    const int error = errno;
-    [[maybe_unused]] const ssize_t written = write(errors, &error, sizeof(error));
-    _exit(ownFailure);
-}
-
-pid_t Start(const Order& order, const SharedChannel& channel, const std::string& recorder,
-            const Signals& signals) {
-    int ends[2] = {};
-    if (pipe2(ends, O_CLOEXEC) != 0) { Fail("pipe"); }
-    const Descriptor reading(ends[0]);
-    Descriptor writing(ends[1]);
-    const pid_t program = fork();
-    if (program < 0) { Fail("fork"); }
-    if (program == 0) { Become(order, channel, recorder, signals, writing.Number()); }
-    writing.Close();
-    int error = 0;
-    if (read(reading.Number(), &error, sizeof(error)) == 0) { return program; }
-    waitpid(program, nullptr, 0);
-    throw Refusal(error == ENOENT ? 127 : 126,
-                  order.command.front() + ": " + std::generic_category().message(error));
 }
 
 std::string Text(double number) {
@@ -304,29 +231,25 @@ bool IsRunning(pid_t program) {
     return info.si_pid == 0;
 }
 
-// Drains the channel until the program ends, which is not waited for yet.
+// Drains the channel until the program ends, which is not waited for yet. What is drained soon gets
+// into the file, so that it is there even if this process is killed.
 void Follow(pid_t program, Collector& collector, Trace::CompactWriter& writer,
             const Signals& signals) {
     using namespace std::chrono_literals;
     constexpr auto shortest = 500us;
     constexpr auto longest = 20ms;
-    constexpr auto idleUntilFlush = 500ms;
-    std::chrono::nanoseconds pause = shortest;
-    std::chrono::nanoseconds idle = 0ns;
+    constexpr auto untilFlush = 500ms;
+    std::chrono::nanoseconds pause = 0ns;
+    Clock::time_point lastFlush = Clock::now();
     while (IsRunning(program)) {
-        if (collector.Drain()) {
-            pause = shortest;
-            idle = 0ns;
-            signals.Wait(0ns, program);
-            continue;
-        }
-        signals.Wait(pause, program);
-        idle += pause;
-        pause = std::min<std::chrono::nanoseconds>(2 * pause, longest);
-        if (idle > idleUntilFlush) {
+        if (Clock::now() - lastFlush > untilFlush) {
             writer.Flush();
-            idle = 0ns;
+            lastFlush = Clock::now();
         }
+        pause = collector.Drain()
+                    ? 0ns
+                    : std::clamp<std::chrono::nanoseconds>(2 * pause, shortest, longest);
+        signals.Wait(pause, program);
     }
     while (collector.Drain(true)) {}
 }
@@ -334,10 +257,12 @@ void Follow(pid_t program, Collector& collector, Trace::CompactWriter& writer,
 }  // namespace
 
 Outcome RecordProgram(const Order& order) {
-    CheckProgram(order.command.front());
+    const std::string program = order.command.front();
+    const std::string executed = System::CheckPreload(program, "recorded");
     const std::string recorder = FindRecorder(order.pools);
     const Signals signals;
-    TraceFile file(order.tracePath);
+    System::OutputFile file(order.tracePath, {System::FindProgram(program), "-"});
+    file.KeepIfCutShort();
     Trace::CompactWriter writer([&](std::string_view bytes) { file.Write(bytes); });
     WriteStart(writer, order);
     writer.Flush();
@@ -348,25 +273,24 @@ Outcome RecordProgram(const Order& order) {
     Collector collector(*channel, writer);
     if (!order.pools) { writer.WriteOwned(); }
     const TickRate rate;
-    const pid_t program = Start(order, channel, recorder, signals);
-    Follow(program, collector, writer, signals);
-    WriteTimes(writer, *channel, ProcessorSeconds(program), rate);
-    int status = 0;
-    waitpid(program, &status, 0);
-    writer.Finish();
-    file.Close();
-    file.Check();
-    if (channel->isTaken == 0) {
-        throw Refusal(ownFailure, order.command.front() +
-                                      ": has run, but did not load the recorder: nothing recorded");
-    }
+    const pid_t child =
+        System::Start(order.command, [&] { Prepare(order, channel, recorder, signals); });
+    Follow(child, collector, writer, signals);
+    WriteTimes(writer, *channel, ProcessorSeconds(child), rate);
     Outcome outcome;
-    outcome.exitStatus = WIFEXITED(status) ? WEXITSTATUS(status) : 0;
-    outcome.signal = WIFSIGNALED(status) ? WTERMSIG(status) : 0;
+    waitpid(child, &outcome.waitStatus, 0);
+    writer.Finish();
+    if (channel->isTaken == 0) {
+        throw System::Failure(System::ownFailure, program +
+                                                      ": has run, but did not load the "
+                                                      "recorder: nothing recorded");
+    }
+    file.Commit();
+    outcome.isAddressSanitized = System::IsAddressSanitized(executed);
     outcome.numEvents = collector.NumEvents();
     outcome.numThreads = channel->numThreads;
     outcome.traceSize = file.Size();
     return outcome;
 }
 
-}  // namespace Record
+}  // namespace Recorder

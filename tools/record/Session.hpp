@@ -8,29 +8,29 @@
 #include <vector>
 
 #include "record/Channel.hpp"
-#include "record/Command.hpp"
 
-namespace Record {
+namespace Recorder {
 
 struct Order {
     std::vector<std::string> command;  // The program and its arguments.
-    std::string tracePath;
+    std::string tracePath;             // "-" is the standard output.
     By by = By::All;
     bool pools = false;  // The calls of Mgr in place of the heap's.
 };
 
 struct Outcome {
-    int exitStatus = 0;
-    int signal = 0;  // That the program died by, or 0.
+    int waitStatus = 0;  // How the program ended, as waitpid says it.
     std::uint64_t numEvents = 0;
     std::uint64_t numThreads = 0;
     std::uint64_t traceSize = 0;
+    bool isAddressSanitized = false;  // The program is built with AddressSanitizer.
 };
 
-// Records the program. Signals sent to this process meanwhile go on to the program. A Refusal is
-// thrown ahead of the program's start, or behind its end if the trace could not be written.
+// Records the program. Signals sent to this process meanwhile go on to the program. A
+// System::Failure is thrown before the program starts, or after its end if the trace could not be
+// written.
 Outcome RecordProgram(const Order& order);
 
-}  // namespace Record
+}  // namespace Recorder
 
 #endif

@@ -8,7 +8,7 @@
 #include <cstdlib>
 #include <sstream>
 
-namespace Record {
+namespace Recorder {
 
 namespace {
 
@@ -70,4 +70,4 @@ Dwfl* Symbols::Open(const Module& module) {
     return place->second.get();
 }
 
-}  // namespace Record
+}  // namespace Recorder

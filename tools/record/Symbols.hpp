@@ -12,7 +12,7 @@
 
 struct Dwfl;
 
-namespace Record {
+namespace Recorder {
 
 // The name of the file, without its folders.
 std::string NameOf(const Module& module);
@@ -30,6 +30,6 @@ private:
     std::unordered_map<const Module*, File> files;
 };
 
-}  // namespace Record
+}  // namespace Recorder
 
 #endif

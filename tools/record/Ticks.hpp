@@ -12,7 +12,7 @@
 #include <ctime>
 #endif
 
-namespace Record {
+namespace Recorder {
 
 inline std::uint64_t Ticks() {
 #if defined(__x86_64__)
@@ -40,6 +40,6 @@ inline std::uint64_t TicksWhenDone() {
     return Ticks();
 }
 
-}  // namespace Record
+}  // namespace Recorder
 
 #endif

@@ -60,7 +60,7 @@ void StepReader::CheckEnd() const {
         reason = "no good trace line; line " + std::to_string(line.number) + ": " +
                  faultNames[static_cast<std::size_t>(line.fault)];
     } else if (reason.empty()) {
-        reason = "no trace line";
+        reason = "not a trace";
     }
     throw std::runtime_error(name + ": " + reason);
 }

@@ -1,18 +1,18 @@
 // mempool record: runs a program and writes a trace of its allocations.
 
-#include "mempool/Record.hpp"
+#include "mempool/RecordCommand.hpp"
 
-#include <sys/resource.h>
 #include <unistd.h>
 
 #include <algorithm>
-#include <csignal>
 #include <iostream>
 #include <map>
 #include <memory>
 #include <string>
 
-#include "mempool/Command.hpp"
+#include "mempool/CommandLine.hpp"
+#include "system/Child.hpp"
+#include "system/ExitStatus.hpp"
 
 namespace Tool {
 
@@ -30,6 +30,7 @@ Recorded are malloc, calloc, realloc (a release and an allocation), reallocarray
 forms, and operator new and delete, which call them. An allocator that is linked into the program
 itself cannot be seen.
 
+-o -          The trace goes to standard output, and what the program prints there to standard error.
 --by caller   A group is a return address: the first one outside of the C and C++ run-time
               libraries, with the function's name if the file has symbols. Calls out of a function
               of these libraries that takes stack by a size of its own count as that function's.
@@ -45,28 +46,23 @@ Exit status: the program's own; 125 if recording fails, 126 if the program canno
 (it is statically linked or runs with other rights), 127 if it is not found.
 )";
 
-int Run(const Record::Order& order) {
-    try {
-        const Record::Outcome outcome = RecordAsOrdered(order);
-        if (isatty(STDERR_FILENO) != 0) {
-            std::cerr << "mempool: " << outcome.numEvents << " events of " << outcome.numThreads
-                      << (outcome.numThreads == 1 ? " thread, " : " threads, ") << outcome.traceSize
-                      << " bytes in " << order.tracePath << '\n';
-        }
-        return EndLike(outcome);
-    } catch (const Record::Refusal& refusal) {
-        std::cerr << "mempool: " << refusal.what() << '\n';
-        return refusal.Status();
+int Run(const Recorder::Order& order) {
+    const Recorder::Outcome outcome = RecordAsOrdered(order);
+    if (isatty(STDERR_FILENO) != 0) {
+        std::cerr << "mempool: " << outcome.numEvents << " events of " << outcome.numThreads
+                  << (outcome.numThreads == 1 ? " thread, " : " threads, ") << outcome.traceSize
+                  << " bytes in " << order.tracePath << '\n';
     }
+    return System::EndLike(outcome.waitStatus);
 }
 
 }  // namespace
 
-void AddRecordOptions(CLI::App& subcommand, Record::Order& order) {
-    static const std::map<std::string, Record::By> names = {{"all", Record::By::All},
-                                                            {"caller", Record::By::Caller},
-                                                            {"module", Record::By::Module},
-                                                            {"thread", Record::By::Thread}};
+void AddRecordOptions(CLI::App& subcommand, Recorder::Order& order) {
+    static const std::map<std::string, Recorder::By> names = {{"all", Recorder::By::All},
+                                                              {"caller", Recorder::By::Caller},
+                                                              {"module", Recorder::By::Module},
+                                                              {"thread", Recorder::By::Thread}};
     CLI::Option* const by = subcommand.add_option_function<std::string>(
         "--by", [&order](const std::string& name) { order.by = names.at(name); },
         "What makes a group, a traced pool of its own: all, caller, module or thread");
@@ -79,32 +75,29 @@ void AddRecordOptions(CLI::App& subcommand, Record::Order& order) {
         ->excludes(by);
 }
 
-Record::Outcome RecordAsOrdered(const Record::Order& order) {
-    Record::Outcome outcome = Record::RecordProgram(order);
+Recorder::Outcome RecordAsOrdered(const Recorder::Order& order) {
+    Recorder::Outcome outcome = Recorder::RecordProgram(order);
     if (order.pools && outcome.numEvents == 0) {
         std::cerr << "mempool: " << order.command.front()
                   << " has made no pool of the shared library, libObrMemPool.so\n";
     }
+    if (outcome.isAddressSanitized) {
+        std::cerr << "mempool: " << order.command.front()
+                  << " is built with AddressSanitizer, which slows its allocations and delays its "
+                     "frees: record another build\n";
+    }
     return outcome;
-}
-
-int EndLike(const Record::Outcome& outcome) {
-    if (outcome.signal == 0) { return outcome.exitStatus; }
-    const rlimit noCore = {0, 0};  // The program has left its own, if any.
-    setrlimit(RLIMIT_CORE, &noCore);
-    std::signal(outcome.signal, SIG_DFL);
-    std::raise(outcome.signal);
-    constexpr int shellsSignalBase = 128;
-    return shellsSignalBase + outcome.signal;
 }
 
 void AddRecord(Program& program) {
     CLI::App& record = *program.commandLine.add_subcommand("record", description);
     record.footer(notes);
     AddCommand(program, record);
-    const auto order = std::make_shared<Record::Order>();
+    const auto order = std::make_shared<Recorder::Order>();
     order->tracePath = "mempool.trace";
-    record.add_option("-o,--output", order->tracePath, "The trace to write, over what is there")
+    record
+        .add_option("-o,--output", order->tracePath,
+                    "The trace to write, over what is there; - is standard output")
         ->type_name("FILE")
         ->capture_default_str();
     AddRecordOptions(record, *order);

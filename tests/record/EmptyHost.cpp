@@ -1,0 +1,5 @@
+// A program that does nothing.
+
+int main() {
+    return 0;
+}

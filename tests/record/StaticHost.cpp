@@ -1,5 +1,0 @@
-// A program without a loader.
-
-int main() {
-    return 0;
-}

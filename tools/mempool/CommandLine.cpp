@@ -1,0 +1,202 @@
+#include "mempool/CommandLine.hpp"
+
+#include <algorithm>
+#include <charconv>
+#include <cstdlib>
+#include <iostream>
+#include <memory>
+#include <numeric>
+#include <utility>
+
+#include "system/ExitStatus.hpp"
+
+namespace Tool {
+
+namespace {
+
+// The help in the words of its reader, not of the parser.
+class Help final : public CLI::Formatter {
+    std::string make_option_usage(const CLI::Option* option) const override {
+        return option->get_name(true, false) + make_option_opts(option);
+    }
+    std::string make_option_name(const CLI::Option* option, bool isPositional) const override {
+        std::string name = option->get_name(isPositional, !isPositional);
+        const std::size_t comma = name.find(',');
+        return comma == std::string::npos ? name : name.insert(comma + 1, " ");
+    }
+    std::string make_option_opts(const CLI::Option* option) const override {
+        const bool isList = option->get_expected_max() == CLI::detail::expected_max_vector_size;
+        const std::string type = option->get_type_name();
+        const std::string value = type.substr(0, type.find(':'));  // A check's description follows.
+        const bool hasValue = option->get_type_size() != 0 && !value.empty();
+        return (isList ? "..." : "") + (hasValue ? " " + value : "");
+    }
+    std::string make_option_desc(const CLI::Option* option) const override {
+        const std::string value = option->get_default_str();
+        return option->get_description() + (value.empty() ? "" : " [default: " + value + "]");
+    }
+};
+
+// How many letters must be left out, put in, replaced or exchanged with the next to make one of the
+// other.
+std::size_t Distance(const std::string& one, const std::string& other) {
+    std::vector<std::size_t> beforeLast;
+    std::vector<std::size_t> last;
+    std::vector<std::size_t> row(other.size() + 1);
+    std::iota(row.begin(), row.end(), std::size_t{0});
+    for (std::size_t i = 1; i <= one.size(); ++i) {
+        beforeLast = std::exchange(last, row);
+        row[0] = i;
+        for (std::size_t j = 1; j <= other.size(); ++j) {
+            const std::size_t replaced = one[i - 1] == other[j - 1] ? 0 : 1;
+            row[j] = std::min({last[j] + 1, row[j - 1] + 1, last[j - 1] + replaced});
+            if (i > 1 && j > 1 && one[i - 1] == other[j - 2] && one[i - 2] == other[j - 1]) {
+                row[j] = std::min(row[j], beforeLast[j - 2] + 1);
+            }
+        }
+    }
+    return row.back();
+}
+
+// "; did you mean 'NAME'?" for the name nearest to the word, or "" if none is near.
+std::string Suggestion(const std::string& word, const std::vector<std::string>& names) {
+    const auto nearest = std::min_element(names.begin(), names.end(),
+                                          [&](const std::string& one, const std::string& other) {
+                                              return Distance(word, one) < Distance(word, other);
+                                          });
+    if (nearest == names.end() || 3 * Distance(word, *nearest) > word.size()) { return ""; }
+    return "; did you mean '" + *nearest + "'?";
+}
+
+std::vector<std::string> OptionNames(const CLI::App& app) {
+    std::vector<std::string> names;
+    for (const CLI::Option* option : app.get_options()) {
+        for (const std::string& name : option->get_lnames()) { names.push_back("--" + name); }
+    }
+    return names;
+}
+
+// Why a word of the command line is not known, "" if it is no option.
+std::string UnknownOption(const CLI::App& app, const std::string& word) {
+    if (word.size() < 2 || word[0] != '-') { return ""; }
+    const std::string name = word.substr(0, word.find('='));
+    return name + ": unknown option" + Suggestion(name, OptionNames(app));
+}
+
+// If the words begin with a subcommand that runs a program, moves what belongs to that program from
+// their end to Program::command.
+void CutCommand(Program& program, std::vector<std::string>& words) {
+    const auto runner = std::find_if(
+        program.runners.begin(), program.runners.end(),
+        [&](const CLI::App* sub) { return !words.empty() && sub->check_name(words.front()); });
+    if (runner == program.runners.end()) { return; }
+    program.failure = System::ownFailure;
+    auto first = words.begin() + 1;
+    const auto isOption = [](const std::string& word) {
+        return word.size() > 1 && word[0] == '-' && word != "--";
+    };
+    while (first != words.end() && isOption(*first)) {
+        const CLI::Option* const option = (*runner)->get_option_no_throw(*first++);
+        const bool hasValue = option != nullptr && option->get_items_expected_min() > 0;
+        if (hasValue && first != words.end()) { ++first; }
+    }
+    program.command.assign(first, words.end());
+    words.erase(first, words.end());
+    if (!program.command.empty() && program.command.front() == "--") {
+        program.command.erase(program.command.begin());
+    }
+}
+
+// What is wrong with the command line.
+std::string Problem(const CLI::App& app, const CLI::ParseError& error) {
+    // The parser looks for what is missing before it looks at what is too much.
+    for (const std::string& word : app.remaining()) {
+        const std::string problem = UnknownOption(app, word);
+        if (!problem.empty()) { return problem; }
+        if (dynamic_cast<const CLI::ExtrasError*>(&error) != nullptr) {
+            return word + ": unexpected argument";
+        }
+    }
+    return error.what();
+}
+
+}  // namespace
+
+bool ReadCommandLine(Program& program, std::vector<std::string> words, int& status) {
+    CLI::App& app = program.commandLine;
+    app.add_subcommand("help", "Print the help of mempool, or of a subcommand")
+        ->add_option("SUBCOMMAND")
+        ->type_name("");
+    app.formatter(std::make_shared<Help>());
+    const std::vector<CLI::App*> subcommands = app.get_subcommands({});
+    std::vector<std::string> names;
+    for (CLI::App* sub : subcommands) {
+        sub->formatter(app.get_formatter());
+        names.push_back(sub->get_name());
+    }
+
+    if (!words.empty() && words[0] == "help" &&
+        (words.size() == 1 || words[1].substr(0, 1) != "-")) {
+        words.erase(words.begin());
+        words.emplace_back("--help");
+    }
+    const std::string first = words.empty() ? "-" : words.front();
+    const auto sub = std::find(names.begin(), names.end(), first);
+    const CLI::App& asked = sub == names.end() ? app : *app.get_subcommand(first);
+    CutCommand(program, words);
+    std::string problem;
+    if (sub == names.end() && first.substr(0, 1) != "-") {
+        problem = first + ": unknown subcommand" + Suggestion(first, names);
+    } else {
+        try {
+            std::reverse(words.begin(), words.end());  // As the parser takes them.
+            app.parse(std::move(words));
+            return true;
+        } catch (const CLI::Success& success) {
+            status = app.exit(success);
+            return false;
+        } catch (const CLI::ParseError& error) { problem = Problem(asked, error); }
+    }
+    std::cerr << "mempool: " << problem << "\nSee 'mempool "
+              << (sub == names.end() ? "" : first + " ") << "--help'.\n";
+    status = program.failure;
+    return false;
+}
+
+void AddCommand(Program& program, CLI::App& subcommand) {
+    // For the help alone: its words never get there.
+    subcommand.add_option("PROGRAM", program.command, "The program to run and its arguments")
+        ->type_name("[ARGS...]")
+        ->expected(0, 1);
+    program.runners.push_back(&subcommand);
+}
+
+unsigned int ParseNumber(const std::string& name, const std::string& text, unsigned int smallest,
+                         unsigned int largest) {
+    long long number = 0;
+    const char* const end = text.data() + text.size();
+    const auto result = std::from_chars(text.data(), end, number);
+    if (result.ptr != end || result.ec == std::errc::invalid_argument) {
+        throw CLI::ValidationError(name, "'" + text + "' is not a number");
+    }
+    if (result.ec != std::errc() || number < smallest || number > largest) {
+        throw CLI::ValidationError(name, text + " is not between " + std::to_string(smallest) +
+                                             " and " + std::to_string(largest));
+    }
+    return static_cast<unsigned int>(number);
+}
+
+CLI::Option& AddNumber(CLI::App& subcommand, const std::string& name, unsigned int& place,
+                       unsigned int smallest, unsigned int largest, const std::string& help) {
+    return *subcommand
+                .add_option_function<std::string>(
+                    name,
+                    [&place, name, smallest, largest](const std::string& text) {
+                        place = ParseNumber(name, text, smallest, largest);
+                    },
+                    help)
+                ->type_name("N")
+                ->default_str(std::to_string(place));
+}
+
+}  // namespace Tool
