@@ -37,7 +37,9 @@ struct Bare {
 struct Layered {
     Heap heap;
     explicit Layered(const char* name) : heap(name) {}
-    volatile char* Take(unsigned int size) { return static_cast<char*>(heap.Malloc(size)); }
+    volatile char* Take(unsigned int size) {
+        return static_cast<char*>(heap.Realloc(heap.Malloc(2 * size), size));
+    }
     bool Give(volatile char* block) { return heap.Free(const_cast<char*>(block)); }
     void Drop() { heap.FreeAll(); }
     bool Agrees(volatile char* block) {

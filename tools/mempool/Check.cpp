@@ -43,7 +43,8 @@ The default is asan for a program that is built with it, else valgrind if it is 
 Sizes are not rounded, so that one-byte overruns are caught. For a program that relies on the
 rounding, --alignment brings it back.
 
-ASAN_OPTIONS            Kept, as VALGRIND_OPTS is; the default red zones are 128 bytes.
+ASAN_OPTIONS            Kept, as VALGRIND_OPTS is. The defaults here are red zones of 128 bytes and
+                        stacks of 30 callers.
 MEMPOOL_ABORT           1: the library aborts at a release that it refuses, so that a debugger
                         stops there.
 MEMPOOL_CHECK_STATUS    The exit status, from 1 to 255, for faults that only the library reports, 99
@@ -98,11 +99,11 @@ With Choose(const Options& options, const HostFile& host, const std::string& pro
     return with;
 }
 
-// Puts a value in front of those that a variable has.
-void Prepend(const char* variable, const std::string& value) {
+// Puts a value before those that a variable has.
+void Prepend(const char* variable, const std::string& value, char separator = ':') {
     const char* const present = std::getenv(variable);
     const bool isEmpty = present == nullptr || *present == '\0';
-    setenv(variable, (isEmpty ? value : value + ":" + present).c_str(), 1);
+    setenv(variable, (isEmpty ? value : value + separator + present).c_str(), 1);
 }
 
 void SetEnvironment(const Options& options) {
@@ -115,6 +116,7 @@ void SetEnvironment(const Options& options) {
     Prepend("LD_LIBRARY_PATH", library.parent_path());
     Prepend("LD_PRELOAD", library);
     Prepend("ASAN_OPTIONS", "redzone=128:verify_asan_link_order=0");
+    Prepend("VALGRIND_OPTS", "--num-callers=30", ' ');
 }
 
 [[noreturn]] void Check(const Options& options, std::vector<std::string> command) {

@@ -53,7 +53,8 @@ Use::Pool& Use::Of(const BucketMgr& pool) {
 Use::Use(const BucketMgr& bucketMgr) : pool(Of(bucketMgr)), lock(pool.mutex, std::try_to_lock) {
     const bool isShared = !lock.owns_lock();
     if (isShared) { lock.lock(); }
-    Thread user{gettid()};
+    thread_local const pid_t id = gettid();  // A system call for each operation takes too long.
+    Thread user{id};
     if (pool.user.id == user.id) { return; }
 
     if (user.id != getpid()) { pthread_getname_np(pthread_self(), user.name, sizeof user.name); }
