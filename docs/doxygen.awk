@@ -1,9 +1,8 @@
-# A filter for doxygen: the comments of the headers become its own. One ahead of declarations is about
-# all of them up to the next empty line, one beside a declaration may go on in lines of its own, and
-# the first one of a file is about the file. Other comments, and those in functions, stay what they
-# are.
+# A filter that turns plain comments of a header into doxygen's. A comment before declarations documents all of
+# them up to the next empty line. A comment after a declaration, on its line, may continue on the next lines. The
+# first comment of a file documents the file. Other comments, and those in functions, do not change.
 
-# How many braces the line opens, those that it closes taken off.
+# The braces that the line opens, less those that it closes.
 function opened(line) { return gsub(/\{/, "", line) - gsub(/\}/, "", line) }
 
 function for_doxygen(text, mark) {
@@ -15,7 +14,7 @@ function for_doxygen(text, mark) {
 /^ *\/\/ -\*-/   { print "/// \\file"; isOfFile = 1; next }
 /^ *\/\/ NOLINT/ { print ""; next }
 
-# The body of a function, up to the brace that ends it.
+# The body of a function, up to its last brace.
 depth > 0 {
     print
     depth += opened($0)
@@ -23,7 +22,7 @@ depth > 0 {
     next
 }
 
-# A line of comment alone.
+# A line with only a comment.
 /^ *\/\// && beside && index($0, "//") > 9 { print for_doxygen($0, "///<"); next }
 /^ *\/\// {
     plain = plain $0 "\n"
@@ -31,7 +30,7 @@ depth > 0 {
     next
 }
 
-# What stands behind a comment tells what it is about.
+# The line after a comment shows what the comment documents.
 plain != "" {
     printf "%s", isOfFile || !/^ *$/ ? documented : plain
     block = /^ *$/ ? "" : documented
@@ -42,7 +41,7 @@ plain != "" {
 { beside = 0 }
 /^ *$/ { block = "" }
 
-# The next declaration of several with one comment.
+# A further declaration with the same comment.
 /= delete;$/ { print "/// Not to be called."; isComplete = 0 }
 block != "" && isComplete { printf "%s", block }
 
