@@ -1,4 +1,4 @@
-# Install rules for the library, its headers, and the files through which CMake (ObrMemPool) and pkg-config
+# Install rules for the libraries, their headers, and the files through which CMake (ObrMemPool) and pkg-config
 # (ObrMemPool.pc) find them. These files contain relative paths, so an installed tree can be moved. Users of
 # the shared library need no other library, not even a host layer, which it links privately. Users of the
 # static library link a host layer themselves.
@@ -11,14 +11,14 @@
 
 include(CMakePackageConfigHelpers)
 
-set(libraries MemPool)
+set(libraries MemPool MemPoolC)
 if(TARGET MemPoolStatic)
-    list(APPEND libraries MemPoolStatic)
+    list(APPEND libraries MemPoolStatic MemPoolCStatic)
 endif()
 install(TARGETS ${libraries} EXPORT ObrMemPool
     LIBRARY COMPONENT runtime NAMELINK_COMPONENT dev
     ARCHIVE COMPONENT dev)
-install(FILES include/MemPool include/MemPoolHeap include/MemPoolSettings
+install(FILES include/MemPool include/MemPoolHeap include/MemPoolHeap.h include/MemPoolSettings
     DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} COMPONENT dev)
 
 set(packageDir ${CMAKE_INSTALL_LIBDIR}/cmake/ObrMemPool)
@@ -44,5 +44,8 @@ cmake_path(RELATIVE_PATH CMAKE_INSTALL_PREFIX BASE_DIRECTORY ${fullPkgConfigDir}
     OUTPUT_VARIABLE pkgConfigDirToPrefix)
 cmake_path(APPEND pkgConfigLibDir "\${prefix}" ${CMAKE_INSTALL_LIBDIR})
 cmake_path(APPEND pkgConfigIncludeDir "\${prefix}" ${CMAKE_INSTALL_INCLUDEDIR})
-configure_file(${CMAKE_CURRENT_LIST_DIR}/ObrMemPool.pc.in ObrMemPool.pc @ONLY)
-install(FILES ${CMAKE_CURRENT_BINARY_DIR}/ObrMemPool.pc DESTINATION ${pkgConfigDir} COMPONENT dev)
+foreach(package ObrMemPool ObrMemPoolC)
+    configure_file(${CMAKE_CURRENT_LIST_DIR}/${package}.pc.in ${package}.pc @ONLY)
+    install(FILES ${CMAKE_CURRENT_BINARY_DIR}/${package}.pc
+        DESTINATION ${pkgConfigDir} COMPONENT dev)
+endforeach()

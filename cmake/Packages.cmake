@@ -48,7 +48,8 @@ set(CPACK_DEBIAN_TOOLS_PACKAGE_SUGGESTS "gdb, valgrind")
 # The dependency of packages that link the library, and the trigger that updates the loader's cache. A
 # change of the exported interface raises the version here.
 file(CONFIGURE OUTPUT packages/shlibs
-    CONTENT "libObrMemPool ${PROJECT_VERSION_MAJOR} ${runtimePackage} (>= 1.0.0)\n")
+    CONTENT "libObrMemPool ${PROJECT_VERSION_MAJOR} ${runtimePackage} (>= 1.0.0)
+libObrMemPoolC ${PROJECT_VERSION_MAJOR} ${runtimePackage} (>= 1.0.0)\n")
 file(CONFIGURE OUTPUT packages/triggers CONTENT "activate-noawait ldconfig\n")
 set(CPACK_DEBIAN_RUNTIME_PACKAGE_CONTROL_EXTRA
     ${CMAKE_CURRENT_BINARY_DIR}/packages/shlibs

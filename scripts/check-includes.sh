@@ -15,6 +15,8 @@ s/MemPool
 s/diagnostics/checked
 s/diagnostics/reports
 include/MemPoolHeap
+include/MemPoolHeap.h
+s/MemPoolC
 tools/system
 tools/trace
 tools/replay

@@ -1,6 +1,7 @@
 // The public headers alone, with every operation of their templates and the forms in which a handle
 // can be made, in each version of the language that a host may use. Compiled and never run.
 
+#include <MemPoolHeap.h>
 #include <MemPool>
 #include <MemPoolHeap>
 #include <MemPoolSettings>

@@ -3,6 +3,7 @@
 #include <MemPoolHeap>
 
 #include <algorithm>
+#include <cstring>
 #include <stdexcept>
 
 #include <gtest/gtest.h>
@@ -81,6 +82,18 @@ void World::Build(HeapPlace& place) {
     if ((said & 32) != 0) { settings.KeepEmptyBuckets((said & 64) != 0); }
     place.alignment = (said & 128) != 0 ? std::size_t{1} << bytes.Below(14) : 8;
     settings.Alignment(place.alignment);
+    obr_heap_settings inC = {};
+    inC.struct_size = sizeof inC;
+    inC.pools = isOn ? OBR_HEAP_ON : OBR_HEAP_OFF;
+    if ((said & 32) != 0) {
+        inC.keep_empty_buckets = (said & 64) != 0 ? OBR_HEAP_ON : OBR_HEAP_OFF;
+    }
+    inC.bucket_size = sizes.bucket;
+    inC.max_record_size = sizes.largest;
+    inC.min_record_size = sizes.smallest;
+    inC.data_alignment = sizes.alignment;
+    inC.alignment = place.alignment;
+    const bool isSameInC = sizes.bucket * sizes.largest * sizes.smallest * sizes.alignment != 0;
 
     const bool isWrong = sizes.alignment > 65532 || place.alignment < 8 || place.alignment > 4096;
     sizes.alignment = std::max((sizes.alignment + 3) / 4 * 4, 4u);
@@ -88,13 +101,20 @@ void World::Build(HeapPlace& place) {
     if (accounts.IsTaken(name) && GetMgr(name) == nullptr) { return; }
     bool isRefused = false;
     const bool succeeds = Succeeds([&] {
+        if (isSameInC && bytes.Byte() % 2 == 0) {
+            place.owner.reset(obr_heap_new(name, &inC));
+            if (place.owner == nullptr && HeapSpy::refuseIn == 0) { throw std::bad_alloc(); }
+            isRefused = place.owner == nullptr;
+            return;
+        }
         try {
-            place.heap = std::make_unique<Heap>(name, settings);
+            place.owner.reset(new obr_heap{Heap(name, settings)});
         } catch (const std::invalid_argument&) { isRefused = true; }
     });
     if (!succeeds) { return; }
     EXPECT_EQ(isRefused, isWrong || !sizes.CanMakePool() || accounts.IsTaken(name));
     if (isRefused) { return; }
+    place.heap = &place.owner->heap;
     place.account = &accounts.Open(place.heap->GetMgr(), true);
     EXPECT_EQ(place.account->pool->enabled, isOn);
 }
@@ -105,17 +125,20 @@ void World::Destroy(HeapPlace& place) {
     CheckStats(place);
     accounts.Close(*place.account);
     place.account = nullptr;
-    place.heap.reset();
+    place.heap = nullptr;
+    place.owner.reset();
 }
 
 void World::Take(HeapPlace& place) {
     if (!HasRoom()) { return; }
     Heap& heap = *place.heap;
     std::size_t size = Size(*place.account);
-    const std::uint32_t way = bytes.Below(8);
-    std::size_t alignment = way == 0 || way == 3 || way >= 6 ? place.alignment : 8;
-    if (way == 1 || way == 2 || way == 4) { alignment = std::size_t{1} << bytes.Below(14); }
-    const bool isZero = way == 3;
+    const std::uint32_t way = bytes.Below(12);
+    std::size_t alignment = way == 5 ? 8 : place.alignment;
+    if (way == 1 || way == 2 || way == 4 || way == 11) {
+        alignment = std::size_t{1} << bytes.Below(14);
+    }
+    const bool isZero = way == 3 || way == 10;
     if (isZero) { size = size / 3 * 3; }
     if (way == 5) { size = size / sizeof(std::uint64_t) * sizeof(std::uint64_t); }
     std::uint8_t* data = nullptr;
@@ -143,6 +166,19 @@ void World::Take(HeapPlace& place) {
             case 5:
                 taken = Allocator<std::uint64_t>(heap).allocate(size / sizeof(std::uint64_t));
                 break;
+            case 8:
+                taken = obr_heap_malloc(place.owner.get(), size);
+                break;
+            case 9:
+                taken =
+                    obr_heap_call(place.owner.get(), nullptr, 0, std::max<std::size_t>(size, 1));
+                break;
+            case 10:
+                taken = obr_heap_calloc(place.owner.get(), 3, size / 3);
+                break;
+            case 11:
+                taken = obr_heap_aligned_alloc(place.owner.get(), alignment, size);
+                break;
             default:
                 taken = heap.Malloc(size);
         }
@@ -155,7 +191,7 @@ void World::Take(HeapPlace& place) {
     }
     if (!Succeeds(take)) { return; }
     if (isZero) { EXPECT_EQ(std::count(data, data + size, 0), static_cast<long>(size)); }
-    const std::size_t usable = heap.UsableSize(data);
+    const std::size_t usable = obr_heap_usable_size(place.owner.get(), data);
     if (!place.account->pool->enabled) { EXPECT_EQ(usable, std::max<std::size_t>(size, 1)); }
     place.account->Add(data, {size, alignment, usable, FillByte(bytes), CapacityOf(heap, data),
                               MostFor(size, alignment)});
@@ -179,7 +215,9 @@ void World::Resize(HeapPlace& place) {
     bool isRefused = false;
     account.ExpectFilled(one);
     Succeeds([&] {
-        moved = static_cast<std::uint8_t*>(place.heap->Call(data, block.size, size));
+        moved = static_cast<std::uint8_t*>(
+            size % 2 == 0 ? place.heap->Call(data, block.size, size)
+                          : obr_heap_call(place.owner.get(), data, block.size, size));
         isRefused = HeapSpy::refuseIn == 0;
         if (isRefused) { throw std::bad_alloc(); }
     });
@@ -214,7 +252,7 @@ void World::GiveBack(HeapPlace& place) {
     account.live.erase(one);
     const bool staysReadable =
         account.pool->enabled && account.StaysReadable(account.RecordOf(data));
-    switch (bytes.Below(4)) {
+    switch (bytes.Below(6)) {
         case 0:
             heap.Deallocate(data, block.size, block.alignment);
             break;
@@ -223,6 +261,12 @@ void World::GiveBack(HeapPlace& place) {
             break;
         case 2:
             EXPECT_EQ(heap.Realloc(data, 0), nullptr);
+            break;
+        case 3:
+            EXPECT_TRUE(obr_heap_free(place.owner.get(), data));
+            break;
+        case 4:
+            EXPECT_EQ(obr_heap_call(place.owner.get(), data, block.size, 0), nullptr);
             break;
         default:
             EXPECT_TRUE(heap.Free(data));
@@ -276,6 +320,10 @@ void World::CheckStats(const HeapPlace& place) const {
         for (const auto& [data, block] : account.live) { bytesUsed += block.usable; }
     }
     EXPECT_EQ(stats.bytesUsed, bytesUsed);
+    obr_heap_statistics inC = {};
+    inC.struct_size = sizeof inC;
+    EXPECT_TRUE(obr_heap_stats(place.owner.get(), &inC));
+    EXPECT_EQ(std::memcmp(&inC.buckets, &stats, sizeof stats), 0);
     EXPECT_GE(stats.bytesHeld, stats.bytesUsed);
 }
 

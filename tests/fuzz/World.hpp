@@ -14,6 +14,7 @@
 #include "../HeapSpy.hpp"
 #include "Accounts.hpp"
 #include "Bytes.hpp"
+#include "MemPoolC/Heap.hpp"
 
 namespace Fuzz {
 
@@ -33,7 +34,8 @@ private:
         Account* account = nullptr;  // Null if it has no pool.
     };
     struct HeapPlace {
-        std::unique_ptr<OBR::MemPool::Heap> heap;
+        std::unique_ptr<obr_heap, decltype(&obr_heap_delete)> owner{nullptr, obr_heap_delete};
+        OBR::MemPool::Heap* heap = nullptr;  // The owner's. It takes the calls of C and of C++.
         Account* account = nullptr;
         std::size_t alignment = 8;  // Of blocks that ask for none.
     };

@@ -45,6 +45,12 @@ for compiler in g++ clang++; do
     echo "$compiler: FirstPool, FirstHeap and FirstContainers run by pkg-config, also statically"
 done
 
+# shellcheck disable=SC2046
+cc -std=c99 -Wall -Wextra -Wpedantic -Werror -static -o Plain "$sources/tests/consumer/Plain.c" \
+    $(pkg-config --static --cflags --libs ObrMemPoolC)
+./Plain
+echo "a C host runs by pkg-config, statically"
+
 NUV_OBR_MEMPOOL_TRACE=1 ./FirstPool | mempool replay --rounds 1 - >replay.txt
 grep -q "^   events  *5 " replay.txt
 mempool record -o FirstPool.trace ./FirstPool >/dev/null
