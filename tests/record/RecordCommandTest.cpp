@@ -22,6 +22,7 @@ struct Recorded {
     std::map<std::string, std::string> facts;
     std::map<std::string, int> numBlocks;  // Of its own, by the names of the pools.
     std::uint64_t numEvents = 0;
+    std::uint64_t milliseconds = 0;  // When the last ones happened.
 };
 
 Recorded ReadTrace(const std::string& name) {
@@ -43,6 +44,7 @@ Recorded ReadTrace(const std::string& name) {
     EXPECT_EQ(reader.Warning(), "");
     recorded.story = story.str();
     recorded.facts = reader.Facts();
+    recorded.milliseconds = reader.Milliseconds().value_or(0);
     return recorded;
 }
 
@@ -136,6 +138,9 @@ TEST(Record, EstimatesTheShareOfTheAllocations) {
     EXPECT_GT(share, 0.1);
     EXPECT_LT(share, 0.9);
     EXPECT_GE(allocate.numEvents, 2000000U);
+    const auto cpuSeconds = std::stod(allocate.facts.at("cpu_seconds"));
+    EXPECT_GT(static_cast<double>(allocate.milliseconds), 500 * cpuSeconds);
+    EXPECT_LT(allocate.milliseconds, 60'000U);
 }
 
 TEST(Record, PassesTheProgramOn) {

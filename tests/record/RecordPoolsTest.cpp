@@ -20,11 +20,11 @@ TEST(RecordPools, TellsWhatTheLibraryTellsAndMore) {
     // The last release but one that the library's trace tells was refused.
     const std::size_t refused = library.rfind("xmpt:f");
     ASSERT_NE(refused, std::string::npos);
-    EXPECT_EQ(Without(lines, "xmpt:[nxi]:.*\n"),
+    EXPECT_EQ(Without(lines, "xmpt:[nxit]:.*\n"),
               library.substr(0, refused) + library.substr(library.find('\n', refused) + 1));
 
     const std::string named =
-        Without(Without(lines, "xmpt:[acdf]:.*\n"), "(xmpt:[nx]:)[0-9a-f]{16}");
+        Without(Without(lines, "xmpt:[acdft]:.*\n"), "(xmpt:[nx]:)[0-9a-f]{16}");
     EXPECT_EQ(named.substr(0, named.find("xmpt:i:cpu")),
               "xmpt:i:program:" HOST
               "\nxmpt:i:by:pools\n"

@@ -37,6 +37,7 @@ bool Collector::Drain(bool atEnd) {
     const std::uint64_t first = channel.tail.load(std::memory_order_relaxed);
     const std::uint64_t last = std::min(channel.head.load(std::memory_order_acquire), first + most);
     std::uint64_t index = first;
+    if (first < last) { WriteTime(); }
     for (; index < last; ++index) {
         const Slot& slot = channel.slots[index % numSlots];
         const std::uint64_t what = slot.what.load(std::memory_order_acquire);
@@ -53,6 +54,17 @@ bool Collector::Drain(bool atEnd) {
         syscall(SYS_futex, &channel.tailFutex, FUTEX_WAKE, INT_MAX, nullptr, nullptr, 0);
     }
     return true;
+}
+
+// The channel is drained so often that its events have just happened.
+void Collector::WriteTime() {
+    using std::chrono::milliseconds;
+    constexpr milliseconds interval{10};
+    const auto now =
+        std::chrono::duration_cast<milliseconds>(std::chrono::steady_clock::now() - start);
+    if (now < nextTime) { return; }
+    nextTime = now + interval;
+    writer.Write({Trace::Kind::Time, 0, 0, static_cast<std::uint64_t>(now.count()), {}, {}});
 }
 
 void Collector::Write(std::uint64_t& index, std::uint64_t where, std::uint64_t what) {

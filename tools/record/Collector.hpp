@@ -4,6 +4,7 @@
 #define OBR_TOOLS_RECORD_COLLECTOR_HPP
 
 #include <array>
+#include <chrono>
 #include <cstdint>
 #include <string>
 #include <vector>
@@ -25,6 +26,7 @@ public:
     std::uint64_t NumEvents() const { return numEvents; }
 
 private:
+    void WriteTime();
     void Write(std::uint64_t& index, std::uint64_t where, std::uint64_t what);
     void WritePoolEvent(std::uint64_t& index, std::uint64_t pool, std::uint64_t what);
     const Slot& NextData(std::uint64_t& index) const;
@@ -36,6 +38,8 @@ private:
     Trace::CompactWriter& writer;
     Symbols symbols;
     std::vector<bool> knownPools;
+    const std::chrono::steady_clock::time_point start = std::chrono::steady_clock::now();
+    std::chrono::milliseconds nextTime{0};  // When the trace needs the time again.
     std::uint64_t lastThread = 0;
     std::uint64_t numEvents = 0;
 };
