@@ -23,13 +23,14 @@ TEST(TraceForm, HasNoControlCharacterInATextThatIsWritten) {
 
 TEST(TraceForm, HasNamesOfPoolsAndFactsAboutTheRecording) {
     Trace::StepReader reader(ReadLines(Lines("@i:program:jq:x\n@c:P\n@n:Q:no\n@n:P:caller\n") +
-                                       Lines("@a:P:X:1073741823\n")),
+                                       Lines("@a:P:X:1073741823\n@a:P:Y:36893488147419103232\n")),
                              "t");
     Trace::Step step = {};
     while (reader.Next(step)) {}
     EXPECT_EQ(reader.Facts().at("program"), "jq:x");
     EXPECT_EQ(reader.Blocks().Pools().at(0).name, "caller");
-    EXPECT_EQ(reader.Bad().Total(), 1U);
+    EXPECT_EQ(reader.Bad().Total(), 2U);
+    EXPECT_EQ(reader.Bad().first.back().fault, Trace::Fault::TooLarge) << "2^65 bytes.";
 }
 
 // Gives a thousand bytes at a time, and keeps the most room that the reader had for them.

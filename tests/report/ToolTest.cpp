@@ -83,10 +83,16 @@ TEST(Report, IsAPageUnlessAllIsAskedFor) {
         file << "xmpt:c" << pool << "\nxmpt:n" << pool << ':' << group << longName << "\nxmpt:a"
              << pool << ":0000000000000010:" << group << '\n';
     }
+    const std::string last = ":0000000000000149:0000000000000020:";
+    file << "xmpt:f:0000000000000100:0000000000000010:\nxmpt:f:0000000000000149:0000000000000010:\n"
+         << "xmpt:a" << last << "999600\nxmpt:f" << last << '\n';
     file.close();
     const std::string page = Tool("many");
     EXPECT_LE(std::count(page.begin(), page.end(), '\n'), 45);
     EXPECT_THAT(page, HasSubstr("GROUPS LARGEST AT THE PEAK (7 of 50)"));
+    EXPECT_THAT(page, HasSubstr("\n   1.00 MB  ")) << "999,600 bytes.";
+    EXPECT_THAT(page, HasSubstr("SIZES WITH MOST BLOCKS (6 of 51)"));
+    EXPECT_THAT(page, HasSubstr("\n   blocks  3.9 %  5.9 %  94.1 %\n"));
     EXPECT_THAT(page, HasSubstr("  149nnnnnnnnnnnnnn...nnnnnnnn-the-end\n"));
     const std::string all = Tool("--all many");
     EXPECT_THAT(all, HasSubstr("149" + longName + "\n"));

@@ -298,10 +298,10 @@ function pointer(box, at, lines) {
 // What is held. One pool for all is a line of its own if there are several pools.
 
 const series = [
-  {key: "asked", name: "Asked for, and in grey the range within each interval", title: "Asked for"},
-  {key: "heap_chunks", name: "Heap", title: "Heap"},
-  {key: "pools", name: tracedPools > 1 ? "Pools, one per group" : "Pools", title: tracedPools > 1 ? "Pools, one per group" : "Pools"},
-  {key: "one_pool", name: "One pool for all", title: "One pool for all"},
+  {key: "asked", name: "Asked for", note: ", and in grey the range within each interval"},
+  {key: "heap_chunks", name: "Heap", note: ""},
+  {key: "pools", name: tracedPools > 1 ? "Pools, one per group" : "Pools", note: ""},
+  {key: "one_pool", name: "One pool for all", note: ""},
 ].filter((line) => line.key !== "one_pool" || tracedPools > 1);
 
 function timeline() {
@@ -336,14 +336,15 @@ function timeline() {
     "text-anchor": side < 0 ? "end" : "start"}).text("peak: asked for " + bytes(data.peak.asked));
 
   pointer(box, places, (i) => [`Event ${count(lines.event[i])}`].concat(series.map((line) =>
-    `${line.title}: ${bytes(lines[line.key][i])}`), `Blocks: ${count(lines.blocks[i])}`));
+    `${line.name}: ${bytes(lines[line.key][i])}`), `Blocks: ${count(lines.blocks[i])}`));
 
-  legend("timeline-legend", series, (svg, line) => {
+  legend("timeline-legend", series.map((line) => ({key: line.key, name: line.name + line.note})), (svg, line) => {
     if (line.key === "asked") {
       svg.append("rect").attr({class: "asked-area", y: 1, width: 22, height: 11});
       svg.append("rect").attr({class: "asked-band", y: 1, width: 22, height: 5});
     }
-    svg.append("line").attr({class: "line " + line.key, x1: 1, x2: 21, y1: line.key === "asked" ? 1 : 6, y2: line.key === "asked" ? 1 : 6});
+    const y = line.key === "asked" ? 1 : 6;
+    svg.append("line").attr({class: "line " + line.key, x1: 1, x2: 21, y1: y, y2: y});
   });
 }
 
