@@ -3,11 +3,12 @@
 # the shared library need no other library, not even a host layer, which it links privately. Users of the
 # static library link a host layer themselves.
 #
-# Each install rule of the project names a component, and Packages.cmake makes a package of each:
+# Each install rule of the project names a component. Packages.cmake makes a package of each but `doc`:
 #
 #   runtime   the shared library, and the commands that gdb loads with it
 #   dev       headers, static library, files for CMake and pkg-config, the library's manual
 #   tools     programs, the libraries that they load, and their manual
+#   doc       the pages of documentation, which StagePackages.cmake adds to the packages of dev and tools
 
 include(CMakePackageConfigHelpers)
 
@@ -49,3 +50,10 @@ foreach(package ObrMemPool ObrMemPoolC)
     install(FILES ${CMAKE_CURRENT_BINARY_DIR}/${package}.pc
         DESTINATION ${pkgConfigDir} COMPONENT dev)
 endforeach()
+
+if(PROJECT_IS_TOP_LEVEL)
+    install(FILES README.md CHANGELOG.md DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT doc)
+    install(DIRECTORY docs DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT doc FILES_MATCHING
+        PATTERN *.md PATTERN *.svg PATTERN *.png
+        PATTERN man EXCLUDE PATTERN reference.md EXCLUDE)
+endif()
