@@ -10,6 +10,7 @@
 #include <cstdio>
 #include <iostream>
 #include <memory_resource>
+#include <set>
 #include <string>
 #include <string_view>
 #include <unordered_map>
@@ -21,7 +22,7 @@ namespace {
 
 using OBR::MemPool::Heap;
 using OBR::MemPool::HeapSettings;
-using Lines = std::pmr::vector<std::uint32_t>;
+using Lines = std::pmr::set<std::uint32_t>;
 using Index = std::pmr::unordered_map<std::pmr::string, Lines>;
 
 void Fill(Index& index) {
@@ -29,7 +30,8 @@ void Fill(Index& index) {
     for (std::uint32_t number = 1; std::getline(std::cin, line); ++number) {
         for (std::string_view rest(line); !rest.empty();) {
             const std::size_t end = std::min(rest.find(' '), rest.size());
-            index[std::pmr::string(rest.substr(0, end), index.get_allocator())].push_back(number);
+            Lines& lines = index[std::pmr::string(rest.substr(0, end), index.get_allocator())];
+            lines.emplace_hint(lines.end(), number);
             rest.remove_prefix(std::min(end + 1, rest.size()));
         }
     }
@@ -45,7 +47,7 @@ void Print(const Index& index) {
     std::printf("%zu words\n", words.size());
     for (std::size_t i = 0; i < std::min<std::size_t>(words.size(), 10); ++i) {
         std::printf("%s %zu %u\n", words[i]->first.c_str(), words[i]->second.size(),
-                    words[i]->second.back());
+                    *words[i]->second.rbegin());
     }
 }
 
