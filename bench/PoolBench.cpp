@@ -2,23 +2,28 @@
 //
 //     PoolBench --subject=NAME [Google Benchmark's options]
 //
-// pool, pool-keep (which keeps empty buckets) and pool-64k (buckets of 65535 bytes) call the shared
-// library as a host does. heap calls malloc and free or, with LD_PRELOAD, the allocator that
-// replaces them, so that every malloc is measured through the same two calls into a shared library.
-// boost, for blocks of one size, and pmr are headers.
+// pool, pool-keep (which keeps empty buckets) and pool-64k (buckets of 65535 bytes) are bare Mgrs,
+// layer is a Heap with such buckets. heap calls malloc and free or, with LD_PRELOAD, the allocator
+// that replaces them, so that every malloc is measured through the same two calls into a shared
+// library. boost, for blocks of one size, and pmr, the standard's pool for one thread, are headers.
 //
 // Each row is a function over a subject. Sizes, orders and traces are made before the clock runs.
 // The first byte of every block is written. The time is that of one operation: an Alloc, a Free, an
-// event of a trace, or a block that is built and dropped.
+// event of a trace, or a block that is built and dropped. The rows "live N" and "drop N" show how
+// cost grows with work.
 
-#include <MemPool>
+#include <MemPoolHeap>
 
 #include <malloc.h>
 
 #include <algorithm>
+#include <chrono>
 #include <cstdint>
 #include <cstdlib>
 #include <functional>
+#include <iostream>
+#include <list>
+#include <map>
 #include <memory>
 #include <memory_resource>
 #include <numeric>
@@ -34,29 +39,59 @@
 #define HAS_BOOST
 #endif
 
-#include "RunSubject.hpp"
 #include "trace/OpenTrace.hpp"
 #include "trace/Resolver.hpp"
 
 namespace {
 
+using OBR::MemPool::HeapSettings;
+using OBR::MemPool::Mgr;
+
 using Blocks = std::vector<void*>;
 
-// The subjects. Free is given the size, which some need.
+// The subjects. Free is given the size, which some need. Containers use `memory`.
+
+// Its blocks are aligned to 4 bytes only, which is enough on x86-64.
+class MgrMemory : public std::pmr::memory_resource {
+public:
+    explicit MgrMemory(Mgr& ofMgr) : mgr(ofMgr) {}
+
+private:
+    void* do_allocate(std::size_t size, std::size_t) override {
+        return mgr.Alloc(static_cast<unsigned>(size));
+    }
+    void do_deallocate(void* block, std::size_t, std::size_t) override { mgr.Free(block); }
+    bool do_is_equal(const memory_resource& other) const noexcept override {
+        return this == &other;
+    }
+
+    Mgr& mgr;
+};
 
 struct Pool {
-    OBR::MemPool::Mgr mgr;
+    Mgr mgr;
+    MgrMemory memory{mgr};
     void* Alloc(unsigned size) { return mgr.Alloc(size); }
     void Free(void* block, unsigned) { mgr.Free(block); }
     void DropAll(const Blocks&) { mgr.Clear(); }
     unsigned GetSize(void* block) { return mgr.GetSize(block); }
 };
 
+struct Layer {
+    OBR::MemPool::Heap heap{nullptr, HeapSettings().On(true).BucketSize(65535)};
+    OBR::MemPool::Resource memory{heap};
+    void* Alloc(unsigned size) { return heap.Allocate(size); }
+    void Free(void* block, unsigned size) { heap.Deallocate(block, size); }
+    void DropAll(const Blocks&) { heap.FreeAll(); }
+    std::size_t GetSize(void* block) { return heap.UsableSize(block); }
+};
+
 struct Heap {
+    std::pmr::memory_resource& memory = *std::pmr::new_delete_resource();
     void* Alloc(unsigned size) { return std::malloc(size); }
     void Free(void* block, unsigned) { std::free(block); }
     void DropAll(const Blocks& blocks) { std::for_each(blocks.begin(), blocks.end(), std::free); }
-    unsigned GetSize(void* block) { return static_cast<unsigned>(malloc_usable_size(block)); }
+    std::size_t GetSize(void* block) { return malloc_usable_size(block); }
 };
 
 #ifdef HAS_BOOST
@@ -69,10 +104,10 @@ struct Boost {
 #endif
 
 struct Pmr {
-    std::pmr::unsynchronized_pool_resource pool;
-    void* Alloc(unsigned size) { return pool.allocate(size, 8); }
-    void Free(void* block, unsigned size) { pool.deallocate(block, size, 8); }
-    void DropAll(const Blocks&) { pool.release(); }
+    std::pmr::unsynchronized_pool_resource memory;
+    void* Alloc(unsigned size) { return memory.allocate(size, 8); }
+    void Free(void* block, unsigned size) { memory.deallocate(block, size, 8); }
+    void DropAll(const Blocks&) { memory.release(); }
 };
 
 template <typename Subject>
@@ -262,12 +297,96 @@ void ManyPools(benchmark::State& state) {
     SetOperations(state, names.size());
 }
 
+// A tree as a compiler builds it, and drops it whole.
+struct TreeNode {
+    TreeNode* left;
+    TreeNode* right;
+    double value;
+    std::uint64_t line;
+};
+
+template <typename Subject>
+TreeNode* BuildTree(Subject& subject, int depth) {
+    auto* const node = ::new (subject.Alloc(sizeof(TreeNode))) TreeNode{};
+    node->value = depth;
+    if (depth > 0) {
+        node->left = BuildTree(subject, depth - 1);
+        node->right = BuildTree(subject, depth - 1);
+    }
+    return node;
+}
+
+// Without a pool a host drops a tree node by node.
+template <typename Subject>
+void DropTree(Subject& subject, TreeNode*) {
+    subject.DropAll({});
+}
+void DropTree(Heap& subject, TreeNode* node) {
+    if (node == nullptr) { return; }
+    DropTree(subject, node->left);
+    DropTree(subject, node->right);
+    subject.Free(node, sizeof(TreeNode));
+}
+
+template <typename Subject>
+void Tree(benchmark::State& state) {
+    constexpr int depth = 17;
+    Subject subject;
+    for (auto _ : state) { DropTree(subject, BuildTree(subject, depth)); }
+    SetOperations(state, (std::size_t{2} << depth) - 1);
+}
+
+template <typename Subject>
+void List(benchmark::State& state) {
+    constexpr int number = 100000;
+    Subject subject;
+    for (auto _ : state) {
+        std::pmr::list<int> list(&subject.memory);
+        for (int i = 0; i < number; ++i) { list.push_back(i); }
+        benchmark::DoNotOptimize(list.front());
+    }
+    SetOperations(state, number);
+}
+
+template <typename Subject>
+void Map(benchmark::State& state) {
+    constexpr std::uint32_t range = 20000;
+    Subject subject;
+    std::pmr::map<std::uint32_t, int> map(&subject.memory);
+    std::mt19937 random(1);
+    std::vector<std::uint32_t> keys(1 << 20);
+    for (std::uint32_t& key : keys) { key = static_cast<std::uint32_t>(random() % range); }
+    std::size_t turn = 0;
+    for (auto _ : state) {
+        const std::uint32_t key = keys[turn++ % keys.size()];
+        if (map.erase(key) == 0) { map.emplace(key, 1); }
+    }
+    SetOperations(state, 1);
+}
+
+template <typename Subject>
+void Drop(benchmark::State& state, std::size_t number) {
+    Subject subject;
+    std::vector<void*> blocks(number);
+    for (auto _ : state) {
+        for (void*& block : blocks) {
+            block = subject.Alloc(32);
+            *static_cast<char*>(block) = 1;
+        }
+        const auto begin = std::chrono::steady_clock::now();
+        subject.DropAll(blocks);
+        const std::chrono::duration<double> time = std::chrono::steady_clock::now() - begin;
+        state.SetIterationTime(time.count());
+    }
+    SetOperations(state, number);
+}
+
 // The rows, in the order of the tables.
 
 using Row = std::function<void(benchmark::State&)>;
 
-void Register(const char* name, const Row& row, std::int64_t iterations = 0) {
-    auto* const bench = benchmark::RegisterBenchmark(name, row);
+void Register(const std::string& name, const Row& row, std::int64_t iterations = 0) {
+    auto* const bench = benchmark::RegisterBenchmark(name.c_str(), row);
     if (iterations != 0) { bench->Iterations(iterations); }
 }
 
@@ -312,6 +431,22 @@ void RegisterSizeRows() {
     Register("size of each of 200k, random order", [](auto& s) { AskSizes<Subject>(s, numBuilt); });
 }
 
+template <typename Subject>
+void RegisterContainerRows() {
+    Register("tree of 262k nodes, dropped whole", Tree<Subject>);
+    Register("list of 100k, built and cleared", List<Subject>);
+    Register("map, 10k live, insert or erase", Map<Subject>);
+    for (std::size_t number : {1000U, 10000U, 100000U, 1000000U, 10000000U, 30000000U}) {
+        const std::string name = std::to_string(number);
+        Register(
+            "live " + name, [=](auto& s) { Churn<Subject>(s, number, {32}); }, 1000000);
+        benchmark::RegisterBenchmark(("drop " + name).c_str(),
+                                     [=](auto& s) { Drop<Subject>(s, number); })
+            ->UseManualTime()
+            ->Iterations(number < 1000000 ? 20 : 2);
+    }
+}
+
 bool RegisterRows(const std::string& subject) {
     if (subject == "pool" || subject == "pool-keep" || subject == "pool-64k") {
         OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);
@@ -322,10 +457,17 @@ bool RegisterRows(const std::string& subject) {
         RegisterSizeRows<Pool>();
         Register("Contains", AskContains);
         Register("100k pools: make, find, destroy", ManyPools);
+        if (subject == "pool-64k") { RegisterContainerRows<Pool>(); }
+    } else if (subject == "layer") {
+        RegisterOneSizeRows<Layer>();
+        RegisterMixedRows<Layer>();
+        RegisterSizeRows<Layer>();
+        RegisterContainerRows<Layer>();
     } else if (subject == "heap") {
         RegisterOneSizeRows<Heap>();
         RegisterMixedRows<Heap>();
         RegisterSizeRows<Heap>();
+        RegisterContainerRows<Heap>();
 #ifdef HAS_BOOST
     } else if (subject == "boost") {
         RegisterOneSizeRows<Boost>();
@@ -333,15 +475,42 @@ bool RegisterRows(const std::string& subject) {
     } else if (subject == "pmr") {
         RegisterOneSizeRows<Pmr>();
         RegisterMixedRows<Pmr>();
+        RegisterContainerRows<Pmr>();
     } else {
         return false;
     }
     return true;
 }
 
+// Makes the heap as long as that of a host with other data, and keeps a block at its end. Otherwise
+// the C library returns the memory that a round has freed to the system and asks for it again in
+// the next, and a row would measure that.
+void LengthenHeap() {
+    constexpr std::size_t size = 65536;
+    std::vector<void*> blocks(3000);
+    for (void*& block : blocks) { block = std::malloc(size); }
+    static void* const end = std::malloc(size);
+    benchmark::DoNotOptimize(end);
+    std::for_each(blocks.begin(), blocks.end(), std::free);
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
-    return RunSubject(argc, argv, "PoolBench --subject=pool|pool-keep|pool-64k|heap|boost|pmr",
-                      RegisterRows);
+    const std::string option = "--subject=";
+    const std::string first = argc > 1 ? argv[1] : "";
+    if (first.compare(0, option.size(), option) != 0 ||
+        !RegisterRows(first.substr(option.size()))) {
+        std::cerr << "usage: PoolBench --subject=pool|pool-keep|pool-64k|layer|heap|boost|pmr"
+                     " [benchmark options]\n";
+        return 2;
+    }
+    argv[1] = argv[0];
+    --argc;
+    ++argv;
+    benchmark::Initialize(&argc, argv);
+    if (benchmark::ReportUnrecognizedArguments(argc, argv)) { return 2; }
+    LengthenHeap();
+    benchmark::RunSpecifiedBenchmarks();
+    return 0;
 }

@@ -9,7 +9,7 @@ set xtics ("1k" 1e3, "10k" 1e4, "100k" 1e5, "1M" 1e6, "10M" 1e7, "30M" 3e7)
 set format y "%g"
 set key top left Left reverse
 set multiplot layout 1,2
-subjects = "pool glibc mimalloc jemalloc std::pmr"
+subjects = "pool-64k glibc mimalloc jemalloc std::pmr"
 colours = "#c02020 #303030 #2060c0 #209040 #b08000"
 mark(i) = int(word("7 5 9 13 11", i))
 set title "Nanoseconds per operation, by live blocks of 32 bytes"

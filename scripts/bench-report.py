@@ -21,7 +21,7 @@ PEERS = MALLOCS + ["boost", "pmr"]
 TRACES = ["trace lua", "trace jq", "trace sqlite"]
 TREE_ROW = "tree of 262k nodes, dropped whole"
 NODE_ROWS = ["list of 100k, built and cleared", "map, 10k live, insert or erase"]
-IN_GROWTH = ["raw", "glibc", "mimalloc", "jemalloc", "pmr"]
+IN_GROWTH = ["pool-64k", "glibc", "mimalloc", "jemalloc", "pmr"]
 IN_PICTURE = ["mimalloc", "jemalloc", "tcmalloc", "pmr"]
 MEMORIES = {"malloc": "malloc", "mimalloc": "mimalloc", "Heap": "`Heap`",
             "FreeAll": "`Heap`, `FreeAll`", "mi_heap": "`mi_heap_destroy`",
@@ -129,7 +129,7 @@ class Hosts:
                 data.write("\n\n")
 
 
-def goals(measured, rows, resident, layer, hosts):
+def goals(measured, rows, resident, hosts):
     """(what, goal, measured): ratios that are to stay at or below their goals."""
     one_size = "200k x 32, free in "
     beside_pmr = [row for row in rows if measured.ratio(row, "pmr") and row != "pair, no other block"]
@@ -164,9 +164,9 @@ def goals(measured, rows, resident, layer, hosts):
         ("Lua, trees / malloc", 0.6, hosts.tuned_ratio("trees")),
         ("Lua, strings / malloc", 0.8, hosts.tuned_ratio("strings")),
         ("SQLite / malloc", 1.0, hosts.tuned_ratio("Sqlite")),
-        ("tree of nodes, dropped whole / glibc", 0.45, layer.ratio(TREE_ROW, "glibc", "layer")),
-        ("worst node container on Resource / pmr", 0.9, layer.worst(NODE_ROWS, "pmr", "layer")),
-        ("the same / bare Mgr", 1.1, layer.worst(NODE_ROWS, "raw", "layer")),
+        ("tree of nodes, dropped whole / glibc", 0.45, measured.ratio(TREE_ROW, "glibc", "layer")),
+        ("worst node container on Resource / pmr", 0.9, measured.worst(NODE_ROWS, "pmr", "layer")),
+        ("the same / bare Mgr", 1.1, measured.worst(NODE_ROWS, "pool-64k", "layer")),
         ("hosts on a Heap, time / mimalloc", 1.0,
          hosts.seconds.mean(hosts.plain, "mimalloc", "Heap")),
         ("hosts on a Heap, peak memory / malloc", 0.95,
@@ -180,13 +180,13 @@ def goals(measured, rows, resident, layer, hosts):
     ]
 
 
-def write_growth(path, layer, rows):
+def write_growth(path, measured, rows):
     """A block for each subject: blocks, ns per operation, ms to drop them."""
     numbers = [int(row.split()[1]) for row in rows if row.startswith("live ")]
     with path.open("w") as data:
         for subject in IN_GROWTH:
             for blocks in numbers:
-                live, drop = (layer.median(f"{what} {blocks}", subject) for what in ("live", "drop"))
+                live, drop = (measured.median(f"{what} {blocks}", subject) for what in ("live", "drop"))
                 if live is not None and drop is not None:
                     data.write(f"{blocks} {live} {drop * blocks / 1e6}\n")
             data.write("\n\n")
@@ -259,16 +259,15 @@ def hosts_section(hosts):
 def main():
     path, output = map(pathlib.Path, sys.argv[1:])
     results = json.loads(path.read_text())
-    measured, layer = Measured(results["rows"]), Measured(results["layer"])
-    hosts = Hosts(results["hosts"])
+    measured, hosts = Measured(results["rows"]), Hosts(results["hosts"])
     figures = {subject: {int(size): both for size, both in sizes.items()}
                for subject, sizes in results["resident"].items()}
     resident = {subject: {size: both[0] for size, both in sizes.items()}
                 for subject, sizes in figures.items()}
     held = {size: both[1] for size, both in figures["pool"].items()}
-    rows, layer_rows = list(results["rows"]["pool"]), list(results["layer"]["raw"])
+    rows = list(results["rows"]["pool-64k"])
     peers = [peer for peer in PEERS if peer in measured.times]
-    timed = [row for row in rows if any(row in measured.times[peer] for peer in peers)]
+    timed = [row for row in rows if measured.ratio(row, "glibc") or measured.ratio(row, "pmr")]
     compared = [peer for peer in ("glibc", "mimalloc", "pmr") if peer in peers]
 
     text = ["# Performance", "",
@@ -277,14 +276,16 @@ def main():
     text += ["## Single operations", "",
              "![Time per operation compared with glibc](performance.svg)", "",
              "pool is a bare `Mgr` with the default settings. pool-keep also keeps empty buckets, and",
-             "pool-64k has buckets of 65535 bytes. All subjects are called through the dynamic linker,",
-             "except boost and pmr, which are partly headers. boost serves only one size.", "",
+             "pool-64k has buckets of 65535 bytes, as layer has, which is a `Heap`. All subjects are called",
+             "through the dynamic linker, except boost and pmr, which are partly headers. boost serves only",
+             "one size.", "",
              "Each row runs in a process of its own. Its heap is first made long and kept so by a block at",
              "its end, as the other data of a program would. Otherwise the C library returns the memory",
              "of each round to the system, and the rows measure that. The subjects take turns row by row.",
              "", "Nanoseconds per operation, medians:", ""]
-    text += table(["work"] + POOLS + peers,
-                  ([row] + [number(measured.median(row, subject), 1) for subject in POOLS + peers]
+    subjects = POOLS + ["layer"] + peers
+    text += table(["work"] + subjects,
+                  ([row] + [number(measured.median(row, subject), 2) for subject in subjects]
                    for row in rows))
     text += ["Ratios, medians of those within a round; below 1 the pool is faster:", ""]
     text += table(["work"] + [f"pool / {peer}" for peer in compared] +
@@ -297,22 +298,15 @@ def main():
         text.append(f"Geometric mean of all rows compared with {peer}: "
                     f"{number(measured.mean(both, peer))} at the default settings, "
                     f"{number(measured.mean(both, peer, 'best'))} with the best.")
-    text += ["", "## The layer", "",
-             "layer is a `Heap` of `MemPoolHeap`, raw a bare `Mgr` with the same settings.",
-             "Nanoseconds per operation:", ""]
-    subjects = [subject for subject in ["layer", "raw"] + PEERS if subject in layer.times]
-    text += table(["work"] + subjects,
-                  ([row] + [number(layer.median(row, subject)) for subject in subjects]
-                   for row in layer_rows))
-    text += ["![Cost with growing work](growth.svg)", "", "## Resident bytes per live block", ""]
+    text += ["", "![Cost with growing work](growth.svg)", "", "## Resident bytes per live block", ""]
     text += resident_tables(resident, held)
     text += ["## Goals", ""]
     text += table(["ratio", "goal", "measured", ""],
                   ([what, number(goal), number(ratio),
                     "" if ratio is None else "met" if ratio <= goal else "missed"]
-                   for what, goal, ratio in goals(measured, rows, resident, layer, hosts)))
+                   for what, goal, ratio in goals(measured, rows, resident, hosts)))
     output.write_text("\n".join(text).rstrip() + "\n")
-    write_growth(path.parent / "growth.dat", layer, layer_rows)
+    write_growth(path.parent / "growth.dat", measured, rows)
     write_ratios(path.parent / "ratios.dat", measured, timed)
     hosts.write_picture(path.parent / "hosts.dat")
 

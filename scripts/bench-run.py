@@ -4,8 +4,7 @@
 Every subject does a piece of work right after the others, each in a process of its own, so that
 what the machine does meanwhile meets all of them. The parts, all of them by default:
 
-  rows      PoolBench: nanoseconds per operation
-  layer     LayerBench: the same for what hosts build on the pools
+  rows      nanoseconds per operation
   resident  bytes of memory per live block
   hosts     whole programs: processor time and peak memory; all must print the same
 
@@ -22,7 +21,7 @@ import sys
 import tempfile
 
 SOURCES = pathlib.Path(__file__).parent.parent
-POOLS = ["pool", "pool-keep", "pool-64k"]
+POOLS = ["pool", "pool-keep", "pool-64k", "layer"]
 PRELOADED = {"mimalloc": "libmimalloc.so", "jemalloc": "libjemalloc.so",
              "tcmalloc": "libtcmalloc_minimal.so"}
 SIZES = [8, 16, 20, 32, 40, 64, 100, 128, 200, 256, 400, 512, 700, 900]
@@ -70,46 +69,40 @@ class Runner:
         return subprocess.run(command, env={**os.environ, "LD_PRELOAD": preload}, check=True,
                               stdout=subprocess.PIPE, text=True, **options).stdout
 
-    def rows_of(self, program, subject):
+    def rows_of(self, subject):
         """The rows that a subject has; none if it could not be built."""
-        listed = subprocess.run([program, f"--subject={subject}", "--benchmark_list_tests"],
-                                capture_output=True, text=True, check=False)
+        listed = subprocess.run(
+            [self.build / "bench" / "PoolBench", f"--subject={subject}", "--benchmark_list_tests"],
+            capture_output=True, text=True, check=False)
         return listed.stdout.splitlines() if listed.returncode == 0 else []
 
-    def measure_rows(self, program, subjects, rows_of_one_round=()):
+    def rows(self):
         """Nanoseconds per operation by round, as times[subject][row], in the order of the rows."""
-        program = self.build / "bench" / program
-        names = {subject: "heap" if subject in self.preloads else subject for subject in subjects}
-        rows = {subject: self.rows_of(program, names[subject]) for subject in subjects}
-        times = {subject: {} for subject in subjects if rows[subject]}
-        for subject in subjects:
-            if not rows[subject]:
-                print(f"{subject} is left out: PoolBench was built without it.")
+        names = {subject: "heap" if subject in self.preloads else subject
+                 for subject in POOLS + list(self.preloads) + ["boost", "pmr"]}
+        rows = {subject: self.rows_of(name) for subject, name in names.items()}
+        times = {subject: {} for subject in names if rows[subject]}
+        for subject in set(names) - set(times):
+            print(f"{subject} is left out: PoolBench was built without it.")
         for turn in range(self.rounds):
-            step(f"{program.name}, round {turn + 1} of {self.rounds}")
+            step(f"Rows, round {turn + 1} of {self.rounds}")
             order = list(times)[turn:] + list(times)[:turn]  # Each round begins with another.
-            for row in rows[subjects[0]]:
-                kind = row.split()[0]
-                if kind in rows_of_one_round and (turn > 0 or self.quick and "0000000/" in row):
+            for row in rows["pool-64k"]:
+                # How cost grows is one long look.
+                if re.match("live|drop", row) and (turn > 0 or self.quick and "0000000/" in row):
                     continue
                 for subject in order:
-                    if row not in rows[subject]:
-                        continue
-                    output = self.run(
-                        [program, f"--subject={names[subject]}", "--benchmark_format=json",
-                         f"--benchmark_filter=^{row}$", f"--benchmark_min_time={self.seconds}"],
-                        self.preloads.get(subject, ""), stderr=subprocess.DEVNULL)
-                    speed = json.loads(output)["benchmarks"][0]["items_per_second"]
-                    times[subject].setdefault(row.split("/")[0], []).append(1e9 / speed)
+                    if row in rows[subject]:
+                        times[subject].setdefault(row.split("/")[0], []).append(
+                            self.measure_row(row, names[subject], self.preloads.get(subject, "")))
         return times
 
-    def rows(self):
-        return self.measure_rows("PoolBench", POOLS + list(self.preloads) + ["boost", "pmr"])
-
-    def layer(self):
-        # How cost grows is one long look.
-        return self.measure_rows("LayerBench", ["layer", "raw"] + list(self.preloads) + ["pmr"],
-                                 ("live", "drop"))
+    def measure_row(self, row, name, preload):
+        output = self.run(
+            [self.build / "bench" / "PoolBench", f"--subject={name}", "--benchmark_format=json",
+             f"--benchmark_filter=^{row}$", f"--benchmark_min_time={self.seconds}"],
+            preload, stderr=subprocess.DEVNULL)
+        return 1e9 / json.loads(output)["benchmarks"][0]["items_per_second"]
 
     def resident(self):
         """Resident bytes per block and, for the pool, bytes that it holds."""
@@ -133,7 +126,7 @@ class Runner:
             works = [work for work in HOSTS + ([] if self.smoke else TUNED_HOSTS)
                      if self.program(work.split()[0])]
             outputs = {}
-            for turn in range(2 * self.rounds if not self.smoke else 1):
+            for turn in range(2 * self.rounds - 1):
                 step(f"Hosts, round {turn + 1}")
                 for work in works:
                     for memory in MEMORIES:
@@ -184,7 +177,7 @@ def main():
                                      formatter_class=argparse.RawDescriptionHelpFormatter)
     parser.add_argument("build", type=pathlib.Path, help="the folder of the build")
     parser.add_argument("output", type=pathlib.Path)
-    parser.add_argument("parts", nargs="*", default=["rows", "layer", "resident", "hosts"])
+    parser.add_argument("parts", nargs="*", default=["rows", "resident", "hosts"])
     parser.add_argument("--quick", action="store_true", help="fewer and shorter rounds")
     parser.add_argument("--smoke", action="store_true", help="small inputs, to see that all run")
     options = parser.parse_args()
