@@ -158,7 +158,7 @@ __attribute__((destructor)) void Report() {
     limit = 0;
     std::ofstream file(name, std::ios::app);
     std::streambuf* const output = std::cout.rdbuf(file.rdbuf());
-    heap->GetMgr().Dbg();
+    heap->Report();
     std::cout.rdbuf(output);
     if (!file.flush()) { std::fprintf(stderr, "MallocOnPools: cannot write %s\n", name); }
     limit = usualLimit;

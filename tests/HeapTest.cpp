@@ -91,6 +91,8 @@ TEST_F(HeapTest, KnowsTheMemoryOfAPool) {
     EXPECT_EQ(ReadAt<std::uint32_t>(&pool, format::poolNumGroups), pool.numGroups);
     EXPECT_EQ(ReadAt<std::uint32_t>(&pool, format::poolRounding), pool.dataAlignment);
     EXPECT_EQ(ReadAt<std::uint32_t>(&pool, format::poolMaxRecord), pool.maxRecordSize);
+    EXPECT_EQ(ReadAt<std::uint32_t>(&pool, format::poolMinRecord), pool.minRecordSize);
+    EXPECT_EQ(ReadAt<bool>(&pool, format::poolKeepsEmpty), pool.keepEmptyBuckets);
     EXPECT_EQ(ReadAt<void*>(&pool, format::poolExtRecs), pool.extRecs);
     static_assert(format::groupHead == offsetof(Group, head) &&
                   format::bucketNext == offsetof(Bucket, next1) &&
@@ -102,6 +104,37 @@ TEST_F(HeapTest, KnowsTheMemoryOfAPool) {
                   format::sizeOfBucketHead == Bucket::baseDistance &&
                   format::sizeOfExtRec == sizeof(ExtRec) &&
                   format::sizeOfRecHdr == sizeof(RecHdr) && format::firstRecord == firstOffset);
+}
+
+// Blocks of both pools, in any order of their alignments, go back to the pool that they are from.
+TEST_F(HeapTest, GoesOnInLargeBucketsWhereAClassIsLarge) {
+    Heap heap("grows");
+    const Heap small("small", HeapSettings().BucketSize(4010));
+    const std::size_t bytesIfNew = HeapSpy::arrayBytes;
+    std::vector<std::pair<char*, std::size_t>> blocks;
+    std::mt19937 random(3);
+    for (std::size_t n = 0; n < 40000; ++n) {
+        const std::size_t size = n % 5 == 0 ? 600 + random() % 800 : 33 + n % 3;
+        const std::size_t alignment = std::size_t{1} << random() % 7;
+        blocks.emplace_back(static_cast<char*>(heap.Allocate(size, alignment)), size);
+        std::memset(blocks.back().first, static_cast<int>(n), size);
+        if (n % 3 == 0) {
+            std::swap(blocks.back(), blocks[random() % blocks.size()]);
+            ASSERT_GE(heap.UsableSize(blocks.back().first), blocks.back().second);
+            ASSERT_TRUE(heap.Free(blocks.back().first));
+            blocks.pop_back();
+        }
+    }
+    const Mgr* const large = GetMgr("grows, large buckets");
+    ASSERT_NE(large, nullptr);
+    EXPECT_GT(large->GetBucketMgr()->GetNumBuckets(), 10);
+    CheckInvariants(*large->GetBucketMgr());
+    CheckInvariants(*heap.GetMgr().GetBucketMgr());
+    EXPECT_EQ(NumBlocks(heap), blocks.size());
+    EXPECT_EQ(heap.GetStats().bytesHeld, HeapSpy::arrayBytes - bytesIfNew - 249 * sizeof(Group*));
+    for (const auto& [block, size] : blocks) { ASSERT_TRUE(heap.Free(block)); }
+    EXPECT_EQ(heap.GetStats().bytesHeld, 0);
+    EXPECT_EQ(GetNumMgrs(), 3);
 }
 
 TEST_F(HeapTest, RefusesWhatIsTooMuch) {

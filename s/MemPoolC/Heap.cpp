@@ -86,7 +86,7 @@ std::string ReportOf(const Heap& heap) {
     std::streambuf* const output = std::cout.rdbuf(report.rdbuf());
     std::exception_ptr failure;
     try {
-        heap.GetMgr().Dbg();
+        heap.Report();
     } catch (...) { failure = std::current_exception(); }
     const bool isWhole = std::cout.good();
     std::cout.rdbuf(output);

@@ -79,6 +79,7 @@ void World::Build(HeapPlace& place) {
     say(3, &HeapSettings::DataAlignment, sizes.alignment);
     const bool isOn = (said & 16) != 0 || NUV_OBR_MEMPOOL_ON();
     settings.On(isOn);
+    if ((said & 1) == 0) { settings.BucketSize(sizes.bucket); }  // There is one pool then.
     if ((said & 32) != 0) { settings.KeepEmptyBuckets((said & 64) != 0); }
     place.alignment = (said & 128) != 0 ? std::size_t{1} << bytes.Below(14) : 8;
     settings.Alignment(place.alignment);
