@@ -198,12 +198,13 @@ function verdict() {
       : (100 * Math.abs(ratio)).toFixed(0) + (ratio < 0 ? " % less than" : " % more than");
   };
   const heap = `the heap’s ${bytes(peak.heap_chunks)}`;
-  byId("verdict").text(data.blocks === 0 ? "The trace has no block." :
+  const text = data.blocks === 0 ? "The trace has no block." :
     `At the peak the program has asked for ${bytes(peak.asked)} in ${count(peak.blocks)} blocks${holders()}. ` +
     (tracedPools > 1
       ? `A pool for each group would hold ${bytes(peak.pools)} for them, ${beside(peak.pools)} ${heap}; ` +
         `a single pool for all ${bytes(peak.one_pool)}, ${beside(peak.one_pool)} the heap.`
-      : `Pools would hold ${bytes(peak.pools)} for them, ${beside(peak.pools)} ${heap}.`));
+      : `Pools would hold ${bytes(peak.pools)} for them, ${beside(peak.pools)} ${heap}.`);
+  byId("verdict").text(text.replace(/(\d) /g, "$1\u00a0"));  // A number keeps its unit.
 
   const tile = (name, path, show, note) => {
     const place = byId("tiles").append("div");
