@@ -220,6 +220,10 @@ TEST(Analysis, AgreesWithPlainFigures) {
         }
         EXPECT_GE(analysis.groups[0].tally.atPeak.bytes, analysis.groups[1].tally.atPeak.bytes);
     }
+    Report::Sizes ranges;
+    const Report::SizeRow* const next = &ranges.Row(1153);
+    EXPECT_EQ(&ranges.Row(1152), &ranges.Row(1025)) << "Up to an eighth more than 1024.";
+    EXPECT_NE(&ranges.Row(1152), next);
     const Report::Analysis equal = Analyse(Lines("@c:P\n@a:P:X:8\n@f:P:X:\n@a:P:X:8\n"));
     EXPECT_EQ(equal.peak.event, 2U) << "The first of two equal peaks.";
 }
