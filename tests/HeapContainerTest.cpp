@@ -114,11 +114,16 @@ TEST(HeapPointerTest, SharesAndNests) {
         const auto other =
             std::allocate_shared<Wide>(std::pmr::polymorphic_allocator<Wide>(&first.resource), 1);
         EXPECT_TRUE(*wide == *other);
+        EXPECT_TRUE(*New<Wide>(second.heap, 1) == *wide);
+        struct Throws {
+            Throws() { throw 1; }
+        };
+        EXPECT_ANY_THROW(New<Throws>(second.heap));
         Node tree(first.heap);
         tree.children.emplace_back(first.heap);
         EXPECT_EQ(first.NumBlocks(), 3);
     }
-    EXPECT_EQ(first.NumBlocks(), 0);
+    EXPECT_EQ(first.NumBlocks() + second.NumBlocks(), 0);
     EXPECT_EQ(first.resource, Resource(first.heap));
     EXPECT_NE(first.resource, second.resource);
     EXPECT_NE(first.resource, *std::pmr::new_delete_resource());
