@@ -40,6 +40,8 @@ def write_trace(path):
             else:
                 live[pool].append(16 * step)
                 size = chance.choice([8, 24, 24, 40, 100, 600, 3000])
+                if step % 1500 < 3:  # A size class with little memory, and one with very little.
+                    size = 300 if step > 2 else 200
                 out.write(f"xmpt:a:{pool:016x}:{16 * step:016x}:{size}\n")
         out.write("xmpt:f:bad\n")
 
@@ -174,6 +176,8 @@ class PageTest(unittest.TestCase):
         held = [max(row["records"]) * (row["data_size"] + 4) for row in rows]
         cells = sum(1 for row, most in zip(rows, held) for records in row["records"]
                     if records and most >= sum(held) / 100)
+        shares = sorted(most / sum(held) for most in held)
+        self.assertTrue(shares[0] < 0.01 < shares[1] < 0.1, shares)
         self.assertEqual(len(self.texts("#fill rect.cell")), cells)
         heights = self.browser.execute_script(
             "return Array.from(document.querySelectorAll('#lifetimes rect.bar'),"
@@ -213,7 +217,7 @@ class PageTest(unittest.TestCase):
         self.assertEqual(sums[peak], self.json["peak"]["asked"])
         point, tip = self.point_in_the_middle("growth", lines)
         self.assertIn(f"In all: {shown_bytes(sums[point])}", tip)
-        self.assertIn(f"caller_5: {shown_bytes(groups[7]['bytes'][point])}", tip)
+        self.assertIn(f"{groups[7]['name']}: {shown_bytes(groups[7]['bytes'][point])}", tip)
         tops = self.browser.execute_script(
             "return Array.from(document.querySelectorAll('#growth path.layer'), path => path"
             ".getAttribute('d').slice(1).split('L').map(at => Number(at.split(',')[1])))")
