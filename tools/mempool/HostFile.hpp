@@ -1,4 +1,4 @@
-// What a program's file tells of the program before it runs.
+// What a program's file says about the program before it runs.
 
 #ifndef OBR_TOOLS_MEMPOOL_HOSTFILE_HPP
 #define OBR_TOOLS_MEMPOOL_HOSTFILE_HPP
@@ -8,13 +8,13 @@
 namespace Tool {
 
 struct HostFile {
-    bool isScript = false;      // Of the three below nothing is known then.
+    bool isScript = false;      // Then the other three are unknown.
     bool isSanitized = false;   // Built with AddressSanitizer.
     bool namesLibrary = false;  // Names the shared library, to be loaded at the start or later.
-    bool holdsLibrary = false;  // Has the archive in it.
+    bool holdsLibrary = false;  // Contains the archive.
 };
 
-// Throws std::system_error where the file cannot be read.
+// A file that cannot be read is a Failure.
 HostFile ReadHostFile(const std::string& path);
 
 }  // namespace Tool
