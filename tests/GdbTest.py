@@ -1,9 +1,9 @@
-"""Run by gdb on GdbHost: what the commands tell, beside what the library and the host know.
+"""Run by gdb on GdbHost: compares what the commands print with what the library and the host know.
 
 The host is asked for the library's own report; nothing is called. Damage is written into the live
-host and taken back. Environment: HOST and CRASH_SIGNAL, by which it ends,
-empty under sanitizers; TEST_DIR to write into; STRIP and LIBRARY for a copy of the library without
-symbols; CHECKED, the folder of the checked library. Where gdb cannot run programs the test is skipped.
+host and taken back. Environment: HOST; CRASH_SIGNAL, which ends it, empty under sanitizers; TEST_DIR
+to write into; STRIP and LIBRARY for a copy of the library without symbols; CHECKED, the folder of the
+checked library. The test is skipped where gdb cannot run programs.
 """
 
 import itertools
@@ -48,7 +48,7 @@ def go_on():
 
 
 class Poke:
-    """Bytes of the host that are other ones for a while."""
+    """Replaces bytes of the host for a while."""
 
     def __init__(self, address, data):
         self.address, self.data = address, data
@@ -78,7 +78,7 @@ class LiveHost(unittest.TestCase):
         return type(self.pools[name])(self.pools[name].address)
 
     def field(self, thing, name):
-        """Where a field stands, and its code."""
+        """The address of a field, and its code."""
         return next((thing.address + offset, code)
                     for field, offset, code in thing.form.fields if field == name)
 
@@ -86,8 +86,8 @@ class LiveHost(unittest.TestCase):
         address, code = self.field(thing, name)
         return Poke(address, struct.pack("<" + code, value))
 
-    def told(self, command):
-        """What a command writes, or says in place of it."""
+    def printed(self, command):
+        """What a command prints, its error included."""
         try:
             return run(command)
         except gdb.error as error:
@@ -126,8 +126,8 @@ class LiveHost(unittest.TestCase):
                     self.assertEqual(run(f'mempool report "{name}"{words}'), report)
             self.assertRegex(run(f"mempool check {name} "), "^pool " + re.escape(name))
         self.assertEqual(run("mempool report fifteen letters detailed"), own_report(LETTERS, True))
-        self.assertRegex(self.told("mempool report"), "^Usage: mempool report NAME")
-        self.assertRegex(self.told("mempool report four short"), "^There is no pool four short")
+        self.assertRegex(self.printed("mempool report"), "^Usage: mempool report NAME")
+        self.assertRegex(self.printed("mempool report four short"), "^There is no pool four short")
 
     # What may befall a bucket of three records, at the offsets 2, 18 and 34, the first in use.
     def test_reports_and_checks_a_damaged_bucket(self):
@@ -139,24 +139,25 @@ class LiveHost(unittest.TestCase):
             offset = 16 * number - 14
             return f"{at}, record {number} at {base + offset:#018x}, offset {offset}"
         link = f"{record(3)}: the link of this free record "
-        other = "which is no record's offset"
+        other = "which is not the offset of a record"
         for offset, code, value, fault in (
                 (34, "H", 18, link + "leads back to offset 18: the free list runs in a circle"),
                 (34, "H", 34, link + "leads back to offset 34: the free list runs in a circle"),
                 (34, "H", 2, link + "leads to offset 2, a used record"),
-                (34, "H", 50, link + "reads 50, " + other),
-                (34, "H", 19, link + "reads 19, " + other),
-                (34, "H", 1, link + "reads 1, " + other),
-                (-2, "H", 65522, f"{at}: freeHead reads 65522, {other}"),
-                (-2, "H", 17, f"{at}: freeHead reads 17, {other}"),
+                (34, "H", 50, link + "is 50, " + other),
+                (34, "H", 19, link + "is 19, " + other),
+                (34, "H", 1, link + "is 1, " + other),
+                (-2, "H", 65522, f"{at}: freeHead is 65522, {other}"),
+                (-2, "H", 17, f"{at}: freeHead is 17, {other}"),
                 (-2, "H", 2, f"{at}: freeHead leads to offset 2, a used record"),
                 (-2, "H", 0, f"{record(2)}: FREE, but not on the free list"),
                 (18, "H", 0, f"{record(3)}: FREE, but not on the free list"),
                 (0, "H", 9, f"{at}: 9 free records of 3"),
-                (0, "H", 1, f"{at}: it tells of 1 free records and lists 2"),
-                (36, "B", 2, f"{record(3)}: its type reads 0x02, neither FREE nor USED"),
-                (20, "B", 7, f"{record(2)}: its type reads 0x07, neither FREE nor USED"),
-                (2, "H", 18, f"{record(1)}: USED, but its own offset reads 18"),
+                (0, "H", 3, f"{at}: no record is in use, but it was not released"),
+                (0, "H", 1, f"{at}: it counts 1 free records and lists 2"),
+                (36, "B", 2, f"{record(3)}: its type is 0x02, neither FREE nor USED"),
+                (20, "B", 7, f"{record(2)}: its type is 0x07, neither FREE nor USED"),
+                (2, "H", 18, f"{record(1)}: USED, but its own offset is 18"),
                 (-6, "H", 49, f"{at}: a size of 49, not 50"),
                 (-6, "H", 37, f"{at}: a size of 37, not 50"),
                 (-6, "H", 36, f"{at}: a size of 36, not 50"),
@@ -190,10 +191,10 @@ class LiveHost(unittest.TestCase):
                     continue  # Most lengths can be.
                 byte, = gdb.selected_inferior().read_memory(address + offset, 1)
                 with Poke(address + offset, bytes([byte[0] ^ 0x80])):
-                    text = self.told(f'mempool check "{LETTERS}"')
+                    text = self.printed(f'mempool check "{LETTERS}"')
                     self.assertEqual(text.startswith("pool fifteen letters: sound, "),
                                      field in unchecked, (form.cxx_name, field, text))
-                    self.told(f'mempool report "{LETTERS}" detailed')
+                    self.printed(f'mempool report "{LETTERS}" detailed')
 
     def test_checks_the_lists_and_totals(self):
         pool = self.fresh(LETTERS)
@@ -211,21 +212,27 @@ class LiveHost(unittest.TestCase):
                 (group, "freeBuckets", 0x10, wild),
                 (group, "freeBuckets", 0, f"bucket at {first.address:#018x}: 1 free records, but not "
                  "on the free-bucket list"),
-                (group, "numBuckets", 4, f"{name}: it tells of 4 buckets and has 3"),
+                (group, "numBuckets", 4, f"{name}: it counts 4 buckets and has 3"),
                 (group, "numFreeBuckets", 2,
-                 f"{name}: it tells of 2 buckets with a free record and lists 1"),
+                 f"{name}: it counts 2 buckets with a free record and lists 1"),
                 (second, "prev2", first.address,
                  f"bucket at {second.address:#018x}: full, but prev2 is not null"),
                 (ext_recs[1], "hdr", b"\xAA\xBB\2\0", "heap record at "
-                 f"{ext_recs[1].address:#018x}: its header reads aa bb 02 00, not aa bb 02 cc"),
-                (pool, "numExtRecs", 4, f"pool at {pool.address:#018x}: it tells of 4 heap records "
+                 f"{ext_recs[1].address:#018x}: its header is aa bb 02 00, not aa bb 02 cc"),
+                (pool, "numExtRecs", 4, f"pool at {pool.address:#018x}: it counts 4 heap records "
                  "and has 3"),
                 (ext_recs[1], "length", 36,
                  f"heap record at {ext_recs[1].address:#018x}: a length of 36 bytes"),
                 (lower, "length", higher.address - lower.address,
-                 f"it begins inside of the heap record at {lower.address:#018x}")):
+                 f"it begins inside the heap record at {lower.address:#018x}")):
             with self.poke(thing, field, value):
                 self.assertTrue(run(f'mempool check "{LETTERS}"').endswith(fault + "\n"), fault)
+
+    def test_words_the_rules_as_the_library_does(self):
+        for field, value, problem in (("bucketSize", 43, "tooLarge"), ("minRecordSize", 44, "tooSmall")):
+            with self.poke(self.pools["three"], field, value):
+                text = gdb.parse_and_eval(f"{problem}._M_dataplus._M_p").string()
+                self.assertTrue(run("mempool check three").endswith(f": {text}\n"), text)
 
     def test_checks_all_pools(self):
         lines = run("mempool check").splitlines()
@@ -247,15 +254,15 @@ class LiveHost(unittest.TestCase):
                        ((2, "USED"), (18, "FREE, 1 on the free list"), (34, "USED")))]
         block = evaluate("(long) blocks[7]")
         middle = (head + f"   Record  : {records[1]}\n   Block   : {block:#018x}, 12 bytes\n"
-                  f"   Ahead   : {records[0]}\n   Behind  : {records[2]}\n")
+                  f"   Before  : {records[0]}\n   After   : {records[2]}\n")
         for offset, place in ((0, "is the block of"), (11, "lies 11 bytes into the block of"),
                               (-1, "lies 3 bytes into the header of")):
             self.assertEqual(self.whois(f"(char*) blocks[7] + {offset}"),
                              f"{block + offset:#018x} {place} a free record.\n" + middle)
         text = self.whois("blocks[6]")
         self.assertIn("is the block of a used record.\n" + head + f"   Record  : {records[0]}\n", text)
-        self.assertIn(f"   Ahead   : the bucket's header, {bucket.address:#018x}\n", text)
-        self.assertRegex(self.whois("blocks[8]"), r"Behind  : \d+ bytes? ahead of .* at 0x")
+        self.assertIn(f"   Before  : the bucket's header, {bucket.address:#018x}\n", text)
+        self.assertRegex(self.whois("blocks[8]"), r"After   : \d+ bytes? before .* at 0x")
         self.assertIn(f"lies 46 bytes into a bucket's header.\n{head}",
                       self.whois(str(bucket.recs_base)))
 
@@ -273,10 +280,10 @@ class LiveHost(unittest.TestCase):
         self.assertIn("lies 0 bytes into the pool's handle.\n   Pool    : off", self.whois("off"))
         text = self.whois("16")
         count, start = re.fullmatch(r"""0x0000000000000010 lies in no pool's memory.
-   Behind  : (\d+) bytes ahead of .* at (0x\w+), pool .*
+   After   : (\d+) bytes before .* at (0x\w+), pool .*
    Unknown .*\n""", text).groups()
         self.assertEqual(16 + int(count), int(start, 16))
-        count, start = re.search(r"Ahead   : (\d+) bytes behind the end of the pool's handle at (0x\w+)",
+        count, start = re.search(r"Before  : (\d+) bytes after the end of the pool's handle at (0x\w+)",
                                  self.whois("-1")).groups()
         self.assertEqual(int(start, 16) + 8 + int(count), 2**64 - 1)
         self.assertIn("the blocks of disabled pools (off) are the heap's own", text)
@@ -284,9 +291,9 @@ class LiveHost(unittest.TestCase):
             self.whois("letters.Alloc(12)")
 
         with self.poke(bucket, "freeHead", 0):
-            self.assertIn("FREE, but not found on the free list", self.whois("blocks[7]"))
+            self.assertIn("FREE, but not on the free list", self.whois("blocks[7]"))
         with Poke(block - 12 - 8, b"\3\0"):
-            self.assertIn("offset 2, USED, but its own offset reads 3", self.whois("blocks[6]"))
+            self.assertIn("offset 2, USED, but its own offset is 3", self.whois("blocks[6]"))
         with self.poke(bucket, "parent", 8):
             text = self.whois("blocks[6]")
             self.assertIn("lies in no pool's memory", text)
@@ -327,7 +334,7 @@ class NextHost(unittest.TestCase):
         run(f"core-file {TEST_DIR / 'core'}")
         self.assertEqual(run("mempool report overrun detailed"), live)
         self.assertRegex(run("mempool check"), "(?m)^pool overrun: bucket at 0x[0-9a-f]+: freeHead "
-                         "reads 65535, which is no record's offset$")
+                         "is 65535, which is not the offset of a record$")
         run("core-file")
 
     def test_3_without_symbols_it_says_so(self):

@@ -3,6 +3,7 @@
 
 #include <malloc.h>
 #include <MemPool>
+#include <MemPoolSettings>
 #include <cstdlib>
 #include <fstream>
 #include <iostream>
@@ -79,6 +80,12 @@ int main() {
     new (extBlocks[0]) Mgr("in a block");
     Mgr three("three");
     void* const first = three.Alloc(12);
+    PoolSettings settings = PoolSettings::OfProcess();
+    settings.bucketSize = 43;
+    const std::string tooLarge = PoolSizes(settings).Problem();
+    settings.bucketSize = 50;
+    settings.minRecordSize = 44;
+    const std::string tooSmall = PoolSizes(settings).Problem();
 
     Mgr left("left");
     const Mgr right("right");

@@ -1,4 +1,4 @@
-"""The commands: what is typed, and where each is told in full. Importing this defines them."""
+"""The commands and their help. Importing this defines them."""
 
 import re
 
@@ -9,7 +9,7 @@ from .memory import Fault
 
 
 def write(lines):
-    """Writes what gdb's character set can hold; the rest is told by its code."""
+    """Writes the lines; what gdb's character set lacks is escaped."""
     text = "".join(lines)
     try:
         gdb.write(text)
@@ -18,7 +18,7 @@ def write(lines):
 
 
 def pool_named(text):
-    """The pool whose name is this text as it stands, or else what is left of it without its quotes."""
+    """The pool whose name is this text as it is, or else without its quotes."""
     name = text.strip()
     found, fault = pools.all_pools()
     for candidate in (name, " ".join(gdb.string_to_argv(text))):
@@ -26,7 +26,7 @@ def pool_named(text):
             if pool.title == candidate:
                 return pool
     if fault is not None:
-        raise gdb.GdbError(f"No pool {name} is found, but not all are known: {fault}")
+        raise gdb.GdbError(f"Pool {name} is not found, but not all pools are known: {fault}")
     raise gdb.GdbError(f"There is no pool {name}. \"info mempools\" lists them.")
 
 
@@ -45,8 +45,8 @@ class InfoMempools(gdb.Command):
     """List the memory pools of libObrMemPool.
 Usage: info mempools
 
-Blocks and bytes are those in use, as the pool's records hold them; held are the bytes that buckets
-and heap records have from the heap. The blocks of a pool that is not enabled are the heap's own and
+Blocks and bytes are those in use, sizes rounded as the pool rounds them. Held are the bytes that the
+pool has from the heap for buckets and heap records. Blocks of a disabled pool are the heap's own and
 are not counted."""
 
     def __init__(self):
@@ -94,7 +94,7 @@ class MempoolReport(PoolCommand):
     """Print the report of a pool, as its Dbg does.
 Usage: mempool report NAME [detailed]
 
-With "detailed" as its DbgDetailed does: every bucket and record. Quote a name that ends in "detailed"."""
+"detailed" adds every bucket and record, as DbgDetailed does. Quote a name that ends in "detailed"."""
 
     def __init__(self):
         super().__init__("mempool report", gdb.COMMAND_DATA)
@@ -116,10 +116,10 @@ With "detailed" as its DbgDetailed does: every bucket and record. Quote a name t
 
 
 class MempoolWhois(gdb.Command):
-    """Tell which pool, bucket and record an address lies in, used or free, and what lies beside it.
+    """Show the pool, bucket and record that an address lies in, used or free, and what is beside it.
 Usage: mempool whois EXPRESSION
 
-EXPRESSION is a pointer, a number, or an object in memory, whose address is taken. It must not call
+EXPRESSION is a pointer, a number, or an object in memory, of which the address counts. It cannot call
 functions of the program."""
 
     def __init__(self):
@@ -150,7 +150,7 @@ class MempoolCheck(PoolCommand):
     """Check every invariant of the memory of a pool, or of all pools and the registry.
 Usage: mempool check [NAME]
 
-The first that is broken is told with its address."""
+The first broken one is reported with its address."""
 
     def __init__(self):
         super().__init__("mempool check", gdb.COMMAND_DATA)

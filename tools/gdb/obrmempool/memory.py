@@ -1,7 +1,7 @@
-"""The bytes of the program that gdb looks at, live or a core, and where its registry lies.
+"""The bytes of the program that gdb looks at, live or a core, and the places of its registries.
 
-Nothing here runs a single instruction of the program. What cannot be read is a Fault, which names
-the address; so is all that the other files find to be damaged.
+Nothing here runs an instruction of the program. Memory that cannot be read is a Fault with its
+address, and so is every damage that the other files find.
 """
 
 import gdb
@@ -10,7 +10,7 @@ from . import layout
 
 
 class Fault(Exception):
-    """Something is not as it should be, at an address. The text begins with the thing that is hit."""
+    """Something at an address is damaged. The text begins with the thing."""
 
     def __init__(self, text, address):
         super().__init__(text)
@@ -31,27 +31,26 @@ def read_row(form, address, what):
 
 
 def read_string(data, what):
-    """The bytes of a std::string of which `data` are the 32 of the object."""
+    """The text of a std::string whose object has these 32 bytes."""
     string = layout.STRING.parse(data)
     if string.length > 2**20:
         raise Fault(f"{what}: a length of {string.length} bytes", string.text)
     text = read(string.text, string.length + 1, what)
     if text[-1] != 0:
-        raise Fault(f"{what}: no end behind its {string.length} bytes", string.text)
+        raise Fault(f"{what}: no end after its {string.length} bytes", string.text)
     return text[:-1]
 
 
 def name_text(name):
-    """A pool's name as it can be shown: what is no UTF-8, and what gdb cannot write, by its code."""
+    """A pool's name to be shown. Bytes that are not UTF-8, and zeros, are escaped."""
     return name.decode("utf-8", "backslashreplace").replace("\0", "\\x00")
 
 
 def registry_addresses():
-    """Where the registries lie: one in each copy of the library that the program has.
+    """The registries: one in each copy of the library that the program has.
 
-    The name is looked for as the linker knows it, which needs no debug information and does not
-    depend on the language of the code that gdb stands in. A copy beyond the first is found by its
-    debug information only.
+    The first is found by its name as the linker knows it, which needs no debug information and does
+    not depend on the language of the code where the program stands. Others need debug information.
     """
     if not gdb.selected_inferior().threads():
         raise gdb.GdbError("There is no program: run one, attach to one or load a core.")
@@ -67,6 +66,6 @@ def registry_addresses():
             addresses.append(int(symbol.value().address))
     if not addresses:
         raise gdb.GdbError(
-            "The pools are not found: the program has no libObrMemPool loaded, or that has neither\n"
+            "No pools are found: the program has not loaded libObrMemPool, or the library has neither\n"
             "debug information nor a symbol table. Use one that is not stripped, or load its symbols.")
     return list(dict.fromkeys(address % 2**64 for address in addresses))

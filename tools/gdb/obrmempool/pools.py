@@ -1,8 +1,7 @@
 """The library's objects as they lie in the program, and the ways through them.
 
-An object reads its bytes when it is asked for them, and keeps them: it is made for one command and
-dropped with it. A way ends in a Fault where a link leads into memory that cannot be read or back to
-where it has been.
+An object reads its bytes when it is asked for them, and keeps them: it lives for one command. A way
+ends in a Fault where a link leads into memory that cannot be read, or back to where it has been.
 """
 
 import struct
@@ -12,22 +11,11 @@ from . import layout, memory
 from .memory import Fault
 
 
-def follow(front, next_of, what):
-    """The nodes of a list: next_of(address) reads one and returns it with the next one's address."""
-    seen = set()
-    address = front
-    while address != 0:
-        if address in seen:
-            raise Fault(f"{what} runs in a circle: {address:#018x} comes a second time", address)
-        seen.add(address)
-        node, address = next_of(address)
-        yield node
-
-
 class Structure:
     """A struct at an address, with its fields."""
 
     form = None
+    what = None
 
     def __init__(self, address):
         self.address = address
@@ -40,6 +28,23 @@ class Structure:
         if field.startswith("_"):
             raise AttributeError(field)
         return getattr(self.row, field)
+
+    @property
+    def end(self):
+        return self.address + self.form.size
+
+
+def follow(front, kind, link, what):
+    """The nodes of a list of that kind, from the front on."""
+    seen = set()
+    address = front
+    while address != 0:
+        if address in seen:
+            raise Fault(f"{what} runs in a circle: {address:#018x} comes a second time", address)
+        seen.add(address)
+        node = kind(address)
+        address = getattr(node, link)
+        yield node
 
 
 class Bucket(Structure):
@@ -69,14 +74,14 @@ class Bucket(Structure):
         return self.recs_base + max(self.size, layout.FIRST_OFFSET)
 
     def records(self):
-        """Its records with their bytes, read now and kept by the caller alone."""
+        """Its records with their bytes, which are read now."""
         return Records(self, memory.read(self.recs_base, self.size, "the records of a bucket"))
 
 
 class Records:
-    """The bytes of a bucket from recsBase on. A header that they do not hold has an unknown type and
-    no link, the guard aside; a record is where the way from record to record comes by and finds a
-    header, be it in a piece of a record at the end."""
+    """The bytes of a bucket from recsBase on. A record is at each step from the first one that finds a
+    header, be it in an incomplete record at the end. A header outside of these bytes has an unknown
+    type and no link; its guard may be missing."""
 
     def __init__(self, bucket, data):
         self.bucket = bucket
@@ -100,19 +105,19 @@ class Records:
         return struct.unpack_from("<H", self.data, offset)[0] if self.has_header_at(offset) else 0
 
     def offsets(self):
-        """Those of all records in the order of their addresses. The first is not asked for."""
+        """Of all records, in the order of memory. There is always a first."""
         if self.rec_size == 0:
             return [layout.FIRST_OFFSET]
         return range(layout.FIRST_OFFSET, max(self.size, layout.FIRST_OFFSET + 1), self.rec_size)
 
     def count_used(self):
-        """Those whose type says so, without a look at each by itself."""
+        """The records whose type says so, without a look at each."""
         first_type = layout.FIRST_OFFSET + 2
         return self.data[first_type::self.rec_size or max(self.size, 1)].count(layout.TYPE_USED)
 
     def free_list(self):
         """The offsets on the free list, up to and with the first that is no record's or comes again:
-        what must not be followed is for the caller to see."""
+        the caller decides what that means."""
         seen = set()
         offset = self.bucket.freeHead
         while offset != 0:
@@ -125,25 +130,19 @@ class Records:
 
 class Group(Structure):
     form = layout.GROUP
-    what = "group"
 
     def __init__(self, address, index):
         super().__init__(address)
         self.index = index
+        self.what = f"group {index}"
 
     def walk(self):
-        """The buckets of the list of all, one by one."""
-        def read_next(address):
-            bucket = Bucket(address)
-            return bucket, bucket.next1
-        return follow(self.head, read_next, f"group {self.index}: the list of its buckets")
+        """All buckets, one by one."""
+        return follow(self.head, Bucket, "next1", f"{self.what}: the list of its buckets")
 
     def walk_free(self):
-        """The buckets of the list of those with a free record."""
-        def read_next(address):
-            bucket = Bucket(address)
-            return bucket, bucket.next2
-        return follow(self.freeBuckets, read_next, f"group {self.index}: its free-bucket list")
+        """The buckets on the free-bucket list."""
+        return follow(self.freeBuckets, Bucket, "next2", f"{self.what}: its free-bucket list")
 
     @cached_property
     def buckets(self):
@@ -182,32 +181,24 @@ class Pool(Structure):
 
     @property
     def title(self):
-        """The name that the registry has for it, its own where it was not found by that."""
+        """The name in the registry, or its own if it was not found there."""
         name = self.own_name if self.registered_name is None else self.registered_name
         return memory.name_text(name)
 
     @cached_property
-    def group_addresses(self):
-        """The places of the table of groups. No settings make more than 32768."""
-        if self.numGroups > 2**15:
-            raise Fault(f"{self.numGroups} places for groups", self.address)
-        return struct.unpack(f"<{self.numGroups}Q", memory.read(
-            self.row.groups, 8 * self.numGroups, "the table of groups"))
-
-    @cached_property
     def groups(self):
-        return [Group(address, index)
-                for index, address in enumerate(self.group_addresses) if address != 0]
+        if self.numGroups > layout.MAX_BUCKET_SIZE:  # No settings make as many.
+            raise Fault(f"{self.numGroups} places for groups", self.address)
+        addresses = struct.unpack(f"<{self.numGroups}Q", memory.read(
+            self.row.groups, 8 * self.numGroups, "the table of groups"))
+        return [Group(address, index) for index, address in enumerate(addresses) if address != 0]
 
     def buckets(self):
         for group in self.groups:
             yield from group.buckets
 
     def walk_ext_recs(self):
-        def read_next(address):
-            ext_rec = ExtRec(address)
-            return ext_rec, ext_rec.next
-        return follow(self.extRecs, read_next, "the list of heap records")
+        return follow(self.extRecs, ExtRec, "next", "the list of heap records")
 
     @cached_property
     def ext_rec_list(self):
@@ -219,14 +210,14 @@ class Registry(Structure):
     what = "registry"
 
     def nodes(self):
-        """The nodes of the tree in the order of the pools' names, and the address of each."""
+        """The nodes of the tree in the order of the pools' names, each with its address."""
         above = []
         address, parent = self.root, self.address + layout.TREE_END
         while address != 0 or above:
             while address != 0:
                 node = memory.read_row(layout.NODE, address, "a node of the registry's tree")
                 if node.parent != parent:  # A circle ends here too: no node has two parents.
-                    raise Fault(f"a node of the registry's tree at {address:#018x}: its parent reads "
+                    raise Fault(f"a node of the registry's tree at {address:#018x}: its parent is "
                                 f"{node.parent:#018x}, not {parent:#018x}", address)
                 above.append((address, node))
                 address, parent = node.left, address
@@ -240,17 +231,17 @@ class Registry(Structure):
 
     @cached_property
     def sharers(self):
-        """The handles that have been assigned to: only they can have another pool than they made."""
+        """The handles that were assigned to. Only they can have another pool than the one they made."""
         size = self.row.sharersEnd - self.row.sharers
         if size % 8 != 0 or not 0 <= size < 2**32:
-            raise Fault(f"the registry at {self.address:#018x}: no sound end of the handles",
+            raise Fault(f"the registry at {self.address:#018x}: its list of handles has no valid end",
                         self.address)
         return struct.unpack(f"<{size // 8}Q",
                              memory.read(self.row.sharers, size, "the registry's handles"))
 
 
 def all_pools():
-    """Every pool that the registries lead to, and the fault that ended the way, or None."""
+    """All pools that the registries lead to, and the Fault that ended the way, or None."""
     pools = []
     try:
         for registry in memory.registry_addresses():

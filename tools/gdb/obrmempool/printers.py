@@ -8,7 +8,7 @@ from .memory import Fault
 
 
 def summary(address):
-    """A pool in a line, as far as it can be read."""
+    """A pool in one line, as far as it can be read."""
     if address == 0:
         return "no pool"
     pool = pools.Pool(address)
@@ -32,7 +32,7 @@ class MgrPrinter:
 
 
 class BucketMgrPrinter:
-    """A line, and the fields as the library's debug information has them."""
+    """The same line, and the fields as the library's debug information has them."""
 
     def __init__(self, value):
         self.value = value
@@ -64,7 +64,7 @@ class VectorPrinter:
 
 
 def register(objfile):
-    """Makes the printers known, for one library, or for all programs where it is None."""
+    """Registers the printers for one library, or for all programs if it is None."""
     printers = gdb.printing.RegexpCollectionPrettyPrinter("ObrMemPool")
     printers.add_printer("Mgr", "^OBR::MemPool::Mgr$", MgrPrinter)
     printers.add_printer("BucketMgr", "^OBR::MemPool::BucketMgr$", BucketMgrPrinter)
