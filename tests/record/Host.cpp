@@ -129,7 +129,7 @@ void Spawn(const char* self) {
 
 void Exec(const char* self) {
     Use(70001);
-    execl(self, self, "family", nullptr);
+    execl(self, self, "callers", nullptr);
 }
 
 void Load() {
@@ -200,6 +200,15 @@ __attribute__((noinline)) void SecondCaller() {
     Keep(strdup(text.c_str()));
 }
 
+// A function that passes memory on.
+extern "C" __attribute__((noinline)) void* pass_alloc(std::size_t size) {
+    return Keep(std::malloc(size));
+}
+template <typename>
+__attribute__((noinline)) void ThirdCaller() {
+    Keep(pass_alloc(70001));
+}
+
 int main(int argc, char** argv) {
     const std::string what = argc > 1 ? argv[1] : "";
     if (what == "family") { Family(); }
@@ -220,6 +229,7 @@ int main(int argc, char** argv) {
     if (what == "callers") {
         FirstCaller();
         SecondCaller();
+        ThirdCaller<std::vector<int>>();
     }
     if (what == "exit") {
         Use(70001);

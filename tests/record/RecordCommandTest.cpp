@@ -91,7 +91,24 @@ TEST(Record, LeavesChildrenAlone) {
     EXPECT_EQ(Record("fork").story, "+70000 +70001 -70001 +70003 -70003 ");
     EXPECT_EQ(Record("vfork").story, "+70000 +70001 -70001 ");
     EXPECT_EQ(Record("spawn").story, "+70000 +70001 -70001 ");
-    EXPECT_EQ(Record("exec").story, "+70000 +70001 -70001 ");
+}
+
+// What lived goes with the program, and callers are those of the new one.
+TEST(Record, FollowsAProgramThatBecomesAnother) {
+    const Recorded exec = Record("exec", "--by caller");
+    EXPECT_THAT(exec.story, testing::StartsWith("+70000 +70001 -70001 +70000 +70001 "));
+    EXPECT_THAT(exec.numBlocks, testing::Contains(testing::Key(ContainsRegex("^FirstCaller"))));
+    const auto record = [](const std::string& command, int status) {
+        const std::string text = Shell::Output(MEMPOOL " record -o trace " + command, status);
+        return text + ReadTrace("trace").story;
+    };
+    const std::string story = "+70000 +70001 -70001 ";
+    EXPECT_EQ(record("env X=1 ./Host exit", 7), story);
+    EXPECT_EQ(record("sh -c 'exec ./lost; exit 1' 2>/dev/null", 127), "");
+    EXPECT_EQ(record("bash -c 'LD_PRELOAD=libz.so.1 exec ./Host exit'", 7), story);
+    EXPECT_EQ(record("env " STATIC_HOST, 0),
+              "mempool: env has become a program that cannot be recorded: it is statically linked, "
+              "or runs with other rights\n");
 }
 
 TEST(Record, FollowsTheProgramToItsEnd) {
@@ -117,13 +134,17 @@ TEST(Record, DiesByTheSignalOfTheProgram) {
 
 TEST(Record, CallsTheGroups) {
     const auto byCaller = Record("callers", "--by caller").numBlocks;
-    ASSERT_EQ(byCaller.size(), 4U);
-    for (const char* name : {"^FirstCaller\\(\\)\\+0x[0-9a-f]+ \\(RecordHost\\)$",
-                             "^SecondCaller\\(\\)\\+0x[0-9a-f]+ \\(RecordHost\\)$"}) {
+    ASSERT_EQ(byCaller.size(), 5U);
+    for (const char* name :
+         {"^FirstCaller\\(\\)\\+0x[0-9a-f]+ \\(RecordHost\\)$",
+          "^SecondCaller\\(\\)\\+0x[0-9a-f]+ \\(RecordHost\\)$", "^void ThirdCaller\\(\\)\\+0x"}) {
         EXPECT_THAT(byCaller, testing::Contains(testing::Key(ContainsRegex(name))));
     }
     EXPECT_EQ(Record("callers", "--by module").numBlocks,
-              (std::map<std::string, int>{{"RecordHost", 4}}));
+              (std::map<std::string, int>{{"RecordHost", 5}}));
+    const auto skipped = Record("callers", "--by caller --skip no --skip '*Caller*'").numBlocks;
+    EXPECT_THAT(skipped, testing::Contains(testing::Key(ContainsRegex("^main\\+0x"))));
+    EXPECT_THAT(skipped, testing::Not(testing::Contains(testing::Key(HasSubstr("Caller()")))));
 }
 
 TEST(Record, EstimatesTheShareOfTheAllocations) {
@@ -154,6 +175,8 @@ TEST(Record, PassesTheProgramOn) {
     EXPECT_THAT(
         Shell::Output(record + SANITIZED_HOST),
         ContainsRegex("^mempool: " SANITIZED_HOST " is built with AddressSanitizer[^\n]*\n$"));
+    EXPECT_EQ(Shell::Output(record + "grep Sig[BI] /proc/self/status"),
+              Shell::Output("grep Sig[BI] /proc/self/status"));
     EXPECT_EQ(Shell::Output("echo in | " + record + "sh -c 'cat; echo err >&2; exit 9'", 9),
               "in\nerr\n");
     EXPECT_EQ(Shell::Output(record + "-- sh -c 'echo \"$@\"' sh -o --by -- [x,y] ''"),

@@ -25,7 +25,8 @@ class Help final : public CLI::Formatter {
         return comma == std::string::npos ? name : name.insert(comma + 1, " ");
     }
     std::string make_option_opts(const CLI::Option* option) const override {
-        const bool isList = option->get_expected_max() == CLI::detail::expected_max_vector_size;
+        const bool isList = option->get_positional() &&
+                            option->get_expected_max() == CLI::detail::expected_max_vector_size;
         const std::string type = option->get_type_name();
         const std::string value = type.substr(0, type.find(':'));  // A check's description follows.
         const bool hasValue = option->get_type_size() != 0 && !value.empty();

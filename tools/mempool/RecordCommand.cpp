@@ -23,17 +23,20 @@ constexpr const char* description = "Run a program and write a trace of its allo
 constexpr const char* notes =
     R"(The program runs unchanged, with a recorder loaded ahead of its libraries. Its output, its
 standard streams and its exit status are its own; if a signal kills it, mempool dies by the same.
-Signals sent to mempool go on to the program. What the program starts is not recorded, nor what it
-becomes by exec. A trace that was cut short, by Ctrl-C or a crash of the program, is a whole one.
+Signals sent to mempool go on to the program. What the program becomes by exec is recorded too, what
+it starts is not. A trace that was cut short, by Ctrl-C or a crash of the program, is a whole one.
 
 Recorded are malloc, calloc, realloc (a release and an allocation), reallocarray, free, the aligned
 forms, and operator new and delete, which call them. An allocator that is linked into the program
 itself cannot be seen.
 
 -o -          The trace goes to standard output, and what the program prints there to standard error.
---by caller   A group is a return address: the first one outside of the C and C++ run-time
-              libraries, with the function's name if the file has symbols. Calls out of a function
-              of these libraries that takes stack by a size of its own count as that function's.
+--by caller   A group is a place that asks for memory: the first return address outside of the C and
+              C++ run-time libraries and of functions that pass memory on, with the function's name
+              if the file has symbols. Such a function is known by its exported symbol: it contains
+              malloc, calloc, realloc, memalign, strdup or strndup, ends in alloc, or belongs to
+              the C++ library. --skip names more of them, such as --skip 'new*'. Calls out of a
+              function that takes stack by a size of its own count as that function's.
 --by module   The program's file and each of its shared libraries is a group.
 --pools       Records the pools of libObrMemPool in place of the heap, on or off, Mgr::Clear
               included. The program must use the shared library.
@@ -71,6 +74,14 @@ void AddRecordOptions(CLI::App& subcommand, Recorder::Order& order) {
         ->default_str(std::find_if(names.begin(), names.end(), [&](const auto& each) {
                           return each.second == order.by;
                       })->first);
+    subcommand
+        .add_option("--skip", order.skipped,
+                    "Take no function whose symbol matches PATTERN for a caller; may be repeated")
+        ->type_name("PATTERN")
+        ->allow_extra_args(false)
+        ->check([](const std::string& pattern) {
+            return std::string(pattern.empty() ? "the pattern is empty" : "");
+        });
     subcommand.add_flag("--pools", order.pools, "Record the pools of libObrMemPool, not the heap")
         ->excludes(by);
 }
@@ -80,6 +91,11 @@ Recorder::Outcome RecordAsOrdered(const Recorder::Order& order) {
     if (order.pools && outcome.numEvents == 0) {
         std::cerr << "mempool: " << order.command.front()
                   << " has made no pool of the shared library, libObrMemPool.so\n";
+    }
+    if (outcome.isCutByExec) {
+        std::cerr << "mempool: " << order.command.front()
+                  << " has become a program that cannot be recorded: it is statically linked, or "
+                     "runs with other rights\n";
     }
     if (outcome.isAddressSanitized) {
         std::cerr << "mempool: " << order.command.front()

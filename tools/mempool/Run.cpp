@@ -125,7 +125,7 @@ int Run(Options options) {
     }
     ReportOn(trace, options, page.get());
     try {
-        AdviseOn(trace, options);
+        if (!outcome.isCutByExec) { AdviseOn(trace, options); }
     } catch (const std::exception& error) {
         std::cerr << "mempool: no advice: " << error.what() << '\n';
     }

@@ -6,6 +6,8 @@
 #include "record/Callers.hpp"
 
 #include <dlfcn.h>
+#include <fnmatch.h>
+#include <strings.h>
 #include <sys/auxv.h>
 #include <unistd.h>
 #include <unwind.h>
@@ -69,6 +71,24 @@ bool IsRuntime(const char* path) {
     return false;
 }
 
+// Whether the function only passes on what an allocator gives: one of the malloc family by its
+// name, operator new, one of the C++ library, or one that the user has named.
+bool IsWrapper(const Channel& channel, const char* function) {
+    for (const char* start : {"_Zn", "_ZSt", "_ZNSt", "_ZNKSt", "_ZN9__gnu_cxx"}) {
+        if (std::strncmp(function, start, std::strlen(start)) == 0) { return true; }
+    }
+    for (const char* part : {"malloc", "calloc", "realloc", "memalign", "strdup", "strndup"}) {
+        if (strcasestr(function, part) != nullptr) { return true; }
+    }
+    const std::size_t size = std::strlen(function);
+    if (size >= 5 && strcasecmp(function + size - 5, "alloc") == 0) { return true; }
+    const char* pattern = channel.skipped;
+    while (*pattern != '\0' && fnmatch(pattern, function, 0) != 0) {
+        pattern += std::strlen(pattern) + 1;
+    }
+    return *pattern != '\0';
+}
+
 // The path of the program's own file, which the loader calls by whatever name it was started.
 void FindPath(const Dl_info& info, char* path, std::size_t size) {
     Dl_info program = {};
@@ -122,7 +142,9 @@ bool Enter(Channel& channel, Caller& caller, const Frame& frame, std::uint64_t f
     Dl_info info = {};
     const bool isKnown = dladdr(Pointer(frame.address - 1), &info) != 0;
     caller.module = isKnown ? FindModule(channel, info) : 0;
-    const bool isPassed = isKnown && frameSize != 0 && IsRuntime(info.dli_fname);
+    const bool isWrapper =
+        channel.by == By::Caller && info.dli_sname != nullptr && IsWrapper(channel, info.dli_sname);
+    const bool isPassed = isKnown && frameSize != 0 && (isWrapper || IsRuntime(info.dli_fname));
     caller.frameSize = frameSize;
     caller.state.store(isPassed ? Caller::Passed : Caller::Final, std::memory_order_release);
     return isPassed;

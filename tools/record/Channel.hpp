@@ -27,7 +27,8 @@ enum class Op : std::uint8_t {
     PoolAllocated,  // Pool; a Data slot with the block and the size follows.
     PoolFreed,      // Pool; likewise.
     PoolNamed,      // Pool, size of the name; Data slots with 8 bytes each follow.
-    Data,
+    Data,           // Alone it means nothing.
+    Executed,       // The program has become another one.
 };
 
 // `where` is the address above 16 bits of the thread's number. `what` holds, from the low bits on,
@@ -85,7 +86,9 @@ struct Channel {
     By by;
     std::int32_t pid;                        // Of the program, and of no child of it.
     std::int32_t parentPid;                  // Of the process that drains the channel.
+    std::int32_t descriptor;                 // Of the channel, in that process.
     std::atomic<std::uint32_t> isTaken;      // Set by the program's recorder, once.
+    std::atomic<std::uint32_t> numExecs;     // How often the program has become another one.
     std::atomic<std::uint32_t> tailFutex;    // The low bits of the tail, to wait on.
     std::atomic<std::uint32_t> numWaiting;   // Threads that do.
     std::atomic<std::uint32_t> modulesUsed;  // The index of the last one.
@@ -100,6 +103,9 @@ struct Channel {
     alignas(64) std::atomic<std::uint64_t> eventTicks;
     std::atomic<std::uint64_t> timerTicks;
     std::atomic<std::uint64_t> unwindNanoseconds;
+
+    // Patterns of functions that are no callers, each with its end, then an empty one.
+    char skipped[1024];
 
     // The calls of the allocator that were timed, by the power of two of their ticks, those of the
     // timer among them.

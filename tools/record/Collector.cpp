@@ -29,8 +29,10 @@ std::uint64_t AddressOf(std::uint64_t where) {
 
 }  // namespace
 
-Collector::Collector(Channel& fromChannel, Trace::CompactWriter& toWriter)
-    : channel(fromChannel), writer(toWriter), knownPools(numCallers + 1) {}
+Collector::Collector(Channel& fromChannel, Trace::CompactWriter& toWriter, bool ofPools)
+    : channel(fromChannel), writer(toWriter), isOfPools(ofPools), knownPools(numCallers + 1) {
+    if (!isOfPools) { writer.WriteOwned(); }
+}
 
 bool Collector::Drain(bool atEnd) {
     constexpr std::uint64_t most = 1U << 14;
@@ -84,8 +86,10 @@ void Collector::Write(std::uint64_t& index, std::uint64_t where, std::uint64_t w
 void Collector::WritePoolEvent(std::uint64_t& index, std::uint64_t pool, std::uint64_t what) {
     switch (OpOf(what)) {
         case Op::PoolCreated:
+            pools.insert(pool);
             return writer.Write({Trace::Kind::Created, pool, 0, 0, {}, {}});
         case Op::PoolDestroyed:
+            pools.erase(pool);
             return writer.Write({Trace::Kind::Destroyed, pool, 0, 0, {}, {}});
         case Op::PoolCleared:
             return writer.Write({Trace::Kind::Cleared, pool, 0, 0, {}, {}});
@@ -106,9 +110,27 @@ void Collector::WritePoolEvent(std::uint64_t& index, std::uint64_t pool, std::ui
         case Op::PoolFreed:
             return writer.Write(
                 {Trace::Kind::Freed, pool, AddressOf(NextData(index).where), 0, {}, {}});
-        default:
+        case Op::Executed:
+            return EndPools();
+        case Op::Allocated:
+        case Op::Released:
+        case Op::Data:
             break;
     }
+}
+
+// What the program had goes when it becomes another one.
+void Collector::EndPools() {
+    for (std::uint64_t pool = 0; pool != knownPools.size(); ++pool) {
+        if (knownPools[pool]) { pools.insert(pool); }
+        knownPools[pool] = false;
+    }
+    for (const std::uint64_t pool : pools) {
+        writer.Write({Trace::Kind::Destroyed, pool, 0, 0, {}, {}});
+    }
+    pools.clear();
+    symbols = {};
+    if (!isOfPools) { writer.WriteOwned(); }
 }
 
 const Slot& Collector::NextData(std::uint64_t& index) const {

@@ -3,9 +3,9 @@
 #ifndef OBR_TOOLS_RECORD_COLLECTOR_HPP
 #define OBR_TOOLS_RECORD_COLLECTOR_HPP
 
-#include <array>
 #include <chrono>
 #include <cstdint>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -17,7 +17,8 @@ namespace Recorder {
 
 class Collector {
 public:
-    Collector(Channel& fromChannel, Trace::CompactWriter& toWriter);
+    // Of the pools of the library, or of the heap.
+    Collector(Channel& fromChannel, Trace::CompactWriter& toWriter, bool ofPools);
 
     // Takes what is there, some thousand events at most, and returns whether there was any. At the
     // end of the program slots that were taken and never filled are passed over.
@@ -32,12 +33,15 @@ private:
     const Slot& NextData(std::uint64_t& index) const;
     std::uint64_t PoolOf(std::uint64_t group, std::uint64_t thread);
     std::uint64_t NumberOfPool(std::uint64_t group, std::uint64_t thread) const;
+    void EndPools();
     std::string NameOfPool(std::uint64_t group, std::uint64_t pool);
 
     Channel& channel;
     Trace::CompactWriter& writer;
     Symbols symbols;
-    std::vector<bool> knownPools;
+    const bool isOfPools;
+    std::vector<bool> knownPools;   // Groups of the heap that have begun.
+    std::set<std::uint64_t> pools;  // Of the library, alive.
     const std::chrono::steady_clock::time_point start = std::chrono::steady_clock::now();
     std::chrono::milliseconds nextTime{0};  // When the trace needs the time again.
     std::uint64_t lastThread = 0;

@@ -113,6 +113,27 @@ std::uint64_t EventTicks() {
     return least;
 }
 
+// The program that this one was before is over, and so are its threads: a slot that one of them has
+// not filled never will be. Once its last events are drained, its code is forgotten.
+void TakeOver(Channel& channel) {
+    const std::uint64_t head = channel.head.load();
+    for (std::uint64_t index = channel.tail.load(); index != head; ++index) {
+        if (!WaitForRoom(channel, index)) { return; }
+        const std::uint64_t what = channel.slots[index % numSlots].what.load();
+        if (what >> lapShift != Lap(index) >> lapShift) {
+            Fill(channel, index, 0, What(Op::Data, 0, 0));
+        }
+    }
+    Put(channel, Op::Executed, nullptr, 0, 0);
+    WaitForRoom(channel, head + numSlots);  // Room for so many is there once it is drained.
+    for (Caller& caller : channel.callers) {
+        caller.address.store(0);
+        caller.state.store(Caller::Unknown);
+    }
+    channel.modulesUsed.store(0);
+    channel.modulesLock.store(0);
+}
+
 }  // namespace
 
 void Attach() {
@@ -125,6 +146,7 @@ void Attach() {
         close(descriptor);
         RestoreEnvironment();
         if (channel != nullptr) {
+            if (channel->numExecs != 0) { TakeOver(*channel); }
             channel->timerTicks.store(TimerTicks());
             channel->eventTicks.store(EventTicks());
             Activate(channel);

@@ -12,6 +12,7 @@
 #include <chrono>
 #include <csignal>
 #include <cstdlib>
+#include <cstring>
 #include <ctime>
 #include <filesystem>
 #include <initializer_list>
@@ -51,6 +52,7 @@ public:
         channel = static_cast<Channel*>(memory);
         channel->magic = channelMagic;
         channel->parentPid = getpid();
+        channel->descriptor = descriptor.Number();
     }
     SharedChannel(const SharedChannel&) = delete;
     SharedChannel& operator=(const SharedChannel&) = delete;
@@ -64,6 +66,18 @@ private:
     System::Descriptor descriptor;
     Channel* channel = nullptr;
 };
+
+void Skip(Channel& channel, const std::vector<std::string>& patterns) {
+    std::size_t used = 0;
+    for (const std::string& pattern : patterns) {
+        const std::size_t size = pattern.size() + 1;
+        if (used + size >= sizeof(channel.skipped)) {
+            throw System::Failure(System::ownFailure, "--skip: the patterns are too long");
+        }
+        std::memcpy(channel.skipped + used, pattern.c_str(), size);
+        used += size;
+    }
+}
 
 // Signals that reach this process are taken one by one where it waits, and pass to the program.
 class Signals {
@@ -270,8 +284,8 @@ Outcome RecordProgram(const Order& order) {
 
     const SharedChannel channel;
     channel->by = order.by;
-    Collector collector(*channel, writer);
-    if (!order.pools) { writer.WriteOwned(); }
+    Skip(*channel, order.skipped);
+    Collector collector(*channel, writer, order.pools);
     const TickRate rate;
     const pid_t child =
         System::Start(order.command, [&] { Prepare(order, channel, recorder, signals); });
@@ -280,12 +294,13 @@ Outcome RecordProgram(const Order& order) {
     Outcome outcome;
     waitpid(child, &outcome.waitStatus, 0);
     writer.Finish();
-    if (channel->isTaken == 0) {
+    if (channel->isTaken == 0 && channel->numExecs == 0) {
         throw System::Failure(System::ownFailure, program +
                                                       ": has run, but did not load the "
                                                       "recorder: nothing recorded");
     }
     file.Commit();
+    outcome.isCutByExec = channel->isTaken == 0;
     outcome.isAddressSanitized = System::IsAddressSanitized(executed);
     outcome.numEvents = collector.NumEvents();
     outcome.numThreads = channel->numThreads;

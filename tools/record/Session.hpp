@@ -15,7 +15,8 @@ struct Order {
     std::vector<std::string> command;  // The program and its arguments.
     std::string tracePath;             // "-" is the standard output.
     By by = By::All;
-    bool pools = false;  // The calls of Mgr in place of the heap's.
+    std::vector<std::string> skipped;  // Patterns of functions that are no callers.
+    bool pools = false;                // The calls of Mgr in place of the heap's.
 };
 
 struct Outcome {
@@ -23,6 +24,7 @@ struct Outcome {
     std::uint64_t numEvents = 0;
     std::uint64_t numThreads = 0;
     std::uint64_t traceSize = 0;
+    bool isCutByExec = false;         // The program has become one that cannot be recorded.
     bool isAddressSanitized = false;  // The program is built with AddressSanitizer.
 };
 

@@ -7,6 +7,7 @@
 
 #include <cstdlib>
 #include <sstream>
+#include <string_view>
 
 namespace Recorder {
 
@@ -18,11 +19,30 @@ std::string Hex(std::uint64_t number) {
     return text.str();
 }
 
+// Without template arguments, which would fill a line by themselves, and without the hash that ends
+// a name of Rust.
+std::string Shortened(std::string_view name) {
+    constexpr std::size_t hashSize = std::string_view("::h0123456789abcdef").size();
+    if (name.size() > hashSize && name.substr(name.size() - hashSize, 3) == "::h") {
+        name.remove_suffix(hashSize);
+    }
+    std::string text;
+    int depth = 0;
+    for (std::size_t index = 0; index != name.size(); ++index) {
+        const bool isOperator = name.substr(0, index).find("operator") != std::string_view::npos;
+        if (isOperator && depth == 0) { return text.append(name.substr(index)); }
+        depth += name[index] == '<' ? 1 : 0;
+        if (depth == 0) { text += name[index]; }
+        depth -= name[index] == '>' && depth > 0 ? 1 : 0;
+    }
+    return text;
+}
+
 std::string Demangled(const char* symbol) {
     int status = 0;
     const std::unique_ptr<char, void (*)(void*)> name(
         abi::__cxa_demangle(symbol, nullptr, nullptr, &status), std::free);
-    return status == 0 ? name.get() : symbol;
+    return status == 0 ? Shortened(name.get()) : symbol;
 }
 
 void Close(Dwfl* file) {

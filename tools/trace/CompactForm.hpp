@@ -36,7 +36,8 @@ enum class Entry : std::uint8_t {
     Cleared,    // Pool.
     Allocated,  // Pool, block, size.
     Freed,      // Pool, block.
-    Owned,      // From here on the reader keeps each block's pool and thread, for Released.
+    Owned,      // From here on the reader keeps each block's pool and thread, for Released. Blocks
+                // from before are forgotten.
     Released,   // Block: freed from the pool it was allocated from. Ignored if there is none.
     Thread,     // The number of the thread of the following entries.
     Named,      // Pool, text.

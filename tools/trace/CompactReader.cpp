@@ -96,6 +96,7 @@ bool CompactReader::ReadEntry(Event& event) {
             return true;
         case Entry::Owned:
             isOwned = true;
+            owners.clear();
             return false;
         case Entry::Released:
             TakeBlock(tag, event);
