@@ -21,7 +21,7 @@ namespace {
 constexpr const char* description = "Run a program and write a trace of its allocations";
 
 constexpr const char* notes =
-    R"(The program runs unchanged, with a recorder loaded ahead of its libraries. Its output, its
+    R"(The program runs unchanged, with a recorder loaded before its libraries. Its output, its
 standard streams and its exit status are its own; if a signal kills it, mempool dies by the same.
 Signals sent to mempool go on to the program. What the program becomes by exec is recorded too, what
 it starts is not. A trace that was cut short, by Ctrl-C or a crash of the program, is a whole one.

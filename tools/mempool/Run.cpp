@@ -34,15 +34,15 @@ namespace Tool {
 namespace {
 
 constexpr const char* description =
-    "Run a program, and tell where its memory is and whether it would gain from pools";
+    "Run a program, and report where its memory is and whether it would gain from pools";
 
 constexpr const char* notes =
-    R"(The program runs as under 'mempool record', its trace goes to a file without a name in TMPDIR or
-/tmp, and behind the program's end comes what 'mempool report' and 'mempool advise' tell of it. All
-that goes to standard error: the program's own output stays as it is, and so does its exit status. If
-recording fails or the page cannot be written the status is 125, 126 or 127, as with 'mempool record'.
-The report has groups by caller, unless --by has others; the advice is that for one pool for them all.
-Ctrl-C ends the program, and what was recorded is told; once more ends that too.
+    R"(The program runs as under 'mempool record'. After it ends, mempool prints what 'mempool report' and
+'mempool advise' say about its trace, which is kept in a nameless file in TMPDIR or /tmp. All of this
+goes to standard error: the program's own output and exit status stay as they are. If recording fails
+or the page cannot be written, the status is 125, 126 or 127, as with 'mempool record'. The report is
+by caller unless --by says otherwise; the advice is for one pool for all groups. Ctrl-C ends the
+program, and mempool reports on what was recorded; a second one ends that too.
 )";
 
 struct Options {

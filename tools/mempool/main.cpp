@@ -34,7 +34,7 @@ bool CanWriteOutput() {
     return (fcntl(STDOUT_FILENO, F_GETFL) & O_ACCMODE) != O_RDONLY;
 }
 
-// Whether all that went to the standard output has got there, which only a flush can tell. The C
+// Whether all that went to the standard output has got there, which only a flush shows. The C
 // streams are asked too: a write through them does not change the state of the others.
 bool IsOutputWritten() {
     std::cout.flush();

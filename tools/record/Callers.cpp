@@ -1,7 +1,6 @@
 // Unwinding a stack takes thousands of cycles, far more than an allocation. So each return address
-// is unwound once: what lies between it and the next one on the stack is the same at every call,
-// but in a function that takes a part of the stack by a size of its own. Such a function is told as
-// the caller itself.
+// is unwound once: its distance to the next one on the stack is the same at every call. Only a
+// function that takes a variable part of the stack is an exception; it counts as the caller itself.
 
 #include "record/Callers.hpp"
 
@@ -42,8 +41,7 @@ Caller& Find(Channel& channel, std::uint64_t address) {
     return channel.callers[maxGroup];
 }
 
-// The calls that were not returned from, the innermost first. `stack` is the stack pointer behind
-// the return.
+// The active calls, the innermost first. `stack` is the stack pointer after the return.
 struct Frame {
     std::uint64_t address;
     std::uint64_t stack;
@@ -128,7 +126,7 @@ std::uint32_t FindModule(Channel& channel, const Dl_info& info) {
     return index < numModules ? index : 0;
 }
 
-// Fills the table's place for the address and tells whether it is one to be passed over.
+// Fills the table's place for the address. Returns whether the address is passed over.
 bool Enter(Channel& channel, Caller& caller, const Frame& frame, std::uint64_t frameSize) {
     std::uint64_t none = 0;
     if (!caller.address.compare_exchange_strong(none, frame.address)) {

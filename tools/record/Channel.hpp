@@ -13,7 +13,7 @@
 
 namespace Recorder {
 
-// Tells the recorder in the program the descriptor of the channel.
+// Holds the descriptor of the channel, for the recorder in the program.
 constexpr const char* channelVariable = "MEMPOOL_RECORD_CHANNEL";
 
 enum class By : std::uint32_t { All, Caller, Module, Thread };
@@ -35,10 +35,10 @@ enum class Op : std::uint8_t {
 // the size, the group, the op and the lap.
 struct Slot {
     std::atomic<std::uint64_t> where;
-    std::atomic<std::uint64_t> what;  // Stored last. Its lap tells that the slot is filled.
+    std::atomic<std::uint64_t> what;  // Stored last. Its lap shows that the slot is filled.
 };
 constexpr unsigned int addressShift = 16;
-constexpr std::uint64_t maxThread = 0xFFFF;  // Of all threads behind so many.
+constexpr std::uint64_t maxThread = 0xFFFF;  // Of all threads after so many.
 constexpr unsigned int sizeBits = 36;
 constexpr std::uint64_t maxSize =
     (std::uint64_t{1} << sizeBits) - 1;  // Stands for larger ones too.
@@ -64,7 +64,7 @@ struct Caller {
     std::uint32_t module;                // Index into the modules.
     std::uint64_t frameSize;             // Of Passed.
 };
-constexpr std::size_t numCallers = maxGroup + 1;  // The last is nobody's: it stands for all others.
+constexpr std::size_t numCallers = maxGroup + 1;  // The last stands for all others.
 
 struct Module {
     std::uint64_t base;

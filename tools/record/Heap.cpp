@@ -1,9 +1,9 @@
 // The calls of the malloc family, as the program sees them: each is passed on to the allocator that
-// the program would have without us, and told. Operator new and delete reach the allocator through
-// these calls too.
+// the program would have without the recorder, and recorded. Operator new and delete reach the
+// allocator through these calls too.
 //
-// A block is told once it is there, and its release before it goes: so nobody else can have told
-// its address in between.
+// A block is recorded after it is allocated and its release before it is freed. So no other thread
+// can record its address in between.
 
 #include <dlfcn.h>
 #include <malloc.h>
@@ -37,8 +37,8 @@ struct Next {
 Next next = {};
 std::atomic<bool> isReady = false;
 
-// Looking the calls up may itself take memory. It comes from here, and so does that for whoever
-// else comes that early; it is never given back and never told.
+// The memory that looking up the calls may take comes from here, as does that of any other call
+// before they are known. It is never given back and never recorded.
 alignas(16) char earlyMemory[std::size_t{1} << 17];
 std::atomic<std::size_t> earlyUsed = 0;
 
@@ -48,7 +48,7 @@ bool IsEarly(const void* block) {
     return __builtin_expect(offset < sizeof(earlyMemory), 0);
 }
 
-// The size stands ahead of the block.
+// The size is stored before the block.
 std::size_t EarlySize(const void* block) {
     std::size_t size = 0;
     std::memcpy(&size, static_cast<const char*>(block) - sizeof(size), sizeof(size));
@@ -110,8 +110,8 @@ struct CallSite {
         __builtin_return_address(0), __builtin_dwarf_cfa() \
     }
 
-inline void TellAllocated(Channel& channel, const void* block, std::size_t size,
-                          const CallSite& site) {
+inline void RecordAllocated(Channel& channel, const void* block, std::size_t size,
+                            const CallSite& site) {
     if (block == nullptr) { return; }
     const bool isByCaller = channel.by == By::Caller || channel.by == By::Module;
     const std::uint64_t group =
@@ -126,7 +126,7 @@ __attribute__((noinline)) void* AllocateTimed(Channel& channel, std::size_t size
     sample.EnterAllocator();
     void* const block = call();
     sample.LeaveAllocator();
-    TellAllocated(channel, block, size, site);
+    RecordAllocated(channel, block, size, site);
     return block;
 }
 
@@ -138,7 +138,7 @@ inline __attribute__((always_inline)) void* Allocate(std::size_t size, const Cal
     if (channel == nullptr) { return call(); }
     if (IsSampled()) { return AllocateTimed(*channel, size, site, call); }
     void* const block = call();
-    TellAllocated(*channel, block, size, site);
+    RecordAllocated(*channel, block, size, site);
     return block;
 }
 
@@ -173,9 +173,9 @@ void* Reallocate(void* block, std::size_t size, const CallSite& site) {
     if (channel == nullptr) { return next.Realloc(block, size); }
     Put(*channel, Op::Released, block, 0, 0);
     void* const moved = Allocate(size, site, [=] { return next.Realloc(block, size); });
-    // One that fails leaves the block where it was; how large it was asked for nobody knows.
+    // One that fails leaves the block where it was. The size once asked for is not known.
     if (moved == nullptr && size != 0) {
-        TellAllocated(*channel, block, next.UsableSize(block), site);
+        RecordAllocated(*channel, block, next.UsableSize(block), site);
     }
     return moved;
 }

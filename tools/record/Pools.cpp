@@ -1,8 +1,8 @@
 // The calls of OBR::MemPool::Mgr, as a program sees them that uses the shared library: each is
-// passed on to the library and told. The functions bear the names of the library's exports.
+// passed on to the library and recorded. The functions have the names of the library's exports.
 //
-// A pool is for one thread at a time, so that a call is told once it is done; but the end of a pool
-// is told ahead of it, since another may be built at its address at once.
+// A pool is for one thread at a time, so a call is recorded once it is done. Only the end of a pool
+// is recorded before: another pool may be built at its address at once.
 
 #include <dlfcn.h>
 
@@ -48,7 +48,7 @@ bool IsEnabled(const void* mgr) {
     return next(mgr);
 }
 
-// An event with a block: what is behind the first slot is filled ahead of it.
+// An event with a block: the slot after the first is filled before it.
 void PutBlock(Channel& channel, Op op, const void* mgr, const void* block, std::uint64_t size) {
     std::uint64_t index = 0;
     if (!Take(channel, 2, index)) { return; }

@@ -26,14 +26,14 @@ void Forget(char** place) {
     do { place[0] = place[1]; } while (*place++ != nullptr);
 }
 
-// The text behind "NAME=" in a variable of that name, or null.
+// The text after "NAME=" in a variable of that name, or null.
 char* ValueOf(char* variable, const char* name) {
     const std::size_t size = std::strlen(name);
     return std::strncmp(variable, name, size) == 0 && variable[size] == '=' ? variable + size + 1
                                                                             : nullptr;
 }
 
-// What the program executes shall find the environment as it was before: the recorder is the first
+// What the program executes finds the environment as it was before: the recorder is the first
 // of those preloaded.
 void RestoreEnvironment() {
     for (char** place = environ; *place != nullptr;) {
@@ -93,7 +93,7 @@ std::uint64_t TimerTicks() {
     });
 }
 
-// What so many events cost, from a channel that nobody drains. Its memory is touched for the first
+// What so many events cost, from a channel that is not drained. Its memory is touched for the first
 // time, as that of the true channel.
 std::uint64_t EventTicks() {
     void* const memory = mmap(nullptr, sizeof(Channel), PROT_READ | PROT_WRITE,
@@ -166,8 +166,8 @@ void NumberThread(Channel& channel) {
     threadState.random = number;
 }
 
-// Sleeps until the slot is drained. A channel that nobody drains any more is given up: the program
-// goes on without.
+// Sleeps until the slot is drained. If the process that drains the channel is gone, the recorder
+// gives up, and the program goes on unrecorded.
 bool WaitForRoom(Channel& channel, std::uint64_t index) {
     const int oldErrno = errno;
     const timespec limit = {0, 100000000};

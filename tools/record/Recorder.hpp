@@ -86,7 +86,7 @@ inline void Put(Channel& channel, Op op, const void* block, std::uint64_t size,
 }
 
 // Whether this call is one to be timed. Two calls in a row are, of which the second counts: the
-// code that times is rarely run, and the first would tell how slow it is when it is not in the
+// code that times is rarely run, and the first would show how slow it is when it is not in the
 // cache.
 inline bool IsSampled() {
     if (__builtin_expect(threadState.countdown != 0, 1)) {
@@ -97,7 +97,7 @@ inline bool IsSampled() {
 }
 
 // Times the allocator's part of a call. What the recorder takes around it is not sampled: within
-// the rest of a program it overlaps with that, and costs a fraction of what a clock would tell.
+// the rest of a program it overlaps with that, and costs a fraction of what a clock would show.
 class Sample {
 public:
     explicit Sample(Channel& toChannel) : channel(toChannel) {}

@@ -88,13 +88,13 @@ public:
             sigaddset(&taken, number);
         }
         sigset_t blocked = taken;
-        sigaddset(&blocked, SIGPIPE);  // A trace into a pipe that nobody reads is a failed write.
+        sigaddset(&blocked, SIGPIPE);  // A write into a broken pipe fails instead.
         sigprocmask(SIG_BLOCK, &blocked, &former);
     }
     Signals(const Signals&) = delete;
     Signals& operator=(const Signals&) = delete;
     ~Signals() {
-        // The write that failed is told as such.
+        // The failed write is reported as such.
         sigset_t broken = {};
         sigaddset(&broken, SIGPIPE);
         const timespec atOnce = {};

@@ -29,8 +29,8 @@ inline std::uint64_t Ticks() {
 #endif
 }
 
-// The time at which the code ahead of this is done. A processor that runs instructions out of order
-// reads a counter before a short call that it stands behind has returned.
+// The time at which the code before this is done. A processor that runs instructions out of order
+// may read a counter before a short call in front of it has returned.
 inline std::uint64_t TicksWhenDone() {
 #if defined(__x86_64__)
     _mm_lfence();
