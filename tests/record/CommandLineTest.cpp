@@ -79,6 +79,7 @@ TEST(CommandLine, TakesFromTheEnvironmentWhatItSays) {
               Shell::Output(mempool + "report --help"));
     EXPECT_EQ(report("NUV_OBR_MEMPOOL_BUCKET_SIZE=2000 NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS=1"),
               report("", "--bucket-size 2000 --keep-empty"));
+    EXPECT_EQ(report("NUV_OBR_MEMPOOL_MIN_RECORD_SIZE=4"), report("", "--min-record 4"));
     EXPECT_EQ(report("NUV_OBR_MEMPOOL_BUCKET_SIZE=no", "--bucket-size 4010"), plain);
     EXPECT_EQ(report("NUV_OBR_MEMPOOL_MIN_RECORD_SIZE=3", "", 1),
               "mempool: NUV_OBR_MEMPOOL_MIN_RECORD_SIZE: 3 is not between 4 and 65535\n"
