@@ -25,6 +25,8 @@ double Replay::ProcessorNanoseconds() {
 
 namespace {
 
+using Replay::Layer;
+
 Replay::Recording Record(const std::string& shorthand) {
     OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);
     Trace::StepReader reader(ReadLines(Lines(shorthand)), "lines");
@@ -67,7 +69,7 @@ TEST(Recording, MergesGroupsButNoPools) {
 // The pools are clocked twice, the heap twice more for what it frees at the end of a pool.
 TEST(Measure, ChargesEachSideWithTheTimeOfItsEvents) {
     const Replay::Recording recording = Record("@c:P\n@a:P:X:8\n@x:P\n@a:P:X:8\n@d:P\n");
-    EXPECT_DOUBLE_EQ(Replay::PoolNanosecondsPerEvent(recording), 2. / 5);
+    EXPECT_DOUBLE_EQ(Replay::PoolNanosecondsPerEvent(recording, Layer::Heap), 2. / 5);
     EXPECT_DOUBLE_EQ(Replay::HeapNanosecondsPerEvent(recording), (4. + 6) / 5);
 }
 
@@ -76,13 +78,36 @@ TEST(Measure, CountsWhatIsHeldAndGivesAllOfItBack) {
         Record("@c:P\n@a:P:X:5000\n@x:P\n@c:Q\n@a:Q:X:6000\n@d:Q\n@a:P:X:6000\n@a:P:Y:1025\n");
     EXPECT_EQ(Replay::BytesHeldByHeap(recording), Taken(6000) + Taken(1025))
         << "In place of the bytes asked for.";
-    EXPECT_NEAR(static_cast<double>(Replay::BytesHeldByPools(recording)),
+    EXPECT_NEAR(static_cast<double>(Replay::BytesHeldByPools(recording, Layer::Mgr)),
                 6000 + 1025 + 2 * 24 + 249 * 8 + 400, 400);
 
     HeapCount::Start();
-    Replay::PoolNanosecondsPerEvent(recording);
+    for (const Layer layer : {Layer::Heap, Layer::Malloc, Layer::Mgr}) {
+        Replay::PoolNanosecondsPerEvent(recording, layer);
+    }
     Replay::HeapNanosecondsPerEvent(recording);
     EXPECT_EQ(HeapCount::Stop(), 0);
+}
+
+// 1000 blocks of 24 bytes with the header of a record: 28 bytes as they are; 4 more to be aligned
+// to 8, 12 more to be aligned to 16. One of 984 bytes is the largest that the malloc layer takes
+// from its pool.
+TEST(Measure, ChargesABlockWithWhatItsLayerTakes) {
+    std::string lines = "@c:P\n";
+    for (int i = 0; i < 1000; ++i) {
+        lines += "@a:P:" + std::to_string(1000000000000000 + i) + ":24\n";
+    }
+    const Replay::Recording recording = Record(lines);
+    const auto held = [&](Layer layer) {
+        return static_cast<double>(Replay::BytesHeldByPools(recording, layer)) / 1000;
+    };
+    EXPECT_NEAR(held(Layer::Mgr), 28 + 3.5, 1.5);
+    EXPECT_NEAR(held(Layer::Heap), 32 + 3.5, 1.5);
+    EXPECT_NEAR(held(Layer::Malloc), 40 + 3.5, 1.5);
+    const auto one = [&](const std::string& size) {
+        return Replay::BytesHeldByPools(Record("@c:P\n@a:P:X:" + size + "\n"), Layer::Malloc);
+    };
+    EXPECT_GT(one("984"), one("985") + 2000);
 }
 
 }  // namespace

@@ -125,6 +125,7 @@ TEST(Replay, RefusesACommandLineThatMakesNoSense) {
                                "--alignment 0", "--alignment 65536"}) {
         EXPECT_THAT(Tool(std::string(option) + " x", 1), HasSubstr(" is not between "));
     }
+    EXPECT_THAT(Tool("--layer arena x", 1), HasSubstr("--layer"));
 }
 
 // One step more or less, and the library would stop the process.
@@ -133,10 +134,12 @@ TEST(Replay, RefusesSettingsThatMakeNoPool) {
     for (const char* options :
          {"--bucket-size 1004", "--alignment 3 --bucket-size 1003", "--min-record 997",
           "--max-record 32767 --bucket-size 32768", "--max-record 4 --min-record 4"}) {
-        EXPECT_THAT(Tool(options + (" --rounds 1 " + path)), HasSubstr("ns per event")) << options;
+        EXPECT_THAT(Tool(options + (" --layer mgr --rounds 1 " + path)), HasSubstr("ns per event"))
+            << options;
     }
-    for (const char* options : {"--bucket-size 1003", "--alignment 3 --bucket-size 1002",
-                                "--bucket-size 3", "--min-record 1001", "--max-record 3"}) {
+    for (const char* options : {"--bucket-size 1003", "--alignment 3 --bucket-size 1003",
+                                "--layer mgr --alignment 3 --bucket-size 1002", "--bucket-size 3",
+                                "--min-record 1001", "--max-record 3"}) {
         EXPECT_THAT(Tool(options + (" " + path), 1),
                     HasSubstr("mempool: these settings make no pool: "));
     }
@@ -178,7 +181,7 @@ TEST(Replay, CountsWhatIsHeldAtThePeak) {
         File("held", Lines("@c:P\n@a:P:X:200\n@f:P:X:\n@a:P:X:1992\n@a:P:Y:24\n@f:P:X:\n") +
                          Lines("@a:P:X:5000\n@f:P:X:\n@a:P:X:56\n"));
     const auto held = [&](const std::string& options) {
-        return Find(Tool("--rounds 1 " + options + path), "bytes held at the peak");
+        return Find(Tool("--layer mgr --rounds 1 " + options + path), "bytes held at the peak");
     };
     const Figures figures = held("");
     EXPECT_NEAR(figures.heap, 5000 + 24 + 2 * 8, 16) << "A free block may be split off or not.";
@@ -192,7 +195,7 @@ TEST(Replay, BuildsPoolsByOptionsAndEnvironment) {
     const std::string path = File("dbg", Lines("@c:P\n@a:P:X:24\n@a:P:Y:10\n@f:P:X:\n"));
     EXPECT_THAT(Tool(path), Not(HasSubstr("MemPool::Mgr")));
     const std::string report =
-        Tool("--dbg --bucket-size 600 --max-record 300 --min-record 16 " + path, 0,
+        Tool("--layer mgr --dbg --bucket-size 600 --max-record 300 --min-record 16 " + path, 0,
              {{"NUV_OBR_MEMPOOL_TRACE", "1"},
               {"NUV_OBR_MEMPOOL_BUCKET_SIZE", "700"},
               {"NUV_OBR_MEMPOOL_DATA_ALIGNMENT", "2"}});

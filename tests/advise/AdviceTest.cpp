@@ -30,13 +30,13 @@ std::string Verdict(const Advise::Advice& advice) {
 }
 
 TEST(Advice, IsForOnePoolOrForThoseOfTheTrace) {
-    const auto bytes = [](Advise::Pools pools) {
+    const auto bytes = [](bool mergesGroups) {
         Trace::StepReader reader(ReadLines(Lines("@c:P\n@a:P:X:24\n@c:Q\n@a:Q:Y:24\n")), "trace");
-        const Advise::Advice advice = Advise::TakeAdvice(
-            reader, 0.1, [](auto&) {}, pools);
+        const auto advice = Advise::TakeAdvice(reader, {Replay::Layer::Heap, mergesGroups, 0.1},
+                                               [](const std::string&) {});
         return advice.findings.settings.at(0).figures.bytesHeld;
     };
-    EXPECT_NEAR(bytes(Advise::Pools::AsTraced), 2 * bytes(Advise::Pools::One), 300);
+    EXPECT_NEAR(bytes(false), 2 * bytes(true), 300);
 }
 
 TEST(Advice, IsPrintedWithLinesToPasteIfPoolsHelp) {
@@ -45,6 +45,9 @@ TEST(Advice, IsPrintedWithLinesToPasteIfPoolsHelp) {
     EXPECT_THAT(text, HasSubstr("\n    export NUV_OBR_MEMPOOL_BUCKET_SIZE=506\n"));
     EXPECT_THAT(text, HasSubstr("\n        .BucketSize(506)\n"));
     EXPECT_THAT(Verdict(Advice(2500)), Not(HasSubstr("BUCKET")));
+    Advise::Advice preloaded = Advice(900);
+    preloaded.layer = Replay::Layer::Malloc;
+    EXPECT_THAT(Verdict(preloaded), Not(HasSubstr("in code")));
 
     std::ostringstream table;
     Tool::PrintTable(table, Advice(900), false);

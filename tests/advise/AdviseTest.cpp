@@ -55,9 +55,10 @@ TEST(Advise, TextFiguresVerdictAndEnvironmentAgree) {
     std::set<std::string> keys;
     for (const auto& [key, value] : advice.items()) { keys.insert(key); }
     EXPECT_EQ(keys,
-              (std::set<std::string>{"events", "events_left_out", "heap", "settings", "fastest",
-                                     "smallest", "advised", "best", "verdict", "price", "sentences",
-                                     "environment", "allocation_share"}));
+              (std::set<std::string>{"layer", "events", "events_left_out", "heap", "settings",
+                                     "fastest", "smallest", "advised", "best", "verdict", "price",
+                                     "sentences", "environment", "allocation_share"}));
+    EXPECT_EQ(advice["layer"], "heap");
     EXPECT_EQ(advice["events"], 6001);
     EXPECT_EQ(advice["events_left_out"], 0);
     EXPECT_EQ(advice["allocation_share"], 0.25);

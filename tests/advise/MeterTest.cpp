@@ -63,7 +63,7 @@ TEST(ForkedMeter, ReplaysWithTheSettingsAskedFor) {
     recording.peakSteps = recording.steps.size();
     const Replay::PoolSettings before = Replay::PoolSettings::OfProcess();
 
-    Advise::ForkedMeter meter(recording);
+    Advise::ForkedMeter meter(recording, Replay::Layer::Mgr);
     EXPECT_NEAR(*meter.Held(std::nullopt).figure, 112000, 8000);
     const auto held = [&](unsigned int bucketSize, unsigned int alignment) {
         return *meter.Held(Replay::PoolSettings{bucketSize, 500, 8, alignment, false}).figure;

@@ -130,8 +130,9 @@ TEST(Quantile, LiesBetweenTheNearestTwo) {
 }
 
 TEST(Verdict, SettingsArePastedAsEnvironmentAndAsCode) {
+    const Replay::PoolSettings settings = {2010, 500, 16, 8, true};
     std::string variables;
-    for (const auto& [name, value] : Advise::EnvironmentOf({2010, 500, 16, 8, true})) {
+    for (const auto& [name, value] : Advise::EnvironmentOf(settings)) {
         variables += name.substr(name.find("_ME")) + "=" + value + " ";
     }
     EXPECT_EQ(
@@ -139,11 +140,13 @@ TEST(Verdict, SettingsArePastedAsEnvironmentAndAsCode) {
         "_MEMPOOL_ON=1 _MEMPOOL_BUCKET_SIZE=2010 _MEMPOOL_MAX_RECORD_SIZE=500 "
         "_MEMPOOL_MIN_RECORD_SIZE=16 _MEMPOOL_DATA_ALIGNMENT=8 _MEMPOOL_KEEP_EMPTY_BUCKETS=1 ");
     std::string code;
-    for (const std::string& line : Advise::CodeOf({2010, 500, 16, 8, true})) { code += line; }
+    for (const std::string& line : Advise::CodeOf(settings, Replay::Layer::Heap)) { code += line; }
     EXPECT_EQ(code,
               "OBR::MemPool::HeapSettings()    .On(true)    .BucketSize(2010)    "
               ".MaxRecordSize(500)    .MinRecordSize(16)    .DataAlignment(8)    "
               ".KeepEmptyBuckets(true)");
+    EXPECT_EQ(Advise::CodeOf(settings, Replay::Layer::Mgr).at(1),
+              "OBR::MemPool::NUV_OBR_MEMPOOL_BUCKET_SIZE(2010);");
 }
 
 }  // namespace

@@ -11,24 +11,26 @@
 
 namespace Advise {
 
-Advice TakeAdvice(Trace::StepReader& reader, double seconds,
-                  const std::function<void(const std::string&)>& show, Pools pools) {
+Advice TakeAdvice(Trace::StepReader& reader, const Question& question,
+                  const std::function<void(const std::string&)>& show) {
     Replay::Recording recording = Replay::ReadRecording(
-        reader, [&](auto position) { show(fmt::format("event {}", position)); }, MaxSteps(seconds));
+        reader, [&](auto position) { show(fmt::format("event {}", position)); },
+        MaxSteps(question.seconds));
     if (recording.peakBlocks == 0) {
         throw std::runtime_error(reader.Name() + ": no block was allocated");
     }
-    if (pools == Pools::One) { Replay::MergePools(recording); }
+    if (question.mergesGroups) { Replay::MergePools(recording); }
 
     Advice advice;
+    advice.layer = question.layer;
     advice.program.numEvents = recording.steps.size();
     advice.program.numLeftOut = recording.numLeftOut;
     const auto share = reader.Facts().find("allocation_share");
     if (share != reader.Facts().end()) { advice.program.allocationShare = ShareOf(share->second); }
-    ForkedMeter meter(recording);
-    advice.findings = Search(meter, seconds, [&](std::size_t numTried) {
+    ForkedMeter meter(recording, question.layer);
+    advice.findings = Search(meter, question.seconds, [&](std::size_t numTried) {
         show(fmt::format("{} settings tried, {:.0f} s of about {}", numTried, meter.Elapsed(),
-                         seconds));
+                         question.seconds));
     });
     advice.verdict = Judge(advice.findings, advice.program);
     return advice;

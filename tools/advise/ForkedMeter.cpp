@@ -117,8 +117,11 @@ Outcome InChild(const std::function<double()>& work, double processorSeconds) {
     return {std::nullopt, ProblemOf(status)};
 }
 
-ForkedMeter::ForkedMeter(const Replay::Recording& replayed, double limit)
-    : recording(replayed), mostOfHeapTime(limit), start(std::chrono::steady_clock::now()) {
+ForkedMeter::ForkedMeter(const Replay::Recording& replayed, Replay::Layer measured, double limit)
+    : recording(replayed),
+      layer(measured),
+      mostOfHeapTime(limit),
+      start(std::chrono::steady_clock::now()) {
 #ifdef __GLIBC__
     malloc_trim(0);  // What reading the trace has left over is not for the replays to use up.
 #endif
@@ -135,7 +138,7 @@ Outcome ForkedMeter::Time(const Side& side) {
     return Run(side, [&] {
         double total = 0;
         for (unsigned int replay = 0; replay < numReplays; ++replay) {
-            total += side.has_value() ? Replay::PoolNanosecondsPerEvent(recording)
+            total += side.has_value() ? Replay::PoolNanosecondsPerEvent(recording, layer)
                                       : Replay::HeapNanosecondsPerEvent(recording);
         }
         return total / numReplays;
@@ -144,7 +147,7 @@ Outcome ForkedMeter::Time(const Side& side) {
 
 Outcome ForkedMeter::Held(const Side& side) {
     return Run(side, [&] {
-        return static_cast<double>(side.has_value() ? Replay::BytesHeldByPools(recording)
+        return static_cast<double>(side.has_value() ? Replay::BytesHeldByPools(recording, layer)
                                                     : Replay::BytesHeldByHeap(recording));
     });
 }

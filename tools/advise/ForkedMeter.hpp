@@ -9,6 +9,7 @@
 #include <functional>
 
 #include "advise/Meter.hpp"
+#include "replay/Layer.hpp"
 #include "replay/Recording.hpp"
 
 namespace Advise {
@@ -21,7 +22,7 @@ class ForkedMeter final : public Meter {
 public:
     // The recording must have an event, and live as long as this. A replay of the pools that takes
     // more than `limit` times the time of the heap, and more than a while, is stopped.
-    explicit ForkedMeter(const Replay::Recording& replayed, double limit = 8);
+    ForkedMeter(const Replay::Recording& replayed, Replay::Layer measured, double limit = 8);
 
     Outcome Time(const Side& side) override;
     Outcome Held(const Side& side) override;
@@ -31,6 +32,7 @@ private:
     Outcome Run(const Side& side, const std::function<double()>& work);
 
     const Replay::Recording& recording;
+    const Replay::Layer layer;
     const double mostOfHeapTime;
     const std::chrono::steady_clock::time_point start;
     unsigned int numReplays = 1;  // In a child that measures time.

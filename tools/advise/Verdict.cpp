@@ -220,14 +220,19 @@ std::vector<std::pair<std::string, std::string>> EnvironmentOf(
     return variables;
 }
 
-std::vector<std::string> CodeOf(const Replay::PoolSettings& settings) {
-    std::vector<std::string> lines = {"OBR::MemPool::HeapSettings()", "    .On(true)"};
+std::vector<std::string> CodeOf(const Replay::PoolSettings& settings, Replay::Layer layer) {
+    const bool isForHeap = layer == Replay::Layer::Heap;
+    std::vector<std::string> lines;
+    if (layer == Replay::Layer::Malloc) { return lines; }
+    if (isForHeap) { lines = {"OBR::MemPool::HeapSettings()", "    .On(true)"}; }
+    if (!isForHeap) { lines = {"OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);"}; }
     for (const auto& row : OBR::MemPool::SettingTable::all) {
         const unsigned int value = row.In(settings);
         const std::string argument = !row.IsFlag() ? std::to_string(value)
                                      : value != 0  ? "true"
                                                    : "false";
-        lines.push_back(std::string("    .") + row.word + "(" + argument + ")");
+        lines.push_back(isForHeap ? fmt::format("    .{}({})", row.word, argument)
+                                  : fmt::format("OBR::MemPool::{}({});", row.variable, argument));
     }
     return lines;
 }

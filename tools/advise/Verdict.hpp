@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "advise/Figures.hpp"
+#include "replay/Layer.hpp"
 
 namespace Advise {
 
@@ -52,10 +53,10 @@ Verdict Judge(const Findings& findings, const Program& program);
 std::optional<double> ShareOf(const std::string& text);
 
 // The settings to paste: variables of the environment, in the order in which they are read, and
-// C++.
+// lines of C++, none for a layer that needs none.
 std::vector<std::pair<std::string, std::string>> EnvironmentOf(
     const Replay::PoolSettings& settings);
-std::vector<std::string> CodeOf(const Replay::PoolSettings& settings);
+std::vector<std::string> CodeOf(const Replay::PoolSettings& settings, Replay::Layer layer);
 
 }  // namespace Advise
 

@@ -118,10 +118,9 @@ void PrintVerdict(std::ostream& out, const Advice& advice) {
     for (const auto& [name, value] : Advise::EnvironmentOf(advised.settings)) {
         fmt::print(out, "    export {}={}\n", name, value);
     }
-    out << "\nor, in code:\n\n";
-    for (const std::string& line : Advise::CodeOf(advised.settings)) {
-        fmt::print(out, "    {}\n", line);
-    }
+    const std::vector<std::string> code = Advise::CodeOf(advised.settings, advice.layer);
+    if (!code.empty()) { out << "\nor, in code:\n\n"; }
+    for (const std::string& line : code) { fmt::print(out, "    {}\n", line); }
 }
 
 }  // namespace Tool

@@ -44,7 +44,6 @@ the program   'mempool record' estimates which share of its time its allocation 
               changes less than 1 % of the program's time is neither a gain nor a price.
 
 No block is written to: that blocks which lie closer together can be faster to use is not measured.
-The pools are those of Mgr, with blocks aligned to 4 bytes; a Heap takes 4 to 8 bytes per block more.
 docs/advisor.md describes the keys of --json.
 )";
 
@@ -52,6 +51,7 @@ struct Options {
     std::string path;
     bool json = false;
     unsigned int seconds = 30;
+    Replay::Layer layer = Replay::Layer::Heap;
 };
 
 template <typename Value>
@@ -67,7 +67,7 @@ void AddFigures(nlohmann::ordered_json& object, const Advise::Figures& figures) 
 
 nlohmann::ordered_json JsonOf(const Advise::Advice& advice) {
     using nlohmann::ordered_json;
-    const auto& [program, findings, verdict] = advice;
+    const auto& [layer, program, findings, verdict] = advice;
     ordered_json heap;
     AddFigures(heap, findings.heap);
     ordered_json settings = ordered_json::array();
@@ -86,7 +86,8 @@ nlohmann::ordered_json JsonOf(const Advise::Advice& advice) {
             environment[name] = value;
         }
     }
-    return {{"events", program.numEvents},
+    return {{"layer", NameOf(layer)},
+            {"events", program.numEvents},
             {"events_left_out", program.numLeftOut},
             {"heap", heap},
             {"settings", settings},
@@ -104,8 +105,9 @@ nlohmann::ordered_json JsonOf(const Advise::Advice& advice) {
 int AdviseOn(const Options& options) {
     Trace::StepReader reader(options.path);
     const Progress progress(reader.Name());
-    const Advise::Advice advice = Advise::TakeAdvice(
-        reader, options.seconds, [&](const std::string& text) { progress.Show(text); });
+    const Advise::Advice advice =
+        Advise::TakeAdvice(reader, {options.layer, false, 0. + options.seconds},
+                           [&](const std::string& text) { progress.Show(text); });
     progress.Clear();
     if (options.json) {
         std::cout << JsonOf(advice).dump(2) << '\n';
@@ -130,6 +132,7 @@ void AddAdvise(Program& program) {
         ->required()
         ->type_name("");
     advise.add_flag("--json", options->json, "Print all figures as JSON");
+    AddLayer(advise, options->layer);
     AddSeconds(advise, options->seconds);
     advise.callback(
         [&program, options] { program.job = [options] { return AdviseOn(*options); }; });

@@ -42,7 +42,10 @@ NUV_OBR_MEMPOOL_TRACE=1, plain or compressed by gzip. Of text only lines "xmpt:.
 A setting without an option here is that of its environment variable, such as
 NUV_OBR_MEMPOOL_BUCKET_SIZE.
 
-pool          One enabled pool for each traced pool.
+pool          What --layer says. heap: an OBR::MemPool::Heap for each traced pool, its blocks aligned
+              to 8 bytes. mgr: an OBR::MemPool::Mgr for each, blocks aligned to 4 bytes or less.
+              malloc: what 'mempool try' preloads, one Heap for all, blocks aligned to 16 bytes and
+              those above the largest record left to the C library.
 heap          operator new[] and delete[]. What a pool drops is freed on the heap too, block by
               block; at a pool's end that time is not counted. No block is written to.
 the peak      The moment with the most bytes asked for.
@@ -61,6 +64,7 @@ bad lines     Left out of the replay. The library's own trace does not show Mgr:
 struct Options {
     bool sweep = false;
     unsigned int seconds = 30;
+    Replay::Layer layer = Replay::Layer::Heap;
     Replay::PoolSettings settings;
     std::vector<std::string> paths;
     unsigned int rounds = 11;
@@ -85,7 +89,7 @@ int Compare(const std::string& path, const Options& options) {
         reader, [&](auto position) { progress.Show(fmt::format("line {}", position)); });
     if (recording.steps.empty()) { throw std::runtime_error(reader.Name() + ": no event"); }
 
-    Advise::ForkedMeter meter(recording, std::numeric_limits<double>::infinity());
+    Advise::ForkedMeter meter(recording, options.layer, std::numeric_limits<double>::infinity());
     const double poolBytes = meter.Held(options.settings).OrFail(reader.Name());
     const double heapBytes = meter.Held(std::nullopt).OrFail(reader.Name());
     std::vector<double> pool;
@@ -100,7 +104,7 @@ int Compare(const std::string& path, const Options& options) {
     std::cout << reader.Name() << '\n';
     PrintBadLines(std::cout, reader.Name(), reader.Bad());
     if (options.dbg) {
-        Replay::BytesHeldByPools(recording, [] { OBR::MemPool::Dbg(); });
+        Replay::BytesHeldByPools(recording, options.layer, [] { OBR::MemPool::Dbg(); });
     }
     Table table({{"", 0, Align::Left}, {"pool", 10}, {"heap", 10}, {"pool/heap", 10}});
     const auto addSame = [&](const char* label, std::uint64_t value) {
@@ -125,8 +129,9 @@ int Compare(const std::string& path, const Options& options) {
 int Sweep(const std::string& path, const Options& options) {
     Trace::StepReader reader(path);
     const Progress progress(reader.Name());
-    const Advise::Advice advice = Advise::TakeAdvice(
-        reader, options.seconds, [&](const std::string& text) { progress.Show(text); });
+    const Advise::Advice advice =
+        Advise::TakeAdvice(reader, {options.layer, false, 0. + options.seconds},
+                           [&](const std::string& text) { progress.Show(text); });
     progress.Clear();
     std::cout << reader.Name() << '\n';
     PrintBadLines(std::cout, reader.Name(), reader.Bad());
@@ -137,7 +142,7 @@ int Sweep(const std::string& path, const Options& options) {
 
 int ReplayAll(const Options& options) {
     if (!options.sweep) {
-        CheckSettings(options.settings);
+        CheckSettings(Replay::InLayer(options.settings, options.layer));
         Replay::UsePools(options.settings);
     }
     int status = EXIT_SUCCESS;
@@ -179,6 +184,7 @@ void AddReplay(Program& program) {
                     "Files to replay, one after the other; - is standard input")
         ->required()
         ->type_name("");
+    AddLayer(replay, options->layer);
     AddSettings(replay, options->settings);
     AddNumber(replay, "--rounds", options->rounds, 1, 1000000, "Timed replays a side");
     replay.add_flag("--dbg", options->dbg, "Print the report of each pool at the peak");

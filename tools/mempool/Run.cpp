@@ -51,6 +51,7 @@ struct Options {
     Recorder::Order order;
     std::string html;
     unsigned int seconds = 15;
+    Replay::Layer layer = Replay::Layer::Malloc;
 };
 
 // A file that never has a name for longer than it takes to open it: however this process ends,
@@ -102,9 +103,9 @@ void ReportOn(const NamelessFile& trace, const Options& options, System::OutputF
 void AdviseOn(const NamelessFile& trace, const Options& options) {
     Trace::StepReader reader = Open(trace, options);
     const Progress progress("mempool");
-    const Advise::Advice advice = Advise::TakeAdvice(
-        reader, options.seconds, [&](const std::string& text) { progress.Show(text); },
-        options.order.pools ? Advise::Pools::AsTraced : Advise::Pools::One);
+    const Advise::Advice advice =
+        Advise::TakeAdvice(reader, {options.layer, !options.order.pools, 0. + options.seconds},
+                           [&](const std::string& text) { progress.Show(text); });
     progress.Clear();
     std::cerr << '\n';
     PrintTable(std::cerr, advice, false);
@@ -142,6 +143,7 @@ void AddRun(Program& program) {
     AddRecordOptions(run, options->order);
     run.add_option("--html", options->html, "Write the page of the report to FILE too")
         ->type_name("FILE");
+    AddLayer(run, options->layer);
     AddSeconds(run, options->seconds);
     run.callback([&program, options] {
         options->order.command = program.command;

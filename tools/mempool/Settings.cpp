@@ -1,6 +1,8 @@
 #include "mempool/Settings.hpp"
 
+#include <algorithm>
 #include <cstdlib>
+#include <map>
 #include <stdexcept>
 #include <string>
 
@@ -9,6 +11,13 @@
 #include "mempool/CommandLine.hpp"
 
 namespace Tool {
+
+namespace {
+
+const std::map<std::string, Replay::Layer> layers = {
+    {"heap", Replay::Layer::Heap}, {"malloc", Replay::Layer::Malloc}, {"mgr", Replay::Layer::Mgr}};
+
+}  // namespace
 
 void AddSettings(CLI::App& subcommand, OBR::MemPool::PoolSettings& settings) {
     for (const OBR::MemPool::Setting& row : OBR::MemPool::SettingTable::all) {
@@ -35,6 +44,18 @@ void TakeEnvironment(const CLI::App& subcommand, OBR::MemPool::PoolSettings& set
             settings.*row.size = number;
         }
     }
+}
+
+void AddLayer(CLI::App& subcommand, Replay::Layer& layer) {
+    subcommand.add_option("--layer", layer, "What serves the blocks in place of malloc")
+        ->type_name("LAYER")
+        ->transform(CLI::Transformer(layers))
+        ->default_str(NameOf(layer));
+}
+
+const char* NameOf(Replay::Layer layer) {
+    const auto isIt = [layer](const auto& each) { return each.second == layer; };
+    return std::find_if(layers.begin(), layers.end(), isIt)->first.c_str();
 }
 
 void AddSeconds(CLI::App& subcommand, unsigned int& seconds) {

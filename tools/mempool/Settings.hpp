@@ -6,6 +6,8 @@
 #include <CLI/CLI.hpp>
 #include <MemPoolSettings>
 
+#include "replay/Layer.hpp"
+
 namespace Tool {
 
 // Adds an option for each setting, which stores it in `settings`. The others keep their values.
@@ -14,6 +16,12 @@ void AddSettings(CLI::App& subcommand, OBR::MemPool::PoolSettings& settings);
 // Takes the settings for which no option was given from the environment, for the callback of the
 // subcommand. A bad value is an error like a bad option.
 void TakeEnvironment(const CLI::App& subcommand, OBR::MemPool::PoolSettings& settings);
+
+// Adds --layer, what is measured beside the heap.
+void AddLayer(CLI::App& subcommand, Replay::Layer& layer);
+
+// The name of a layer, as --layer takes it.
+const char* NameOf(Replay::Layer layer);
 
 // Adds --seconds, the length of a search.
 void AddSeconds(CLI::App& subcommand, unsigned int& seconds);

@@ -10,19 +10,36 @@ namespace Replay {
 
 namespace {
 
-template <typename Side>
-std::int64_t HeldAtPeak(const Recording& recording, const std::function<void()>& atPeak) {
-    Side side(recording);
-    HeapCount::Start();
-    Run(side, recording, recording.peakSteps);
-    const std::int64_t held = HeapCount::Stop();
-    atPeak();
-    return held;
+using HeapSide = FreeingSide<SystemHeap>;
+
+// Calls `measure` with the side of that layer.
+template <typename Measure>
+auto WithSide(const Recording& recording, Layer layer, const Measure& measure) {
+    switch (layer) {
+        case Layer::Heap: {
+            DroppingSide<HeapPool> side(recording);
+            return measure(side);
+        }
+        case Layer::Malloc: {
+            FreeingSide<MallocPool> side(recording);
+            return measure(side);
+        }
+        case Layer::Mgr:
+            break;
+    }
+    DroppingSide<MgrPool> side(recording);
+    return measure(side);
 }
 
 template <typename Side>
-double TimePerEvent(const Recording& recording) {
-    Side side(recording);
+std::int64_t HeldAtPeak(Side& side, const Recording& recording) {
+    HeapCount::Start();
+    Run(side, recording, recording.peakSteps);
+    return HeapCount::Stop();
+}
+
+template <typename Side>
+double TimePerEvent(Side& side, const Recording& recording) {
     const double start = ProcessorNanoseconds();
     Run(side, recording, recording.steps.size());
     const double time = ProcessorNanoseconds() - start - side.untimed;
@@ -31,20 +48,27 @@ double TimePerEvent(const Recording& recording) {
 
 }  // namespace
 
-std::int64_t BytesHeldByPools(const Recording& recording, const std::function<void()>& atPeak) {
-    return HeldAtPeak<PoolSide>(recording, atPeak);
+std::int64_t BytesHeldByPools(const Recording& recording, Layer layer,
+                              const std::function<void()>& atPeak) {
+    return WithSide(recording, layer, [&](auto& side) {
+        const std::int64_t held = HeldAtPeak(side, recording);
+        atPeak();
+        return held;
+    });
 }
 
 std::int64_t BytesHeldByHeap(const Recording& recording) {
-    return HeldAtPeak<HeapSide>(recording, [] {});
+    HeapSide side(recording);
+    return HeldAtPeak(side, recording);
 }
 
-double PoolNanosecondsPerEvent(const Recording& recording) {
-    return TimePerEvent<PoolSide>(recording);
+double PoolNanosecondsPerEvent(const Recording& recording, Layer layer) {
+    return WithSide(recording, layer, [&](auto& side) { return TimePerEvent(side, recording); });
 }
 
 double HeapNanosecondsPerEvent(const Recording& recording) {
-    return TimePerEvent<HeapSide>(recording);
+    HeapSide side(recording);
+    return TimePerEvent(side, recording);
 }
 
 }  // namespace Replay

@@ -1,6 +1,7 @@
-// The two sides of a replay: PoolSide carries the steps of a recording out through one Mgr a traced
-// pool, HeapSide through operator new[] and delete[]. What a side still holds, its destructor gives
-// back. `untimed` is time that no step is charged with, in nanoseconds.
+// The sides of a replay, which carry the steps of a recording out: pools that drop their blocks at
+// once, and pools whose blocks are freed one by one, the C library's heap among them. What a side
+// still holds, its destructor gives back. `untimed` is time that no step is charged with, in
+// nanoseconds.
 
 #ifndef OBR_TOOLS_REPLAY_SIDES_HPP
 #define OBR_TOOLS_REPLAY_SIDES_HPP
@@ -12,51 +13,106 @@
 #include <vector>
 
 #include <MemPool>
+#include <MemPoolHeap>
 
 #include "replay/Clock.hpp"
+#include "replay/Layer.hpp"
 #include "replay/Recording.hpp"
 
 namespace Replay {
 
-class PoolSide {
+// The pools have the settings of the process.
+
+class HeapPool {
 public:
-    explicit PoolSide(const Recording& recording)
-        : pools(recording.pools), mgrs(recording.pools.size()), blocks(recording.numBlocks) {}
+    explicit HeapPool(const char* name) : heap(name, HeapSettingsOf(PoolSettings::OfProcess())) {}
+
+    void* Allocate(std::size_t size) { return heap.Allocate(size); }
+    void Free(void* block) { heap.Free(block); }
+    void Clear() { heap.FreeAll(); }
+
+private:
+    OBR::MemPool::Heap heap;
+};
+
+class MgrPool {
+public:
+    explicit MgrPool(const char* name) : mgr(name) {}
+
+    void* Allocate(unsigned int size) { return mgr.Alloc(size); }
+    void Free(void* block) { mgr.Free(block); }
+    void Clear() { mgr.Clear(); }
+
+private:
+    OBR::MemPool::Mgr mgr;
+};
+
+class MallocPool {
+public:
+    void* Allocate(std::size_t size) {
+        return size < limit ? heap.Allocate(size, alignmentOfMalloc) : ::operator new[](size);
+    }
+    void Free(void* block) {
+        if (!heap.Free(block)) { ::operator delete[](block); }
+    }
+
+private:
+    OBR::MemPool::Heap heap{"malloc", HeapSettingsOf(PoolSettings::OfProcess())};
+    const std::size_t limit = MallocLimit(PoolSettings::OfProcess().maxRecordSize);
+};
+
+class SystemHeap {
+public:
+    void* Allocate(std::size_t size) { return ::operator new[](size); }
+    void Free(void* block) { ::operator delete[](block); }
+};
+
+// A pool for each one in the recording.
+template <typename Pool>
+class DroppingSide {
+public:
+    explicit DroppingSide(const Recording& recording)
+        : names(recording.pools), pools(recording.pools.size()), blocks(recording.numBlocks) {}
 
     void Create(const Trace::Step& step) {
-        mgrs[step.pool].emplace(pools[step.pool].address.c_str());
+        pools[step.pool].emplace(names[step.pool].address.c_str());
     }
     void Allocate(const Trace::Step& step) {
-        blocks[step.block.index] = mgrs[step.pool]->Alloc(step.block.size);
+        blocks[step.block.index] = pools[step.pool]->Allocate(step.block.size);
     }
-    void Free(const Trace::Step& step) { mgrs[step.pool]->Free(blocks[step.block.index]); }
-    void Clear(const Trace::Step& step) { mgrs[step.pool]->Clear(); }
-    void Destroy(const Trace::Step& step) { mgrs[step.pool].reset(); }
+    void Free(const Trace::Step& step) { pools[step.pool]->Free(blocks[step.block.index]); }
+    void Clear(const Trace::Step& step) { pools[step.pool]->Clear(); }
+    void Destroy(const Trace::Step& step) { pools[step.pool].reset(); }
 
     static constexpr double untimed = 0;
 
 private:
-    const std::vector<Trace::Pool>& pools;
-    std::vector<std::optional<OBR::MemPool::Mgr>> mgrs;
+    const std::vector<Trace::Pool>& names;
+    std::vector<std::optional<Pool>> pools;
     std::vector<void*> blocks;
 };
 
-// Where a pool drops its blocks at once, the heap frees them one by one, so that it holds no more
-// than the pool does. What a program clears it would have to free otherwise: that is charged. What
-// it leaves to the end of a pool it never asks for: that is not.
-class HeapSide {
+// One pool for all. Where a pool of the recording drops its blocks at once, these are freed one by
+// one, so that it holds no more than that pool does. What a program clears it would have to free
+// otherwise: that is charged. What it leaves to the end of a pool it never asks for: that is not.
+template <typename Pool>
+class FreeingSide {
 public:
-    explicit HeapSide(const Recording& recording)
+    explicit FreeingSide(const Recording& recording)
         : dropped(recording.dropped), blocks(recording.numBlocks) {}
-    HeapSide(const HeapSide&) = delete;
-    HeapSide& operator=(const HeapSide&) = delete;
-    ~HeapSide() {
-        for (void* block : blocks) { ::operator delete[](block); }
+    FreeingSide(const FreeingSide&) = delete;
+    FreeingSide& operator=(const FreeingSide&) = delete;
+    ~FreeingSide() {
+        for (void* block : blocks) {
+            if (block != nullptr) { pool->Free(block); }
+        }
     }
 
-    void Create(const Trace::Step&) {}
+    void Create(const Trace::Step&) {
+        if (!pool.has_value()) { pool.emplace(); }
+    }
     void Allocate(const Trace::Step& step) {
-        blocks[step.block.index] = ::operator new[](step.block.size);
+        blocks[step.block.index] = pool->Allocate(step.block.size);
     }
     void Free(const Trace::Step& step) { FreeAt(step.block.index); }
     void Clear(const Trace::Step& step) {
@@ -73,9 +129,10 @@ public:
     double untimed = 0;
 
 private:
-    void FreeAt(std::uint32_t index) { ::operator delete[](std::exchange(blocks[index], nullptr)); }
+    void FreeAt(std::uint32_t index) { pool->Free(std::exchange(blocks[index], nullptr)); }
 
     const std::vector<std::uint32_t>& dropped;
+    std::optional<Pool> pool;
     std::vector<void*> blocks;
 };
 
