@@ -23,6 +23,7 @@ tools/replay
 tools/record
 tools/report
 tools/advise
+tools/preload
 tools/mempool
 '
 

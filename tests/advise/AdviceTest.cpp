@@ -58,4 +58,10 @@ TEST(Advice, IsPrintedWithLinesToPasteIfPoolsHelp) {
                           "fastest, smallest, best, advised\n"));
 }
 
+TEST(Advice, EndsInACommandThatTriesIt) {
+    EXPECT_EQ(Tool::TryCommand({2010, 500, 16, 8, true}, {"perl", "-e", "print 'x'", ""}),
+              "mempool try --bucket-size 2010 --max-record 500 --min-record 16 --alignment 8 "
+              "--keep-empty -- perl -e 'print '\\''x'\\''' ''");
+}
+
 }  // namespace

@@ -53,6 +53,7 @@ echo "a C host runs by pkg-config, statically"
 
 NUV_OBR_MEMPOOL_TRACE=1 ./FirstPool | mempool replay --rounds 1 - >replay.txt
 grep -q "^   events  *5 " replay.txt
+mempool try --rounds 1 ./FirstPool 2>&1 >/dev/null | grep -q "^On pools "
 mempool record -o FirstPool.trace ./FirstPool >/dev/null
 mempool text FirstPool.trace | grep -q "^xmpt:a:.*:5024$"
 mempool report FirstPool.trace >report.txt

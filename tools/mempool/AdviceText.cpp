@@ -68,6 +68,16 @@ void PrintGivenUp(std::ostream& out, const Advice& advice) {
     }
 }
 
+// A word for a shell.
+std::string Quoted(const std::string& word) {
+    const char* const plain =
+        "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789_-+=./:,@%";
+    if (!word.empty() && word.find_first_not_of(plain) == std::string::npos) { return word; }
+    std::string quoted = "'";
+    for (const char c : word) { quoted += c == '\'' ? "'\\''" : std::string(1, c); }
+    return quoted + "'";
+}
+
 }  // namespace
 
 void PrintTable(std::ostream& out, const Advice& advice, bool all) {
@@ -121,6 +131,19 @@ void PrintVerdict(std::ostream& out, const Advice& advice) {
     const std::vector<std::string> code = Advise::CodeOf(advised.settings, advice.layer);
     if (!code.empty()) { out << "\nor, in code:\n\n"; }
     for (const std::string& line : code) { fmt::print(out, "    {}\n", line); }
+}
+
+std::string TryCommand(const Replay::PoolSettings& settings,
+                       const std::vector<std::string>& command) {
+    std::string line = "mempool try";
+    for (const auto& row : OBR::MemPool::SettingTable::all) {
+        const unsigned int value = row.In(settings);
+        if (!row.IsFlag()) { line += fmt::format(" {} {}", row.option, value); }
+        if (row.IsFlag() && value != 0) { line += fmt::format(" {}", row.option); }
+    }
+    line += " --";
+    for (const std::string& word : command) { line += " " + Quoted(word); }
+    return line;
 }
 
 }  // namespace Tool

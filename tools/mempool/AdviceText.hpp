@@ -4,6 +4,8 @@
 #define OBR_TOOLS_MEMPOOL_ADVICETEXT_HPP
 
 #include <iosfwd>
+#include <string>
+#include <vector>
 
 #include "advise/Advice.hpp"
 
@@ -15,6 +17,10 @@ void PrintTable(std::ostream& out, const Advise::Advice& advice, bool all);
 
 // The verdict in words, and the lines to paste if pools would help.
 void PrintVerdict(std::ostream& out, const Advise::Advice& advice);
+
+// The command line of `mempool try` with these settings, for a shell.
+std::string TryCommand(const Replay::PoolSettings& settings,
+                       const std::vector<std::string>& command);
 
 }  // namespace Tool
 

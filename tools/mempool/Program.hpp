@@ -23,6 +23,7 @@ struct Program {
 
 // Each is in the file of its subcommand; main.cpp calls them in the order of the help.
 void AddRun(Program& program);
+void AddTry(Program& program);
 void AddRecord(Program& program);
 void AddReplay(Program& program);
 void AddReport(Program& program);

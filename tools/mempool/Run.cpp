@@ -41,8 +41,9 @@ constexpr const char* notes =
 'mempool advise' say about its trace, which is kept in a nameless file in TMPDIR or /tmp. All of this
 goes to standard error: the program's own output and exit status stay as they are. If recording fails
 or the page cannot be written, the status is 125, 126 or 127, as with 'mempool record'. The report is
-by caller unless --by says otherwise; the advice is for one pool for all groups. Ctrl-C ends the
-program, and mempool reports on what was recorded; a second one ends that too.
+by caller unless --by says otherwise. The advice is for one pool for all groups, on the library that
+'mempool try' preloads unless --layer says otherwise, and ends with the command line that tries it.
+Ctrl-C ends the program, and mempool reports on what was recorded; a second one ends that too.
 )";
 
 struct Options {
@@ -111,6 +112,11 @@ void AdviseOn(const NamelessFile& trace, const Options& options) {
     PrintTable(std::cerr, advice, false);
     std::cerr << '\n';
     PrintVerdict(std::cerr, advice);
+    if (options.layer == Replay::Layer::Malloc && advice.verdict.advised.has_value()) {
+        const auto& advised = advice.findings.settings[*advice.verdict.advised];
+        std::cerr << "\nTo try it:\n\n    " << TryCommand(advised.settings, options.order.command)
+                  << '\n';
+    }
 }
 
 int Run(Options options) {

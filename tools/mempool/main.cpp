@@ -50,6 +50,7 @@ int Run(Tool::Program& program, std::vector<std::string> words) {
     app.require_subcommand(1);
 
     Tool::AddRun(program);
+    Tool::AddTry(program);
     Tool::AddRecord(program);
     Tool::AddReplay(program);
     Tool::AddReport(program);

@@ -1,7 +1,6 @@
-// Runs a program that is already there on pools, unchanged:
+// Runs a program on pools, unchanged; `mempool try` does that and compares:
 //
-//     LD_PRELOAD=build/release/examples/libMallocOnPools.so NUV_OBR_MEMPOOL_BUCKET_SIZE=65535 perl
-//     ...
+//     LD_PRELOAD=.../libMallocOnPools.so NUV_OBR_MEMPOOL_BUCKET_SIZE=65450 perl ...
 //
 // It takes the place of the malloc family. Blocks up to the largest record of its one Heap come
 // from there, aligned to 16 bytes as malloc promises; larger ones stay with the C library, which
@@ -38,6 +37,8 @@
 #include <mutex>
 #include <new>
 
+#include "replay/Layer.hpp"
+
 // The C library's own functions, by names that nobody takes the place of.
 // NOLINTBEGIN(bugprone-reserved-identifier)
 extern "C" {
@@ -52,13 +53,12 @@ void __libc_free(void* block);
 namespace {
 
 using OBR::MemPool::Heap;
-using OBR::MemPool::HeapSettings;
 
-constexpr std::size_t alignmentOfMalloc = 16;
+using Replay::alignmentOfMalloc;
 
 Heap* heap = nullptr;  // Lives from the start-up to the end of the process, behind all exit steps.
 
-// Blocks of fewer bytes than that come from the heap. 0 while it must not be asked: ahead of the
+// Blocks of fewer bytes than that come from the heap. 0 while it must not be asked: before the
 // start-up, while it reports, and while its exhaustion is on its way to the caller.
 std::atomic<std::size_t> limit{0};
 std::size_t usualLimit = 0;  // What it is otherwise.
@@ -98,14 +98,16 @@ void* Take(std::size_t size, std::size_t alignment) {
 
 // False for what is no block of the heap.
 bool GiveBack(void* block) {
+    if (heap == nullptr) { return false; }
     const Lock lock;
-    return heap != nullptr && heap->Free(block);
+    return heap->Free(block);
 }
 
 // 0 for what is no block of the heap.
 std::size_t Usable(void* block) {
+    if (heap == nullptr) { return 0; }
     const Lock lock;
-    return heap != nullptr ? heap->UsableSize(block) : 0;
+    return heap->UsableSize(block);
 }
 
 void* Aligned(std::size_t alignment, std::size_t size) {
@@ -128,14 +130,14 @@ void FindUsableSize() {
         reinterpret_cast<UsableSizeOfLibrary>(dlsym(RTLD_NEXT, "malloc_usable_size"));
 }
 
-// Behind the start-up of the library, which reads the environment.
+// After the start-up of the library, which reads the environment.
 __attribute__((constructor)) void StartUp() {
     using namespace OBR::MemPool;  // NOLINT(google-build-using-namespace)
     FindUsableSize();
     if (std::getenv("NUV_OBR_MEMPOOL_ON") != nullptr && !NUV_OBR_MEMPOOL_ON()) { return; }
     NUV_OBR_MEMPOOL_TRACE(false);  // Its lines would allocate, which is an event to be traced.
     try {
-        heap = new Heap("malloc", HeapSettings().On(true));
+        heap = new Heap("malloc", Replay::HeapSettingsOf(Replay::PoolSettings::OfProcess()));
     } catch (const std::exception& error) {
         std::fprintf(stderr, "MallocOnPools: %s\n", error.what());
         std::_Exit(1);
@@ -145,9 +147,7 @@ __attribute__((constructor)) void StartUp() {
     pthread_atfork([] { mutex.lock(); }, [] { mutex.unlock(); },
                    [] { ::new (&mutex) std::recursive_mutex; });
 
-    // A block takes up to 16 bytes more: the record's header, and the way to its alignment.
-    const std::size_t record = NUV_OBR_MEMPOOL_MAX_RECORD_SIZE();
-    usualLimit = record < 2 * alignmentOfMalloc ? 0 : ((record - alignmentOfMalloc) & ~7U) + 1;
+    usualLimit = Replay::MallocLimit(NUV_OBR_MEMPOOL_MAX_RECORD_SIZE());
     limit = usualLimit;
 }
 

@@ -1,0 +1,81 @@
+// `mempool try` on small programs of any machine.
+
+#include <sys/wait.h>
+
+#include <cstdio>
+#include <fstream>
+#include <string>
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <nlohmann/json.hpp>
+
+#include "Folder.hpp"
+
+using nlohmann::json;
+using testing::HasSubstr;
+
+namespace {
+
+// What is written on the standard output; the errors are in a file.
+std::string Try(const std::string& arguments, int exitStatus = 0) {
+    const std::string command =
+        MEMPOOL " try --rounds 2 " + arguments + " 2>" + FolderPath() + "/errors";
+    std::FILE* const tool = popen(command.c_str(), "r");
+    std::string text;
+    for (int c = std::fgetc(tool); c != EOF; c = std::fgetc(tool)) { text += static_cast<char>(c); }
+    const int status = pclose(tool);
+    EXPECT_EQ(WIFEXITED(status) ? WEXITSTATUS(status) : -1, exitStatus) << command;
+    return text;
+}
+
+std::string Errors() {
+    std::ifstream file(FolderPath() + "/errors");
+    return {std::istreambuf_iterator<char>(file), {}};
+}
+
+TEST(Try, ComparesMallocAndPools) {
+    const std::string input = FolderPath() + "/input";
+    std::ofstream(input) << "b\na\n";
+    const json tried = json::parse(Try("--json --stdin " + input + " -- sort -r", 0));
+    EXPECT_EQ(Errors(), "b\na\n") << "Shown once.";
+    EXPECT_EQ(tried["rounds"], 2);
+    EXPECT_EQ(tried["same_output"], true);
+    EXPECT_THAT(tried["sentences"][0].get<std::string>(), HasSubstr("On pools the program takes "));
+    const json& sides = tried["sides"];
+    ASSERT_GE(sides.size(), 2U);
+    EXPECT_EQ(sides[0]["name"], "malloc");
+    EXPECT_EQ(sides[1]["name"], "pools");
+    for (const json& side : sides) {
+        EXPECT_EQ(side["cpu_ratio"],
+                  side["cpu_seconds"].get<double>() / sides[0]["cpu_seconds"].get<double>());
+        EXPECT_EQ(side["peak_ratio"],
+                  side["peak_bytes"].get<double>() / sides[0]["peak_bytes"].get<double>());
+        EXPECT_GT(side["wall_seconds"], 0);
+        EXPECT_GE(side["cpu_spread"], 0);
+        EXPECT_GT(side["peak_bytes"], 500000);
+    }
+}
+
+TEST(Try, SaysWhereTheOutputDiffers) {
+    const json own = json::parse(
+        Try("--json --bucket-size 2010 -- sh -c 'echo $LD_PRELOAD $NUV_OBR_MEMPOOL_BUCKET_SIZE'"));
+    EXPECT_EQ(own["same_output"], false);
+    EXPECT_EQ(own["verdict"], "differs");
+    EXPECT_TRUE(json::parse(Try("--json sh -c 'echo $$'"))["same_output"].is_null());
+    const json status = json::parse(Try("--json -- sh -c 'test -z \"$LD_PRELOAD\"'"));
+    EXPECT_EQ(status["same_output"], false) << "The exit status counts too.";
+}
+
+TEST(Try, EndsAsTheProgramDoes) {
+    EXPECT_EQ(Try("sh -c 'echo once; exit 3'", 3), "once\n");
+    EXPECT_THAT(Errors(), HasSubstr("\n   Rounds: 2\n"));
+    EXPECT_THAT(Errors(), HasSubstr("\n   pools "));
+    Try("sh -c 'kill $$'; exit $?", 128 + 15);
+    Try("/nowhere/program", 127);
+    Try("--bucket-size 100 true", 125);
+    EXPECT_THAT(Errors(), HasSubstr("mempool: these settings make no pool: "));
+    Try("--stdin /nowhere true", 125);
+}
+
+}  // namespace

@@ -1,0 +1,143 @@
+// mempool try: runs a program on malloc and on pools, and compares.
+
+#include <cstdint>
+#include <iostream>
+#include <memory>
+#include <string>
+
+#include <fmt/ostream.h>
+#include <nlohmann/json.hpp>
+
+#include "mempool/CommandLine.hpp"
+#include "mempool/Program.hpp"
+#include "mempool/Progress.hpp"
+#include "mempool/Settings.hpp"
+#include "mempool/Table.hpp"
+#include "preload/Trial.hpp"
+#include "system/Child.hpp"
+#include "system/ProgramFile.hpp"
+
+namespace Tool {
+
+namespace {
+
+constexpr const char* description = "Run a program on malloc and on pools, in turns, and compare";
+
+constexpr const char* notes =
+    R"(The program runs unchanged. On pools a library is preloaded that serves its blocks up to the largest
+record from one Heap, aligned to 16 bytes as malloc's; mimalloc is preloaded too where it is installed.
+The first run counts for nothing; its output is the one that is shown. The figures go to standard error.
+
+A setting without an option here is that of its environment variable, such as
+NUV_OBR_MEMPOOL_BUCKET_SIZE.
+
+cpu s         User and system time, the median of the rounds.
+spread        Between the lower and the upper quartile. A difference within it is neither a gain nor
+              a price, nor is one of less than 1 %.
+peak MB       The most resident memory, the program's code included.
+Standard input is empty unless --stdin names a file. Ctrl-C ends the trial; the rounds that are whole
+are shown.
+
+Exit status: that of the program's first run, or its signal; 125 if nothing was tried, 126 if the
+program cannot be run, 127 if there is none of that name.
+)";
+
+struct Options {
+    Preload::Order order;
+    bool json = false;
+};
+
+nlohmann::ordered_json JsonOf(const Preload::Trial& trial, const Preload::Conclusion& conclusion) {
+    nlohmann::ordered_json sides = nlohmann::ordered_json::array();
+    for (std::size_t i = 0; i < trial.sides.size(); ++i) {
+        const Advise::Figures& figures = conclusion.figures[i];
+        const Advise::Figures& before = conclusion.figures.front();
+        sides.push_back({{"name", trial.sides[i].name},
+                         {"cpu_seconds", figures.nsPerEvent},
+                         {"cpu_spread", figures.nsSpread},
+                         {"cpu_ratio", Cost(figures, before, Advise::Aim::Time)},
+                         {"wall_seconds", Advise::Quantile(trial.sides[i].wallSeconds, 0.5)},
+                         {"peak_bytes", static_cast<std::int64_t>(figures.bytesHeld)},
+                         {"peak_ratio", Cost(figures, before, Advise::Aim::Bytes)}});
+    }
+    nlohmann::ordered_json same;
+    if (conclusion.sameOutput.has_value()) { same = *conclusion.sameOutput; }
+    return {{"rounds", trial.rounds},
+            {"sides", sides},
+            {"same_output", same},
+            {"verdict", conclusion.verdict},
+            {"sentences", conclusion.sentences}};
+}
+
+void Print(const Preload::Trial& trial, const Preload::Conclusion& conclusion) {
+    Table table({{"", 0, Align::Left},
+                 {"cpu s"},
+                 {"spread"},
+                 {"of malloc"},
+                 {"wall s"},
+                 {"peak MB"},
+                 {"of malloc"}});
+    for (std::size_t i = 0; i < trial.sides.size(); ++i) {
+        const Advise::Figures& figures = conclusion.figures[i];
+        const Advise::Figures& before = conclusion.figures.front();
+        table.AddRow(trial.sides[i].name, fmt::format("{:.3f}", figures.nsPerEvent),
+                     fmt::format("{:.3f}", figures.nsSpread),
+                     fmt::format("{:.2f}", Cost(figures, before, Advise::Aim::Time)),
+                     fmt::format("{:.3f}", Advise::Quantile(trial.sides[i].wallSeconds, 0.5)),
+                     fmt::format("{:.1f}", figures.bytesHeld / 1e6),
+                     fmt::format("{:.2f}", Cost(figures, before, Advise::Aim::Bytes)));
+    }
+    fmt::print(std::cerr, "\n   Rounds: {}\n", trial.rounds);
+    table.Write(std::cerr);
+    std::cerr << '\n';
+    for (const std::string& sentence : conclusion.sentences) { std::cerr << sentence << '\n'; }
+}
+
+int Try(const Options& options) {
+    CheckSettings(Replay::InLayer(options.order.settings, Replay::Layer::Malloc));
+    System::CheckPreload(options.order.command.front(), "tried");
+    const Progress progress("mempool");
+    const Preload::Trial trial =
+        Preload::TryProgram(options.order, [&](unsigned int round, const std::string& side) {
+            progress.Clear();
+            if (round == 0) { return; }  // What the program prints comes next.
+            progress.Show(fmt::format("round {} of {}, on {}", round, options.order.rounds, side));
+        });
+    progress.Clear();
+    if (trial.rounds == 0) {
+        std::cerr << "mempool: stopped before the end of the first round\n";
+        return System::EndLike(trial.waitStatus);
+    }
+    const Preload::Conclusion conclusion = Preload::Conclude(trial);
+    if (options.json) {
+        std::cout << JsonOf(trial, conclusion).dump(2) << std::endl;
+    } else {
+        Print(trial, conclusion);
+    }
+    return System::EndLike(trial.waitStatus);
+}
+
+}  // namespace
+
+void AddTry(Program& program) {
+    CLI::App& sub = *program.commandLine.add_subcommand("try", description);
+    sub.footer(notes);
+    AddCommand(program, sub);
+    const auto options = std::make_shared<Options>();
+    AddNumber(sub, "--rounds", options->order.rounds, 1, 1000, "Runs that count, on each side");
+    AddSettings(sub, options->order.settings);
+    sub.add_option("--stdin", options->order.input, "The program's standard input")
+        ->type_name("FILE");
+    sub.add_flag("--json", options->json,
+                 "Print the figures as JSON on standard output, and what the program prints on "
+                 "standard error");
+    sub.callback([&program, &sub, options] {
+        options->order.command = program.command;
+        options->order.showsOnErrors = options->json;
+        if (program.command.empty()) { throw CLI::RequiredError("PROGRAM"); }
+        TakeEnvironment(sub, options->order.settings);
+        program.job = [options] { return Try(*options); };
+    });
+}
+
+}  // namespace Tool

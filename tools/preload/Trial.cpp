@@ -1,0 +1,259 @@
+#include "preload/Trial.hpp"
+
+#include <dlfcn.h>
+#include <fcntl.h>
+#include <sys/resource.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <chrono>
+#include <cmath>
+#include <csignal>
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <memory>
+#include <sstream>
+#include <stdexcept>
+#include <string_view>
+#include <utility>
+
+#include <fmt/format.h>
+
+#include "advise/Verdict.hpp"
+#include "system/Child.hpp"
+#include "system/Descriptor.hpp"
+#include "system/ExitStatus.hpp"
+
+namespace Preload {
+
+namespace {
+
+namespace fs = std::filesystem;
+
+// The library of the pools: in an install, or where it is built.
+std::string PoolsLibrary() {
+    const fs::path here = fs::read_symlink("/proc/self/exe").parent_path();
+    std::istringstream places(PRELOAD_PLACES);
+    for (std::string place; std::getline(places, place, ':');) {
+        const fs::path library = (here / place / PRELOAD_NAME).lexically_normal();
+        if (fs::exists(library)) { return library; }
+    }
+    throw std::runtime_error(PRELOAD_NAME " is not installed beside " + here.string());
+}
+
+// Whether the loader finds the library. Asked in a child, which the library may change.
+bool IsInstalled(const char* library) {
+    const pid_t child = fork();
+    if (child == 0) { _exit(dlopen(library, RTLD_NOW) == nullptr ? 1 : 0); }
+    int status = -1;
+    waitpid(child, &status, 0);
+    return status == 0;
+}
+
+// What one run writes on one stream, in a file without a name.
+class Output {
+public:
+    Output() : file(std::tmpfile()) {
+        if (file == nullptr) {
+            throw System::Failure(System::ownFailure, "a temporary file", errno);
+        }
+    }
+    Output(const Output&) = delete;
+    Output& operator=(const Output&) = delete;
+    ~Output() { std::fclose(file); }
+
+    int Descriptor() const { return fileno(file); }
+
+    // The next piece of it, empty at the end.
+    std::string_view Read() {
+        return {piece.data(), std::fread(piece.data(), 1, piece.size(), file)};
+    }
+    void Rewind() { std::rewind(file); }
+
+    void Show(std::FILE* stream) {
+        Rewind();
+        for (std::string_view text = Read(); !text.empty(); text = Read()) {
+            std::fwrite(text.data(), 1, text.size(), stream);
+        }
+        std::fflush(stream);
+    }
+
+    bool IsLike(Output& other) {
+        Rewind();
+        other.Rewind();
+        while (true) {
+            const std::string_view text = Read();
+            if (text != other.Read()) { return false; }
+            if (text.empty()) { return true; }
+        }
+    }
+
+private:
+    std::FILE* const file;
+    std::array<char, 1 << 16> piece = {};
+};
+
+struct Run {
+    Output output;
+    Output errors;
+    int status = 0;
+    double cpuSeconds = 0;
+    double wallSeconds = 0;
+    double peakBytes = 0;
+};
+
+double Seconds(const timeval& time) {
+    return static_cast<double>(time.tv_sec) + 1e-6 * static_cast<double>(time.tv_usec);
+}
+
+// In the child, before the program.
+void Prepare(const Order& order, const Side& side, int input, const Run& run) {
+    std::signal(SIGINT, SIG_DFL);
+    dup2(input, STDIN_FILENO);
+    dup2(run.output.Descriptor(), STDOUT_FILENO);
+    dup2(run.errors.Descriptor(), STDERR_FILENO);
+    if (side.library.empty()) { return; }
+    for (const auto& [name, value] : Advise::EnvironmentOf(order.settings)) {
+        if (side.name == "pools") { setenv(name.c_str(), value.c_str(), 1); }
+    }
+    const char* const present = std::getenv("LD_PRELOAD");
+    const std::string others = present == nullptr ? "" : std::string(":") + present;
+    setenv("LD_PRELOAD", (side.library + others).c_str(), 1);
+}
+
+std::unique_ptr<Run> RunOnce(const Order& order, const Side& side) {
+    auto run = std::make_unique<Run>();
+    const std::string path = order.input.empty() ? "/dev/null" : order.input;
+    const System::Descriptor input(open(path.c_str(), O_RDONLY | O_CLOEXEC));
+    if (!input.IsOpen()) { throw System::Failure(System::ownFailure, path, errno); }
+    const auto start = std::chrono::steady_clock::now();
+    const pid_t child =
+        System::Start(order.command, [&] { Prepare(order, side, input.Number(), *run); });
+    rusage used = {};
+    while (wait4(child, &run->status, 0, &used) < 0 && errno == EINTR) {}
+    const std::chrono::duration<double> taken = std::chrono::steady_clock::now() - start;
+    run->wallSeconds = taken.count();
+    run->cpuSeconds = Seconds(used.ru_utime) + Seconds(used.ru_stime);
+    run->peakBytes = 1024 * static_cast<double>(used.ru_maxrss);
+    return run;
+}
+
+// While this lives SIGINT ends the program that runs, not this process.
+class Interruption {
+public:
+    Interruption() : before(std::signal(SIGINT, [](int) { isAsked = 1; })) { isAsked = 0; }
+    Interruption(const Interruption&) = delete;
+    Interruption& operator=(const Interruption&) = delete;
+    ~Interruption() { std::signal(SIGINT, before); }
+
+    static bool IsAsked() { return isAsked != 0; }
+
+private:
+    static volatile std::sig_atomic_t isAsked;
+    void (*const before)(int);
+};
+volatile std::sig_atomic_t Interruption::isAsked = 0;
+
+Advise::Figures FiguresOf(const Side& side, unsigned int rounds) {
+    const std::vector<double>& times = side.cpuSeconds;
+    return {Advise::Quantile(times, 0.5),
+            Advise::Quantile(times, 0.75) - Advise::Quantile(times, 0.25),
+            Advise::Quantile(side.peakBytes, 0.5), rounds};
+}
+
+std::string Compared(const std::string& who, const Advise::Figures& figures,
+                     const Advise::Figures& before) {
+    const bool differs = std::abs(figures.nsPerEvent - before.nsPerEvent) >
+                         std::max(figures.nsSpread, before.nsSpread);
+    return fmt::format("{} the program takes {:.2f} of malloc's time{} and {:.2f} of its memory.",
+                       who, Cost(figures, before, Advise::Aim::Time),
+                       differs ? "" : " (the same, within the spread of the runs)",
+                       Cost(figures, before, Advise::Aim::Bytes));
+}
+
+}  // namespace
+
+Trial TryProgram(const Order& order,
+                 const std::function<void(unsigned int round, const std::string& side)>& atRun) {
+    Trial trial;
+    const auto add = [&](const char* name, const std::string& library) {
+        trial.sides.emplace_back();
+        trial.sides.back().name = name;
+        trial.sides.back().library = library;
+    };
+    add("malloc", "");
+    add("pools", PoolsLibrary());
+    if (IsInstalled("libmimalloc.so.2")) { add("mimalloc", "libmimalloc.so.2"); }
+
+    const Interruption interruption;
+    atRun(0, "malloc");
+    const std::unique_ptr<Run> first = RunOnce(order, trial.sides.front());
+    trial.waitStatus = first->status;
+    first->output.Show(order.showsOnErrors ? stderr : stdout);
+    first->errors.Show(stderr);
+    for (unsigned int round = 1; round <= order.rounds; ++round) {
+        std::vector<std::unique_ptr<Run>> runs(trial.sides.size());
+        for (std::size_t i = 0; i < runs.size(); ++i) {
+            const std::size_t place = (i + round) % runs.size();  // Each is the first one at times.
+            if (Interruption::IsAsked()) { return trial; }
+            atRun(round, trial.sides[place].name);
+            runs[place] = RunOnce(order, trial.sides[place]);
+        }
+        if (Interruption::IsAsked()) { return trial; }
+        for (std::size_t i = 0; i < runs.size(); ++i) {
+            Side& side = trial.sides[i];
+            side.cpuSeconds.push_back(runs[i]->cpuSeconds);
+            side.wallSeconds.push_back(runs[i]->wallSeconds);
+            side.peakBytes.push_back(runs[i]->peakBytes);
+            const bool isLike = runs[i]->status == first->status &&
+                                first->output.IsLike(runs[i]->output) &&
+                                first->errors.IsLike(runs[i]->errors);
+            side.isSame = side.isSame && isLike;
+        }
+        trial.rounds = round;
+    }
+    return trial;
+}
+
+Conclusion Conclude(const Trial& trial) {
+    Conclusion conclusion;
+    for (const Side& side : trial.sides) {
+        conclusion.figures.push_back(FiguresOf(side, trial.rounds));
+    }
+    const Advise::Figures& before = conclusion.figures.at(0);
+    const Advise::Figures& pools = conclusion.figures.at(1);
+    // Of the whole program, which thus has a share of 1 and events enough.
+    const Advise::Program whole = {1000000, 0, 1};
+    const auto judge = [&](const Advise::Figures& figures) {
+        return Advise::Judge({before, {{{}, figures}}, {}}, whole);
+    };
+    conclusion.verdict = judge(pools).Name();
+    conclusion.sentences.push_back(Compared("On pools", pools, before));
+    if (conclusion.figures.size() > 2) {
+        const Advise::Figures& other = conclusion.figures[2];
+        const bool wins =
+            judge(other).advised.has_value() &&
+            Cost(other, before, Advise::Aim::Both) < Cost(pools, before, Advise::Aim::Both);
+        conclusion.sentences.push_back(Compared(
+            wins ? "Preloaded mimalloc wins more: with it" : "With mimalloc", other, before));
+    }
+    if (!trial.sides.at(0).isSame) {
+        conclusion.sentences.emplace_back(
+            "The output on malloc differs from run to run and was not compared.");
+    } else {
+        conclusion.sameOutput = trial.sides.at(1).isSame;
+    }
+    if (conclusion.sameOutput == false) {
+        conclusion.verdict = "differs";
+        conclusion.sentences.insert(conclusion.sentences.begin(),
+                                    "On pools the program writes or ends differently: what it "
+                                    "takes there means nothing.");
+    }
+    return conclusion;
+}
+
+}  // namespace Preload

@@ -1,0 +1,60 @@
+// A program run as it is, on pools and on mimalloc, in turns, and compared.
+
+#ifndef OBR_TOOLS_PRELOAD_TRIAL_HPP
+#define OBR_TOOLS_PRELOAD_TRIAL_HPP
+
+#include <functional>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "advise/Figures.hpp"
+#include "replay/PoolSettings.hpp"
+
+namespace Preload {
+
+struct Order {
+    std::vector<std::string> command;  // The program and its arguments.
+    std::string input;                 // The file that is its standard input; empty for none.
+    Replay::PoolSettings settings;
+    unsigned int rounds = 9;
+    bool showsOnErrors = false;  // What the program prints is shown on the standard error alone.
+};
+
+// A way to serve the program's blocks.
+struct Side {
+    std::string name;                // "malloc", "pools" or "mimalloc".
+    std::string library;             // The one that is preloaded; empty for malloc.
+    std::vector<double> cpuSeconds;  // User and system time, a value for each round.
+    std::vector<double> wallSeconds;
+    std::vector<double> peakBytes;  // Resident memory.
+    bool isSame = true;  // Output and exit status were those of the first run in each round.
+};
+
+struct Trial {
+    std::vector<Side> sides;  // malloc is the first one.
+    unsigned int rounds = 0;  // Those that are whole.
+    int waitStatus = 0;       // Of the first run.
+};
+
+// Runs the program. The first run counts for nothing: what it prints is shown, and the other runs
+// are compared with it. `atRun` is called before each run. SIGINT ends the program and the trial,
+// which then has the rounds that are whole. A program that cannot be run, or a library that is not
+// installed, is a std::exception.
+Trial TryProgram(const Order& order,
+                 const std::function<void(unsigned int round, const std::string& side)>& atRun);
+
+// What a trial means.
+struct Conclusion {
+    std::vector<Advise::Figures> figures;  // Of each side; the time is seconds of the processor.
+    std::optional<bool> sameOutput;        // None if malloc's own runs differ.
+    std::string verdict;                   // "faster", "smaller", "both", "none" or "differs".
+    std::vector<std::string> sentences;
+};
+
+// There must be a round.
+Conclusion Conclude(const Trial& trial);
+
+}  // namespace Preload
+
+#endif
