@@ -222,11 +222,11 @@ std::vector<std::pair<std::string, std::string>> EnvironmentOf(
 
 std::vector<std::string> CodeOf(const Replay::PoolSettings& settings, Replay::Layer layer) {
     const bool isForHeap = layer == Replay::Layer::Heap;
-    std::vector<std::string> lines;
-    if (layer == Replay::Layer::Malloc) { return lines; }
+    if (layer == Replay::Layer::Malloc) { return {}; }
+    std::vector<std::string> lines = {"OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);"};
     if (isForHeap) { lines = {"OBR::MemPool::HeapSettings()", "    .On(true)"}; }
-    if (!isForHeap) { lines = {"OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);"}; }
     for (const auto& row : OBR::MemPool::SettingTable::all) {
+        if (isForHeap && !Replay::IsSaid(row, settings)) { continue; }
         const unsigned int value = row.In(settings);
         const std::string argument = !row.IsFlag() ? std::to_string(value)
                                      : value != 0  ? "true"

@@ -38,11 +38,19 @@ inline PoolSettings InLayer(PoolSettings settings, Layer layer) {
     return settings;
 }
 
-// The settings of a Heap, all of them.
+// Whether a Heap is told this setting: one that is told no bucket size begins with the default, and
+// goes on in larger buckets where it becomes large.
+inline bool IsSaid(const OBR::MemPool::Setting& row, const PoolSettings& settings) {
+    return row.size != &PoolSettings::bucketSize || row.In(settings) != row.In(PoolSettings());
+}
+
+// The settings of a Heap.
 inline OBR::MemPool::HeapSettings HeapSettingsOf(const PoolSettings& settings) {
-    return OBR::MemPool::HeapSettings()
-        .On(true)
-        .BucketSize(settings.bucketSize)
+    OBR::MemPool::HeapSettings said;
+    if (IsSaid(OBR::MemPool::SettingTable::bucketSize, settings)) {
+        said.BucketSize(settings.bucketSize);
+    }
+    return said.On(true)
         .MaxRecordSize(settings.maxRecordSize)
         .MinRecordSize(settings.minRecordSize)
         .DataAlignment(settings.dataAlignment)
