@@ -112,7 +112,7 @@ void CutCommand(Program& program, std::vector<std::string>& words) {
 std::string Problem(const CLI::App& app, const CLI::ParseError& error) {
     // The parser looks for what is missing before it looks at what is too much.
     for (const std::string& word : app.remaining()) {
-        const std::string problem = UnknownOption(app, word);
+        std::string problem = UnknownOption(app, word);
         if (!problem.empty()) { return problem; }
         if (dynamic_cast<const CLI::ExtrasError*>(&error) != nullptr) {
             return word + ": unexpected argument";

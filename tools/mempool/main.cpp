@@ -8,6 +8,7 @@
 #include <exception>
 #include <iostream>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "mempool/CommandLine.hpp"
@@ -41,7 +42,7 @@ bool IsOutputWritten() {
     return std::cout.good() && std::ferror(stdout) == 0;
 }
 
-int Run(Tool::Program& program, std::vector<std::string> words) {
+int RunCommandLine(Tool::Program& program, std::vector<std::string> words) {
     CLI::App& app = program.commandLine;
     app.name("mempool");
     app.description(description);
@@ -68,19 +69,28 @@ int Run(Tool::Program& program, std::vector<std::string> words) {
     return program.failure;
 }
 
-}  // namespace
-
-int main(int argc, char** argv) {
-    OccupyStandardStreams();
-    System::SurviveFileSizeLimit();
+int Run(std::vector<std::string> words) {
     Tool::Program program;
     try {
-        return Run(program, std::vector<std::string>(argv + 1, argv + argc));
+        return RunCommandLine(program, std::move(words));
     } catch (const System::Failure& failure) {
         std::cerr << "mempool: " << failure.what() << '\n';
         return program.failure == System::ownFailure ? failure.Status() : EXIT_FAILURE;
     } catch (const std::exception& error) {
         std::cerr << "mempool: " << error.what() << '\n';
         return program.failure;
+    }
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    OccupyStandardStreams();
+    System::SurviveFileSizeLimit();
+    try {
+        return Run(std::vector<std::string>(argv + 1, argv + argc));
+    } catch (const std::exception& error) {
+        std::cerr << "mempool: " << error.what() << '\n';
+        return EXIT_FAILURE;
     }
 }

@@ -112,9 +112,9 @@ RECORDER_API int fexecve(int file, Words arguments, Words environment) noexcept 
     return Follow(environment, [=](Words with) { return next(file, arguments, with); });
 }
 
-// The arguments of a call that takes them one by one, from `first` to the null behind them, as
-// `words` on the stack. `list` is behind that null then.
-#define COLLECT(words, first, list)                                                 \
+// The arguments of a call that takes them one by one, from `first` to the null after them, as
+// `words` on the stack. `list` is after that null then.
+#define COLLECT_WORDS                                                               \
     std::va_list list;                                                              \
     std::size_t number = 1;                                                         \
     va_start(list, first);                                                          \
@@ -126,17 +126,17 @@ RECORDER_API int fexecve(int file, Words arguments, Words environment) noexcept 
     for (std::size_t index = 1; index <= number; ++index) { words[index] = va_arg(list, char*); }
 
 RECORDER_API int execl(const char* path, const char* first, ...) noexcept {
-    COLLECT(words, first, list)
+    COLLECT_WORDS
     va_end(list);
     return ExecutePath(path, words, environ);
 }
 RECORDER_API int execlp(const char* file, const char* first, ...) noexcept {
-    COLLECT(words, first, list)
+    COLLECT_WORDS
     va_end(list);
     return ExecuteFile(file, words, environ);
 }
 RECORDER_API int execle(const char* path, const char* first, ...) noexcept {
-    COLLECT(words, first, list)
+    COLLECT_WORDS
     auto* const environment = va_arg(list, char**);
     va_end(list);
     return ExecutePath(path, words, environment);
