@@ -1,6 +1,6 @@
-"""`mempool check` on hosts with faults: what is told of each, by the library and by the checker, and
-that it names the host's lines. Takes the tool, the host, the same built with AddressSanitizer, a host
-that has the library in it, and whether Valgrind is there."""
+"""`mempool check` on hosts with faults: what the library and the checker report of each, and that they
+name the host's lines. Takes the tool, the host, the same built with AddressSanitizer, a host that
+contains the library, and whether Valgrind is there."""
 
 import os
 import re
@@ -12,14 +12,17 @@ source = os.path.join(os.path.dirname(os.path.abspath(__file__)), "Faulty.cpp")
 failures = []
 
 
-def line_of(mark):
+def line_of(*marks):
+    """The host's line with the first of these marks that there is."""
     with open(source, encoding="utf-8") as file:
-        return next(number for number, line in enumerate(file, 1) if line.rstrip().endswith(mark))
+        lines = file.read().splitlines()
+    return next(f"Faulty.cpp:{number}" for mark in marks
+                for number, line in enumerate(lines, 1) if line.endswith((mark, mark + ", taken here")))
 
 
 def check(checker, host, *args, **variables):
-    """Returns the exit status and what was told: by section, of which a host with faults begins one
-    at each."""
+    """Returns the exit status and the standard error by section: a host with faults begins one at each.
+    Standard output is the section None."""
     environment = {name: value for name, value in os.environ.items()
                    if not name.startswith(("NUV_", "ASAN_", "MEMPOOL_"))}
     command = [tool, "check"] + (["--with", checker] if checker else []) + [host, *args]
@@ -27,42 +30,50 @@ def check(checker, host, *args, **variables):
                          stderr=subprocess.PIPE, text=True, errors="replace", timeout=120, check=False)
     expect(run.returncode != 99 or run.stdout.endswith("all"), f"{args} is flushed", run.stdout)
     first, *rest = re.split(r"^== (.*)\n", run.stderr, flags=re.MULTILINE)
-    return run.returncode, {"": first, **dict(zip(rest[::2], rest[1::2]))}
+    return run.returncode, {None: run.stdout, "": first, **dict(zip(rest[::2], rest[1::2]))}
 
 
-def expect(holds, what, told):
+def expect(holds, what, text):
     if not holds:
-        failures.append(f"{what}\n{told}")
+        failures.append(f"{what}\n{text}")
 
 
-def tells(fault, kind):
-    """What the library tells of a fault. A block of the layer's is 4 bytes larger, and lies 4 bytes
-    behind its record's header, unless it is a heap record."""
+def library_lines(fault, kind):
+    """The lines of the library about a fault. To the pool a block of a heap begins 4 bytes earlier,
+    unless it is a heap record."""
     moved = 4 if kind == "heap" else 0
     damaged = r"pool nodes: bucket 0x\w{16}, record 0x\w{16}: the header is damaged up to "
+    at_40 = damaged + (r"40 bytes before the data \(next1\)" if kind == "bare" else
+                       r"36 bytes before the data \(prev1\)")
+    address = r"0x\w{16} "
     return {
-        "double free": r"pool nodes: 0x\w{16} is already freed",
-        "double free, large": r"pool nodes: 0x\w{16} is already freed",
-        "wrong pool": r"pool others: 0x\w{16} is a block of pool nodes",
-        "wrong pool, large": r"pool others: 0x\w{16} is a block of pool nodes",
-        "inner": rf"pool nodes: 0x\w{{16}} is not a block: it lies {8 + moved} bytes into the block at 0x",
-        "underrun 1": damaged + r"1 byte before the data \(guard\)" if kind == "bare" else
-                      r"pool nodes: 0x\w{16} is not a block: it lies 4 bytes into",
-        "underrun 40": damaged + (r"40 bytes before the data \(next1\)" if kind == "bare" else
-                                  r"36 bytes before the data \(prev1\)"),
-        "underrun 1, large": r"pool nodes: heap record 0x\w{16}: the header is damaged up to 1 byte"
-                             r" before the data \(guard\)",
-        "two threads": r"pool nodes: used by two threads at the same time: "
-                       r"(?=.*\(main)(?=.*\(worker)\d+ \(\w+\) and \d+ \(\w+\)\n(?![^=]*used by)",
-        "leak": rf"pool nodes: 1 block, {13 + moved} bytes never freed",
-        "leak, large": "pool nodes: 1 block, 2001 bytes never freed",
-        "exit": rf"pool kept: 1 block, {13 + moved} bytes never freed",
-    }.get(fault)
+        "double free": ["pool nodes: " + address + "is already freed"],
+        "double free, large": ["pool nodes: " + address + "is already freed"],
+        "wrong pool": ["pool others: " + address + "is a block of pool nodes"],
+        "wrong pool, large": ["pool others: " + address + "is a block of pool nodes"],
+        "disabled pool": ["pool off: " + address + "is a block of pool nodes"],
+        "no bytes": ["pool tiny: " + address + "is a heap record of 0 bytes, which only Clear releases"],
+        "inner": [f"pool nodes: {address}is not a block: it lies {8 + moved} bytes into the block at 0x"],
+        "underrun 1": [damaged + r"1 byte before the data \(guard\)" if kind == "bare" else
+                       f"pool nodes: {address}is not a block: it lies 4 bytes into"] +
+                      ([f"pool nodes: 1 block, {13 + moved} bytes never freed"] if kind == "heap" else []),
+        "underrun 40": [at_40],
+        "cleared": [at_40],
+        "neighbours": [at_40, at_40],
+        "underrun 1, large": [r"pool nodes: heap record 0x\w{16}: the header is damaged up to 1 byte"
+                              r" before the data \(guard\)"],
+        "two threads": [r"pool nodes: used by two threads at the same time: "
+                        r"(?=.*\(main)(?=.*\(worker)\d+ \(\w+\) and \d+ \(\w+\)"],
+        "leak": [f"pool nodes: 4 blocks, {4 * (13 + moved)} bytes never freed"],
+        "leak, large": [f"pool nodes: 4 blocks, {4 * 2001} bytes never freed"],
+        "exit": [f"pool kept: 1 block, {13 + moved} bytes never freed"],
+    }.get(fault, [])
 
 
-# What each checker tells by itself.
+# What each checker reports itself.
 found = {"asan": {"read after free": "heap-use-after-free", "write after free": "heap-use-after-free",
                   "use after clear": "heap-use-after-free", "underrun 40": "use-after-poison",
+                  "cleared": "use-after-poison", "neighbours": "use-after-poison",
                   "underrun 1, large": "use-after-poison",
                   "overrun 1": "heap-buffer-overflow", "heap record overrun, large": "heap-buffer-overflow",
                   "overrun 40": "heap-buffer-overflow",
@@ -73,44 +84,47 @@ found = {"asan": {"read after free": "heap-use-after-free", "write after free": 
                       "overrun 40": "Invalid write", "overrun 100": "Invalid write",
                       "underrun 100": "Invalid write"},
          "nothing": {}}
-# Ordinary memory that is written beyond a block's bucket is the heap's own.
+# Without a checker nobody sees what is written beyond the heap block of a bucket.
 all_faults = ["none", "none, large", "double free", "double free, large", "wrong pool",
-              "wrong pool, large", "inner", "underrun 1", "underrun 1, large", "underrun 40", "leak",
-              "leak, large", "leak at exit", "two threads", "threads in turns"]
-faults = {checker: list(dict.fromkeys([*found[checker], *all_faults])) for checker in found}
+              "wrong pool, large", "inner", "underrun 1", "underrun 1, large", "underrun 40", "cleared",
+              "neighbours", "leak", "leak, large", "leak at exit", "two threads", "threads in turns"]
 
 for checker, host in {"nothing": plain, "asan": sanitized, "valgrind": plain}.items():
     if checker == "valgrind" and has_valgrind != "yes":
         continue
     for kind in ("bare", "heap"):
-        status, sections = check(checker, host, kind, *faults[checker], ASAN_OPTIONS="halt_on_error=0")
+        faults = dict.fromkeys([*found[checker], *all_faults])
+        if kind == "bare":
+            faults.update(dict.fromkeys(["disabled pool", "no bytes"]))
+        status, sections = check(checker, host, kind, *faults, ASAN_OPTIONS="halt_on_error=0")
         expect(status == 99, f"{checker} {kind}: {status}", sections)
-        expect(set(faults[checker]) <= set(sections), f"{checker} {kind} breaks off", sections)
-        for fault, told in sections.items():
+        expect(faults.keys() <= sections.keys(), f"{checker} {kind} breaks off", sections)
+        del sections[None], sections[""]
+        for fault, text in sections.items():
             where = f"{checker} {kind}, {fault}:"
-            expect("wrong answer" not in told, f"{where} the answer of the pool", told)
-            line = tells(fault, kind)
-            if line:
-                expect(re.search("^mempool: " + line, told, re.MULTILINE), f"{where} {line}", told)
-            elif fault:
-                expect("mempool: " not in told, f"{where} nothing of the library's", told)
+            expect("wrong answer" not in text, f"{where} the answer of the pool", text)
+            lines = library_lines(fault, kind)
+            expect(re.fullmatch("".join(line + ".*\n" for line in lines),
+                                "".join(re.findall("^mempool: (.*\n)", text, re.MULTILINE))),
+                   f"{where} {lines}", text)
             problem = found[checker].get(fault)
             if problem:
-                expect(problem in told, f"{where} {problem}", told)
-                at = line_of("at: " + fault.removesuffix(", large"))
-                expect(f"Faulty.cpp:{at}" in told, f"{where} the line", told)
+                expect(problem in text, f"{where} {problem}", text)
             elif checker != "nothing":
-                # The layer looks for the tag of a block; a pool looks at nothing that is gone.
+                # A heap reads the tag of a freed block; a bare pool reads nothing that is freed.
                 problems = "ERROR: Addr|Invalid write" + ("|Invalid read" if kind == "bare" else "")
-                expect(not re.search(problems, told), f"{where} no problem", told)
-            if checker != "nothing" and line and fault != "exit":
-                mark = fault.removesuffix(", large")
-                mark = "release after " + mark if mark.startswith("underrun") else mark
-                if not fault.startswith("leak"):
-                    expect(f"Faulty.cpp:{line_of('at: ' + mark)}" in told, f"{where} the call", told)
-            if checker != "nothing" and (line or problem) and fault != "two threads":
-                mark = "at: leak at exit" if fault == "exit" else "// taken here"
-                expect(f"Faulty.cpp:{line_of(mark)}" in told, f"{where} where it was taken", told)
+                expect(not re.search(problems, text), f"{where} no problem", text)
+            if checker != "nothing" and (lines or problem):
+                name = fault.removesuffix(", large")
+                if problem:
+                    expect(line_of("at: " + name) in text, f"{where} the line", text)
+                if name == "leak":
+                    expect(text.count(line_of("at: leak")) == 3, f"{where} where three were taken", text)
+                    continue
+                if lines:
+                    expect(line_of("found: " + name, "at: " + name) in text, f"{where} the call", text)
+                if name not in ("exit", "no bytes", "two threads"):
+                    expect(line_of("// taken here") in text, f"{where} where it was taken", text)
 
 # Status, choice of the checker, and what cannot be checked.
 for checker, host in (("nothing", plain), ("asan", sanitized), ("valgrind", plain)):
@@ -129,7 +143,9 @@ expect(check("asan", "--alignment", "8", sanitized, "bare", "overrun 1")[0] == 0
 expect(check("asan", sanitized, "bare", "double free", "heap leak",
              ASAN_OPTIONS="exitcode=5")[0] == 5, "the status of LeakSanitizer", "")
 expect(check("nothing", plain, "bare", "double free", MEMPOOL_ABORT="1")[0] == -6, "abort", "")
-expect(check("nothing", plain, "bare", "double free", MEMPOOL_ABORT="0")[0] == 99, "no abort", "")
+status, sections = check("nothing", plain, "bare", "double free", MEMPOOL_ABORT="0",
+                         NUV_OBR_MEMPOOL_TRACE="1")
+expect(status == 99 and sections[None].count("xmpt:f:") == 2, "no abort, and a trace", sections)
 status, sections = check(None, sanitized, "bare", "overrun 1")
 expect(status == 1 and "checking with asan" in sections[""], f"asan by itself: {status}", sections)
 if has_valgrind == "yes":

@@ -1,6 +1,6 @@
 // A host with faults: `Faulty bare|heap FAULT...` makes them one after the other, on bare pools or
-// through the layer, and announces each on standard error. A comment marks the line that a report
-// must name.
+// heaps, and announces each on standard error. Comments mark the lines that reports must name:
+// where a fault is made, and where it is found if that is another line.
 
 #include <sys/wait.h>
 #include <unistd.h>
@@ -28,7 +28,7 @@ struct Bare {
     volatile char* Take(unsigned int size) { return static_cast<char*>(pool.Alloc(size)); }
     bool Give(volatile char* block) { return pool.Free(const_cast<char*>(block)); }
     void Drop() { pool.Clear(); }
-    bool Agrees(volatile char* block) {
+    bool Knows(volatile char* block) {
         return pool.Contains(const_cast<char*>(block)) &&
                pool.GetSize(const_cast<char*>(block)) != 0;
     }
@@ -42,10 +42,17 @@ struct Layered {
     }
     bool Give(volatile char* block) { return heap.Free(const_cast<char*>(block)); }
     void Drop() { heap.FreeAll(); }
-    bool Agrees(volatile char* block) {
-        return heap.UsableSize(const_cast<char*>(block)) != 0 && heap.GetStats().bytesUsed != 0;
+    bool Knows(volatile char* block) {
+        static_cast<void>(heap.GetStats());
+        return heap.UsableSize(const_cast<char*>(block)) != 0;
     }
 };
+
+// Destroys a pool after the library has reported what is in use.
+void (*destroyLate)() = nullptr;
+__attribute__((destructor)) void DestroyLate() {
+    if (destroyLate != nullptr) { destroyLate(); }
+}
 
 template <typename Pool>
 bool Make(const std::string& fault) {
@@ -60,8 +67,8 @@ bool Make(const std::string& fault) {
         volatile char* const second = nodes.Take(size);
         std::memset(const_cast<char*>(block), 1, size);
         GetMgr("nodes")->DbgDetailed();
-        return nodes.Agrees(second) && nodes.Give(block) && nodes.Give(second) &&
-               !nodes.Give(nullptr);
+        return nodes.Knows(second) && others.Knows(second) == isLarge && nodes.Give(block) &&
+               nodes.Give(second) && !nodes.Give(nullptr);
     }
     if (is("read after free")) {
         nodes.Give(block);
@@ -79,6 +86,19 @@ bool Make(const std::string& fault) {
         int status = -1;
         wait(&status);
         if (status != 0) { std::exit(4); }
+    } else if (is("disabled pool")) {
+        NUV_OBR_MEMPOOL_ON(false);
+        Mgr off("off");
+        NUV_OBR_MEMPOOL_ON(true);
+        const bool refused = !off.Free(const_cast<char*>(block));  // at: disabled pool
+        return nodes.Give(block) && refused && off.Free(off.Alloc(size));
+    } else if (is("no bytes")) {
+        NUV_OBR_MEMPOOL_DATA_ALIGNMENT(4);
+        NUV_OBR_MEMPOOL_MIN_RECORD_SIZE(4);
+        NUV_OBR_MEMPOOL_MAX_RECORD_SIZE(4);
+        Mgr tiny("tiny");
+        NUV_OBR_MEMPOOL_MAX_RECORD_SIZE(1000);
+        return nodes.Give(block) && !tiny.Free(tiny.Alloc(0));  // at: no bytes, taken here
     } else if (is("two threads") || is("threads in turns")) {
         std::mutex turns[2];
         std::atomic<int> left = 20;
@@ -103,7 +123,7 @@ bool Make(const std::string& fault) {
         return nodes.Give(block);  // NOLINT(clang-analyzer-cplusplus.NewDeleteLeaks)
     } else if (is("double free")) {
         nodes.Give(block);
-        return !nodes.Agrees(block) && !nodes.Give(block);  // at: double free
+        return !nodes.Knows(block) && !nodes.Give(block);  // at: double free
     } else if (is("wrong pool")) {
         const bool refused = !others.Give(block);  // at: wrong pool
         return nodes.Give(block) && refused;
@@ -127,15 +147,28 @@ bool Make(const std::string& fault) {
         return nodes.Give(block);
     } else if (is("underrun 40")) {
         block[-40] = 1;            // at: underrun 40
-        return nodes.Give(block);  // at: release after underrun 40
+        return nodes.Give(block);  // found: underrun 40
     } else if (is("underrun 1")) {
         block[-1] = 1;      // at: underrun 1
-        nodes.Give(block);  // at: release after underrun 1
+        nodes.Give(block);  // found: underrun 1
+    } else if (is("cleared")) {
+        block[-40] = 1;  // at: cleared
+        nodes.Drop();    // found: cleared
+    } else if (is("neighbours")) {
+        volatile char* const second = nodes.Take(size);
+        volatile char* const third = nodes.Take(size);
+        block[-40] = third[-40] = 1;  // at: neighbours
+        nodes.Give(second);           // found: neighbours
+        std::cerr << "== after neighbours" << std::endl;
+        return nodes.Give(block) && nodes.Give(third);
     } else if (is("leak at exit")) {
         static auto* const kept = new Pool("kept");
-        kept->Take(size);  // at: leak at exit
+        kept->Take(size);  // at: exit, taken here
+        destroyLate = [] { delete kept; };
         return nodes.Give(block);
-    } else if (!is("leak")) {
+    } else if (is("leak")) {
+        for (int count = 0; count < 3; ++count) { nodes.Take(size); }  // at: leak
+    } else {
         return false;
     }
     return true;
