@@ -4,8 +4,8 @@ set terminal svg size 960,420 font "sans,12" background "white"
 set output output
 set logscale xy
 set grid xtics ytics lc rgb "#dddddd"
-set xrange [700:45000000]
-set xtics ("1k" 1e3, "10k" 1e4, "100k" 1e5, "1M" 1e6, "10M" 1e7, "30M" 3e7)
+set xrange [700:14000000]
+set xtics ("1k" 1e3, "10k" 1e4, "100k" 1e5, "1M" 1e6, "10M" 1e7)
 set format y "%g"
 set key top left Left reverse
 set multiplot layout 1,2
