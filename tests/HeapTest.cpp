@@ -219,7 +219,8 @@ TEST_F(HeapTest, HasTheSettingsSaidAndElseThoseOfTheProcess) {
     EXPECT_EQ(settings(Heap()), std::tuple(300, 8, 88, 8, true, true));
     const auto before = AllSettings();
     std::optional<Heap> heap;
-    const HeapSettings said = HeapSettings().On(true).BucketSize(1 << 20).MaxRecordSize(50);
+    const HeapSettings said =
+        HeapSettings().On(true).BucketSize(std::size_t{1} << 32).MaxRecordSize(50);
     const auto build = [&] {
         heap.emplace("own",
                      HeapSettings(said).MinRecordSize(9).DataAlignment(4).KeepEmptyBuckets(false));
