@@ -1,13 +1,13 @@
-# gdb's commands and printers, which it loads by itself with the library: it looks for the library's
-# real file name and "-gdb.py" beside the library and, in the folders that it is set up for, under
-# the library's whole path. What it finds there is a link to the script, which has its package
-# beside it. gdb trusts what its own set-up names: for Debian's gdb that is below
-# /usr/share/gdb/auto-load. So the link of an install under /usr stands there, and every other one
-# beside the library, where gdb itself says what to add to one's ~/.gdbinit.
+# The commands and printers for gdb, which loads them with the library. It looks for a file with the
+# name of the library's real file and "-gdb.py", beside the library and, under the library's whole
+# path, in folders of its own. That file is a link to the script, which has its package beside it.
+# gdb loads only files from folders that it trusts; in Debian these are below
+# /usr/share/gdb/auto-load. An install under /usr therefore has the link there, and every other one
+# beside the library, where gdb itself says what to add to ~/.gdbinit.
 
 set(gdbDir ${PROJECT_SOURCE_DIR}/tools/gdb)
 set(gdbLinkName $<TARGET_FILE_NAME:MemPool>-gdb.py)
-set(gdbLibraries "")  # Those that gdb finds its script with, and the folders they are installed in.
+set(gdbLibraries "")  # The libraries with a link, and the folders they are installed in.
 set(gdbLibraryDirs "")
 set(gdbComponents "")
 if(MEMPOOL_IS_SHARED)
@@ -27,14 +27,14 @@ foreach(library IN LISTS gdbLibraries)
 endforeach()
 
 if(OBR_MEMPOOL_INSTALL)
-    # Two major versions of the library can be installed at once, each with its script.
+    # Two major versions of the library can be installed at once, each with its own script.
     set(installedGdbDir ${CMAKE_INSTALL_DATADIR}/ObrMemPool-${PROJECT_VERSION_MAJOR}/gdb)
     install(FILES ${gdbDir}/autoload.py DESTINATION ${installedGdbDir} COMPONENT runtime)
     install(DIRECTORY ${gdbDir}/obrmempool DESTINATION ${installedGdbDir} COMPONENT runtime
         FILES_MATCHING PATTERN *.py PATTERN __pycache__ EXCLUDE)
 endif()
 if(OBR_MEMPOOL_INSTALL AND MEMPOOL_IS_SHARED)
-    # The prefix is known when it is installed. A folder that is given by its whole path stays.
+    # The prefix is known only at the install. A folder with an absolute path ignores it.
     foreach(dir component IN ZIP_LISTS gdbLibraryDirs gdbComponents)
         install(CODE "
             set(prefix \"\${CMAKE_INSTALL_PREFIX}\")
