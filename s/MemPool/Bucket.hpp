@@ -42,21 +42,21 @@ public:
 
     Bucket() = delete;
 
-    // The records that a bucket of at most `bucketSize` bytes of offsets has.
+    // The number of records in a bucket of at most `bucketSize` bytes of offsets.
     static std::uint32_t RecsWithin(std::uint32_t bucketSize, std::uint32_t recSize) {
         return (bucketSize - firstOffset) / recSize;
     }
 
-    // Makes a bucket of at most `bucketSize` (and 65535) bytes of offsets, all records FREE in the
-    // order of their addresses, on no list. `bucketSize` must leave room for one record.
+    // Makes a bucket of at most `bucketSize` bytes of offsets, which is at most 65535 and leaves
+    // room for a record. It is on no list. All records are FREE, in the order of their addresses.
     static Bucket* Create(Group* parent, std::uint32_t bucketSize, std::uint32_t recDataSize);
 
-    // Releases a bucket's memory. Its header no longer describes a bucket then, as long as the heap
-    // leaves those bytes alone.
+    // Releases a bucket's memory. Until the heap reuses those bytes, the header shows that there is
+    // no bucket.
     static void Destroy(Bucket* bucket);
 
-    // The number of records, which is stored nowhere; 0 if the header is so damaged that there is
-    // room for none.
+    // The number of records, which is not stored; 0 if the header is so damaged that it has room
+    // for none.
     std::int32_t TotalRecs() const {
         if (recSize == 0 || size < firstOffset) { return 0; }
         return (std::int32_t{size} - std::int32_t{firstOffset}) / std::int32_t{recSize};
@@ -89,7 +89,7 @@ public:
         return record->Data();
     }
 
-    // For a bucket that will give the next record and may not have been touched for long.
+    // For a bucket whose first free record is taken next and may be cold.
     void PrefetchFirstFree() const { __builtin_prefetch(RecordAt(freeHead)); }
 
     // Puts the used record with these data in front of the free list.
@@ -107,8 +107,8 @@ public:
                                          baseDistance);
     }
 
-    // The owner that this header names, or null if it is not a bucket's: after a foreign pointer
-    // was followed, these may be any bytes.
+    // The owner that this header names, or null if it is not a bucket's: after a foreign pointer it
+    // may be any bytes.
     OBR_READS_FOREIGN const Group* Owner() const {
         const Group* group;
         std::memcpy(&group, &parent, sizeof group);

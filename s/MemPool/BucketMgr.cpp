@@ -1,5 +1,5 @@
-// The slow paths of a pool: building it, making a group, requests that are too large for a bucket
-// or traced, queries, and its end.
+// The slow paths of a pool: building and destroying it, making a group, requests that are too large
+// for a bucket or traced, and queries.
 
 #include "MemPool/BucketMgr.hpp"
 
@@ -16,7 +16,7 @@ namespace OBR::MemPool {
 namespace {
 
 constexpr std::uint32_t recHdrSize = sizeof(RecHdr);
-static_assert(recHdrSize == recordOverhead, "PoolSizes counts a record's header.");
+static_assert(recHdrSize == recordOverhead, "PoolSizes counts the header of a record.");
 
 }  // namespace
 
@@ -116,7 +116,7 @@ OBR_NOINLINE bool BucketMgr::FreeSlow(void* data) {
     return bucket != nullptr ? bucket->parent->Free(data, bucket) : FreeExtRec(data);
 }
 
-// Gives a heap record back; false if `data` is not a heap record's.
+// Frees a heap record; false if `data` is not a heap record's.
 OBR_NOINLINE bool BucketMgr::FreeExtRec(void* data) {
     if (ExtRec::LengthAt(data) == 0) { return false; }
     ExtRec* const extRec = ExtRec::Of(data);

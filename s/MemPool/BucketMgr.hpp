@@ -1,6 +1,6 @@
-// The pool of a Mgr: it copies the settings once, finds the size class of each request, and serves
-// the request from the class's Group, or from the heap if it is too large for a bucket or the pool
-// is disabled.
+// The pool of a Mgr. It copies the settings once, and finds the size class of each request. It
+// serves the request from the class's Group, or from the heap if the request is too large for a
+// bucket or the pool is disabled.
 
 #ifndef OBR_MEMPOOL_BUCKETMGR_HPP
 #define OBR_MEMPOOL_BUCKETMGR_HPP
@@ -36,7 +36,7 @@ public:
     ExtRec* extRecs = nullptr;     // Front of the list of heap records, the newest first.
     std::uint32_t numGroups = 0;   // Places in `groups`.
     std::uint32_t numExtRecs = 0;  // Heap records on the list.
-    std::uint32_t bucketSize;      // This and the next three are those of PoolSizes.
+    std::uint32_t bucketSize;      // This and the next three are as in PoolSizes.
     std::uint32_t dataAlignment;   // Data sizes are rounded up to a multiple of it.
     std::uint32_t maxRecordSize;   // Largest record in a bucket.
     std::uint32_t minRecordSize;   // Smallest record of the first class.
@@ -71,7 +71,7 @@ public:
         return group->Alloc();
     }
 
-    // Gives a block back. False for null and, in an enabled pool, for a foreign pointer.
+    // Frees a block. False for null and, in an enabled pool, for a foreign pointer.
     OBR_READS_FOREIGN bool Free(void* data) {
         if (OBR_UNLIKELY(data == nullptr)) { return false; }
         if (OBR_UNLIKELY(!enabled || Settings::trace)) { return FreeSlow(data); }
@@ -81,11 +81,11 @@ public:
         return bucket->parent->Free(data, bucket);
     }
 
-    // Gives all blocks back. The pool is as new.
+    // Drops all blocks. The pool is as new.
     void Clear();
 
     // The bucket of this pool that holds the used record at `data`, or null. `data` may be null or
-    // foreign. This and the next two behave alike in an enabled and a disabled pool.
+    // foreign. This and the next two are the same in an enabled and a disabled pool.
     OBR_READS_FOREIGN Bucket* FindBucket(void* data) const {
         if (data == nullptr) { return nullptr; }
         const std::uint32_t hdr = RecHdr::Of(data)->Word();

@@ -1,10 +1,10 @@
-// What the checked library does at each step of a block's life, to report a host's faults. There
-// (OBR_MEMPOOL_CHECKED) s/diagnostics/checked defines these functions. In the ordinary library they
-// are empty and cost no instruction.
+// What the checked library does at each step of a block's life to report faults of the host. In
+// that library (OBR_MEMPOOL_CHECKED) s/diagnostics/checked defines these functions. In the ordinary
+// library they are empty and cost no instruction.
 //
-// The checked library gives each bucket one record of exactly the size asked for and releases it
-// when the record is freed, whatever the settings are: each block is a heap block of its own, which
-// ends where the data end, and tools that watch the heap see it.
+// The checked library gives each bucket one record of exactly the requested size, and releases the
+// bucket when the record is freed, whatever the settings are. Each block is thus a heap block that
+// ends where the data ends, so that tools which watch the heap see it.
 
 #ifndef OBR_MEMPOOL_CHECKED_HPP
 #define OBR_MEMPOOL_CHECKED_HPP
@@ -22,11 +22,11 @@ namespace Checked {
 
 #ifdef OBR_MEMPOOL_CHECKED
 
-// A pool that is being built rounds no sizes, whatever the settings say; or to the multiple that
-// the variable MEMPOOL_CHECK_ALIGNMENT says.
+// Makes a new pool round no sizes, whatever the settings say, or round them up to a multiple of
+// MEMPOOL_CHECK_ALIGNMENT if that variable is set.
 void KeepSizesExact(BucketMgr& pool);
 
-// What a group gets in place of its pool's settings.
+// A group's settings, instead of its pool's.
 inline std::uint32_t BucketSize(std::uint32_t, std::uint32_t recDataSize) {
     return firstOffset + recDataSize + std::uint32_t{sizeof(RecHdr)};
 }
@@ -34,13 +34,13 @@ inline bool KeepsEmptyBuckets(bool) {
     return false;
 }
 
-// While it lives, an operation of the host's runs on the pool. An operation of another thread at
-// the same time is reported, once for each pool, and waits for this one.
+// Lives while an operation of the host runs on the pool. An operation of another thread at the same
+// time is reported, once per pool, and waits for this one.
 class Use {
 public:
     explicit Use(const BucketMgr& bucketMgr);
 
-    // The pool ends. Another one may be built at its address.
+    // The pool is being destroyed. Another one may be built at its address.
     void IsLast() const;
 
 private:
@@ -51,18 +51,18 @@ private:
     std::unique_lock<std::recursive_mutex> lock;
 };
 
-// A block of `size` bytes was taken from the pool. Returns it. If there is no memory for the notes
-// on it, gives it back and throws std::bad_alloc.
+// Notes a block of `size` bytes that was taken from the pool, and returns it. If there is no memory
+// for the note, frees the block and throws std::bad_alloc.
 void* Taken(BucketMgr& pool, void* data, std::uint32_t size);
 
-// Whether the pool may be asked about a block, or may release it; if not, the host's answer is
-// false as well. A refused release is reported. A damaged header is reported and repaired, so that
-// the pool can use it.
+// Whether the pool may answer a query about a block, or may release it. Otherwise the operation of
+// the host returns false. A refused release is reported. A damaged header is reported and repaired,
+// so that the pool can use it.
 bool MayAskAbout(const BucketMgr& pool, const void* data);
 bool MayRelease(BucketMgr& pool, void* data);
 
-// All blocks of the pool are about to be released: by Clear, or at its end, where those still in
-// use are reported.
+// All blocks of the pool are about to be released: by Clear, or because the pool is destroyed. The
+// latter reports the blocks still in use.
 void BeforeClear(const BucketMgr& pool);
 void BeforeEnd(const BucketMgr& pool);
 

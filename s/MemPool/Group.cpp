@@ -17,7 +17,7 @@ OBR_NOINLINE void* Group::AllocFromNewBucket() {
     return Alloc();
 }
 
-// The front bucket has given away its last free record, which has these data.
+// The last free record of the front bucket, the one with these data, was taken.
 OBR_NOINLINE void* Group::UnlinkFull(void* data) {
     --numFreeBuckets;
     freeBuckets = freeBuckets->next2;
@@ -28,8 +28,8 @@ OBR_NOINLINE void* Group::UnlinkFull(void* data) {
     return data;
 }
 
-// A bucket with a free record enters in front. Its prev2 is null already: a bucket that becomes
-// full leaves from the front, and a new one has no links.
+// Puts a bucket with a free record in front. Its prev2 is null already: a bucket that becomes full
+// leaves from the front, and a new one has no links.
 OBR_NOINLINE bool Group::LinkFree(Bucket* bucket) {
     ++numFreeBuckets;
     bucket->next2 = freeBuckets;
@@ -38,7 +38,7 @@ OBR_NOINLINE bool Group::LinkFree(Bucket* bucket) {
     return true;
 }
 
-// A bucket's last used record has come back. A bucket of a single record was full until then.
+// A bucket's last used record was freed. If the bucket has a single record, it was full.
 OBR_NOINLINE bool Group::FreeLastUsed(Bucket* bucket) {
     const bool wasFull = totalRecs == 1;
     if (keepEmptyBuckets) { return wasFull ? LinkFree(bucket) : true; }

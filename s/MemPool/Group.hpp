@@ -1,5 +1,5 @@
-// All buckets of one record size of one pool: takes records and gives them back, and decides when a
-// bucket is made and when it is released.
+// All buckets of one record size of one pool. A group allocates and frees records, and decides when
+// a bucket is made and when it is released.
 
 #ifndef OBR_MEMPOOL_GROUP_HPP
 #define OBR_MEMPOOL_GROUP_HPP
@@ -13,7 +13,7 @@ namespace OBR::MemPool {
 
 class BucketMgr;
 
-// With OBR_MEMPOOL_CHECKS, checks a bucket's free list each time it gives or takes back a record.
+// With OBR_MEMPOOL_CHECKS, checks a bucket's free list after each record that is taken or freed.
 #ifdef OBR_MEMPOOL_CHECKS
 inline void CheckTouched(const Bucket& bucket) {
     bucket.CheckFreeList();
@@ -63,7 +63,7 @@ public:
         return OBR_UNLIKELY(bucket->numFree == 0) ? UnlinkFull(data) : data;
     }
 
-    // Gives back a used record of `bucket`. False, with nothing changed, for null data or another
+    // Frees a used record of `bucket`. False, with nothing changed, for null data or another
     // group's bucket.
     bool Free(void* data, Bucket* bucket) {
         if (OBR_UNLIKELY(bucket->parent != this || data == nullptr)) { return false; }
@@ -77,8 +77,8 @@ public:
     void DestroyBuckets();
 
 private:
-    // Slow paths. Each returns what its caller returns, so that the call is the last thing that the
-    // fast path does: it becomes a jump, which needs no saved register and no stack frame.
+    // Slow paths. Each returns what its caller returns, so that the call is a tail call: a jump,
+    // for which the fast path saves no register and needs no stack frame.
     void* AllocFromNewBucket();
     void* UnlinkFull(void* data);
     bool LinkFree(Bucket* bucket);

@@ -49,11 +49,11 @@ public:
     const std::vector<Mgr*>& Sharers() const { return sharers; }
     void AddSharer(Mgr* handle);
 
-    // For a handle that is being destroyed: no pool refers to it from now on.
+    // For a handle that is being destroyed: makes no pool refer to it any more.
     void ForgetHandle(Mgr* handle);
 
 private:
-    // Members of a union are not destroyed by themselves.
+    // Members of a union are not destroyed automatically.
     union {
         Pools pools;
     };

@@ -40,7 +40,7 @@
 namespace OBR::MemPool {
 
 // Keeps the stores to a block that is about to be released. An optimiser would drop them as dead,
-// but by them the pool recognises a pointer that is freed again after its block is gone.
+// but they let the pool recognise a pointer that is freed again after its block is gone.
 inline void KeepStores(const void* block) {
     __asm__ volatile("" : : "r"(block) : "memory");
 }
@@ -70,13 +70,12 @@ constexpr const char* RecKindName(std::uint8_t type) {
 
 // A record's header. A record may start at any address, so its header is copied as bytes, with the
 // low byte of the link first; the compiler makes one load or store of a copy. All four bytes are
-// copied at once for speed: most records are freed soon after they were taken, or taken soon after
-// they were freed, and store-to-load forwarding needs a load of the bytes that were stored
-// together.
+// copied at once for speed: a header is often read soon after it was written, and store-to-load
+// forwarding needs a load of the bytes that were stored together.
 struct RecHdr {
     std::uint8_t link[2];  // FREE: offset of the next free record; USED: own offset; EXT: AA BB.
     std::uint8_t type;     // typeFree, typeUsed or typeExt.
-    std::uint8_t guard;    // EXT: CC. In a bucket it stays what the heap's memory held.
+    std::uint8_t guard;    // EXT: CC. In a bucket it is never written.
 
     OBR_READS_FOREIGN std::uint32_t Word() const {
         std::uint32_t word;
@@ -104,8 +103,8 @@ struct RecHdr {
         return offset;
     }
 
-    // Makes a FREE record of raw memory. Two stores are faster than one of all four bytes, for
-    // which the guard would have to be read first.
+    // Makes raw memory a FREE record. Two stores are faster than one of all four bytes, which would
+    // have to read the guard first.
     void Format(std::uint16_t newLink) {
         std::memcpy(link, &newLink, sizeof link);
         type = typeFree;

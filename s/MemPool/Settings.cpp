@@ -1,4 +1,4 @@
-// How the settings are stored: by the exported accessors, and at the start-up from the environment.
+// Stores the settings: through the exported accessors, and at the start-up from the environment.
 
 #include "MemPool/Settings.hpp"
 
@@ -68,7 +68,7 @@ void NUV_OBR_MEMPOOL_TRACE(bool trace) {
     Settings::trace = trace;
 }
 
-// Kept for compatibility: readers of reports know the library by this text.
+// Kept for compatibility: programs that read reports know the library by this text.
 const char* GetVersion() {
     return "$Id: MemPool,v 1.2.52.4 2009/08/10 21:28:15 qvw Exp $";
 }
@@ -116,7 +116,7 @@ void ReadEnvironment() {
 
 }  // namespace
 
-// The trace stays what it was: its variable can only turn it on.
+// Leaves the trace as it is: its variable can only turn it on.
 EnvInit::EnvInit() {
     Settings::pool = PoolSettings();
     Settings::off = true;

@@ -1,4 +1,4 @@
-// The settings of the process: plain values, which every layer may read. Settings.cpp stores them.
+// The settings of the process: plain values that every layer may read. Settings.cpp stores them.
 
 #ifndef OBR_MEMPOOL_SETTINGS_HPP
 #define OBR_MEMPOOL_SETTINGS_HPP
@@ -19,8 +19,8 @@ OBR_HIDDEN extern bool trace;         // Read at every event of every pool.
 }  // namespace Settings
 
 // The constructor is the start-up: it stores the defaults, reads the environment and prints the
-// banner if asked to. If the minimum record size is not below the maximum then, it throws a text,
-// const char*, which lives as long as the library.
+// banner if asked to. If the minimum record size is then not below the maximum, it throws a const
+// char*, whose text lives as long as the library.
 class EnvInit {
 public:
     EnvInit();

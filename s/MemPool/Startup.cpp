@@ -3,9 +3,9 @@
 // and the settings start up (which may throw). On unload the exit step releases the registry's own
 // nodes and nothing else.
 //
-// A program can link the library as an archive. These objects are constructed before the host's
-// statics then too, and since the data is defined here, every operation of the library links this
-// file into the program.
+// A program can link the library as an archive. These objects are then still constructed before the
+// host's statics. Every operation of the library links this file into the program, since the data
+// is defined here.
 
 #include <ios>
 

@@ -1,4 +1,4 @@
-// The functions of MemPoolHeap.h: each is one call of a Heap, and keeps the reason if that fails.
+// The functions of MemPoolHeap.h. Each calls a Heap and keeps the reason of a failure.
 
 #include "MemPoolC/Heap.hpp"
 
@@ -31,14 +31,14 @@ constexpr const char* exhausted = "out of memory";
 constexpr const char* foreign = "not a block of this heap";
 constexpr const char* unknownFields = "struct_size is not the size of the struct";
 
-// Why an allocation of that size fails.
+// Sets the error of an allocation of that size. Returns null.
 void* NoBlock(std::size_t size) {
     SetError(size > Heap::MaxSize() ? "the size is above the maximum of 1073733632" : exhausted);
     return nullptr;
 }
-static_assert(Heap::MaxSize() == 1073733632, "The maximum is the one that the error names.");
+static_assert(Heap::MaxSize() == 1073733632, "The error names the maximum.");
 
-// The settings as this version knows them, from a host compiled with an older or a newer one.
+// The settings that this version knows, from a host compiled with this, an older or a newer one.
 obr_heap_settings Known(const obr_heap_settings& theirs) {
     obr_heap_settings ours = {};
     if (theirs.struct_size < sizeof theirs.struct_size) {
@@ -52,34 +52,34 @@ obr_heap_settings Known(const obr_heap_settings& theirs) {
     return ours;
 }
 
-void Say(HeapSettings& settings, HeapSettings& (HeapSettings::*word)(bool), int value) {
+void Set(HeapSettings& settings, HeapSettings& (HeapSettings::*set)(bool), int value) {
     if (value < OBR_HEAP_DEFAULT || value > OBR_HEAP_OFF) {
         throw std::invalid_argument("a setting is neither OBR_HEAP_ON nor OBR_HEAP_OFF");
     }
-    if (value != OBR_HEAP_DEFAULT) { (settings.*word)(value == OBR_HEAP_ON); }
+    if (value != OBR_HEAP_DEFAULT) { (settings.*set)(value == OBR_HEAP_ON); }
 }
 
-void Say(HeapSettings& settings, HeapSettings& (HeapSettings::*word)(std::size_t),
+void Set(HeapSettings& settings, HeapSettings& (HeapSettings::*set)(std::size_t),
          std::size_t value) {
-    if (value != 0) { (settings.*word)(value); }
+    if (value != 0) { (settings.*set)(value); }
 }
 
-HeapSettings SettingsFrom(const obr_heap_settings* said) {
+HeapSettings SettingsFrom(const obr_heap_settings* theirs) {
     HeapSettings settings;
     settings.On(true);
-    if (said == nullptr) { return settings; }
-    const obr_heap_settings known = Known(*said);
-    Say(settings, &HeapSettings::On, known.pools);
-    Say(settings, &HeapSettings::KeepEmptyBuckets, known.keep_empty_buckets);
-    Say(settings, &HeapSettings::BucketSize, known.bucket_size);
-    Say(settings, &HeapSettings::MaxRecordSize, known.max_record_size);
-    Say(settings, &HeapSettings::MinRecordSize, known.min_record_size);
-    Say(settings, &HeapSettings::DataAlignment, known.data_alignment);
-    Say(settings, &HeapSettings::Alignment, known.alignment);
+    if (theirs == nullptr) { return settings; }
+    const obr_heap_settings known = Known(*theirs);
+    Set(settings, &HeapSettings::On, known.pools);
+    Set(settings, &HeapSettings::KeepEmptyBuckets, known.keep_empty_buckets);
+    Set(settings, &HeapSettings::BucketSize, known.bucket_size);
+    Set(settings, &HeapSettings::MaxRecordSize, known.max_record_size);
+    Set(settings, &HeapSettings::MinRecordSize, known.min_record_size);
+    Set(settings, &HeapSettings::DataAlignment, known.data_alignment);
+    Set(settings, &HeapSettings::Alignment, known.alignment);
     return settings;
 }
 
-// The report as a text. It is printed through std::cout, which is lent for that time.
+// The report as a text. Report prints to std::cout, which is redirected meanwhile.
 std::string ReportOf(const Heap& heap) {
     std::ostringstream report;
     const std::ios_base::iostate state = std::cout.rdstate();

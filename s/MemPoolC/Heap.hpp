@@ -1,4 +1,4 @@
-// What an obr_heap of MemPoolHeap.h is.
+// The definition of obr_heap of MemPoolHeap.h.
 
 #ifndef OBR_MEMPOOLC_HEAP_HPP
 #define OBR_MEMPOOLC_HEAP_HPP

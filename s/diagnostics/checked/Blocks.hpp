@@ -1,5 +1,5 @@
 // The blocks of all pools, by the address of their data: the living ones, each with its header as
-// the library left it, and the freed ones. A block's memory is read once, when the block is added.
+// the library left it, and the freed ones. The memory of a block is read only when it is added.
 
 #ifndef OBR_DIAGNOSTICS_BLOCKS_HPP
 #define OBR_DIAGNOSTICS_BLOCKS_HPP
@@ -25,7 +25,7 @@ struct Layout {
         const char* name;
     };
     std::size_t size;  // Of the header.
-    std::size_t next;  // Where in it the links stand.
+    std::size_t next;  // Offsets of the links in it.
     std::size_t prev;
     std::array<Field, 12> fields;
 };
@@ -58,7 +58,7 @@ class Blocks {
 public:
     using ByAddress = std::unordered_map<const char*, Block>;
 
-    // The freed ones too.
+    // Including the freed ones.
     const ByAddress& All() const { return blocks; }
 
     // The living block whose data start there, or null.
@@ -71,10 +71,10 @@ public:
     // Adds a block that was just taken; its header says what it is.
     Block& Add(const BucketMgr& pool, const char* data, std::uint32_t size);
 
-    // Marks a living block as freed. Its address stays known until another block has it.
+    // Marks a living block as freed. Its address stays known until another block starts there.
     static void Release(Block& block) { block.pool = nullptr; }
 
-    // Takes a block out of its neighbours' links, before it is released by itself.
+    // Removes a block from its neighbours' links, before it alone is released.
     void Unlink(const Block& block);
 
 private:

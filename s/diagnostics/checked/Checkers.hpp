@@ -1,6 +1,6 @@
-// What the checkers that may watch the host, AddressSanitizer and Valgrind, know and can be told.
-// The library needs neither: AddressSanitizer's interface is there if the host brings it, and
-// Valgrind's is a few instructions that do nothing elsewhere.
+// The interface to AddressSanitizer and Valgrind, which may watch the host. The library needs
+// neither: AddressSanitizer's functions exist only if the host brings them, and Valgrind's requests
+// are a few instructions that do nothing outside of Valgrind.
 
 #ifndef OBR_DIAGNOSTICS_CHECKERS_HPP
 #define OBR_DIAGNOSTICS_CHECKERS_HPP
@@ -9,15 +9,15 @@
 
 namespace OBR::MemPool::Checkers {
 
-// From now on AddressSanitizer reports accesses of the host to these bytes, or no longer. It marks
-// 8 bytes at a time, and leaves out the last bytes if they are fewer.
+// Start and stop AddressSanitizer's reports of accesses to these bytes. It marks 8 bytes at a time;
+// fewer bytes at the end stay unmarked.
 void Poison(const void* start, std::size_t size);
 void Unpoison(const void* start, std::size_t size);
 
 // Prints the stack of the caller.
 void PrintStack();
 
-// Prints what is known of an address: where its block was taken, and where it was released.
+// Prints what the checker knows about an address: where its block was allocated and freed.
 void PrintHistory(const void* address);
 
 }  // namespace OBR::MemPool::Checkers

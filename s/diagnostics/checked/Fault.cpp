@@ -1,6 +1,6 @@
-// Only a handler of on_exit learns the status that the process is to end with. This one is
-// registered before main and outside of any library, so that it runs after the destructors of the
-// host and of every library. It also flushes C's streams, which would come after it.
+// Only a handler of on_exit learns the exit status. This one is registered before main and does not
+// belong to any library, so that it runs after the destructors of the host and of every library. It
+// also flushes C's streams, since the process ends here.
 
 #include "diagnostics/checked/Fault.hpp"
 
@@ -13,8 +13,8 @@
 #include "HostLayer/HostEnv.hpp"
 #include "diagnostics/checked/Variables.hpp"
 
-// Null if the host has no LeakSanitizer. If that has not run yet and finds a leak, it ends the
-// process with a status of its own.
+// Null if the host has no LeakSanitizer. The check runs once; if it finds a leak, it ends the
+// process with its own status.
 // NOLINTNEXTLINE(bugprone-reserved-identifier,readability-identifier-naming)
 extern "C" __attribute__((weak, visibility("default"))) void __lsan_do_leak_check();
 

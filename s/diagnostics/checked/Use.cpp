@@ -1,10 +1,11 @@
-// Finds pools that two threads use at the same time. An operation holds a lock of its pool; where
-// another thread holds it, that is the fault. Threads that take turns, by a lock of the host's or
-// by a join, never meet here.
+// Finds pools that two threads use at the same time. An operation holds a lock of its pool. If it
+// finds the lock held by another thread, that is the fault. Threads that take turns, through a lock
+// of the host or a join, never meet here.
 //
-// Operations are short and rarely meet. So when a pool changes threads, the first operation of the
-// new one lasts a moment longer, in which the former one may come. A limit keeps hosts fast whose
-// threads take turns.
+// Operations are short, so those of two threads rarely overlap. When a pool changes threads, the
+// first operation of the new thread therefore waits a moment while it holds the lock, so that the
+// former thread may run into it. The number of waits is limited, so that hosts whose threads take
+// turns stay fast.
 
 #include <pthread.h>
 #include <unistd.h>

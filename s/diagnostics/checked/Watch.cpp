@@ -1,9 +1,9 @@
-// Watches the steps of a block's life: a release that the pool cannot carry out is refused, and a
-// header is compared with what the library left there before the pool relies on it. Each fault is a
-// line on standard error.
+// Watches the steps of a block's life. A release that the pool cannot carry out is refused. Before
+// the pool relies on a header, the header is compared with what the library left there. Each fault
+// is a line on standard error.
 //
 // The notes on the blocks are shared by the pools of all threads and therefore locked. The lock is
-// recursive: a trace line can run code of the host, its stream's, which may use a pool.
+// recursive: a trace line can run code of the host's stream, which may use a pool.
 
 #include <algorithm>
 #include <cstdlib>
@@ -24,7 +24,7 @@ namespace OBR::MemPool::Checked {
 
 namespace {
 
-// What a used record's guard is here. The pool leaves that byte alone.
+// The guard of a used record. The pool itself does not use that byte.
 constexpr std::uint8_t usedGuard = 0xCC;
 
 std::recursive_mutex mutex;
@@ -33,7 +33,7 @@ using Lock = std::lock_guard<std::recursive_mutex>;
 // Never destroyed: a host may destroy a pool after the library's exit step.
 Blocks& blocks = *new Blocks;
 
-bool hasReportedAtExit = false;  // What lives.
+bool hasReportedAtExit = false;  // The living blocks.
 
 std::string Count(std::size_t count, const std::string& unit) {
     return std::to_string(count) + " " + unit + (count == 1 ? "" : "s");
@@ -63,7 +63,7 @@ void ReportDamage(const Block& block, const char* data, const unsigned char* sta
     Checkers::PrintHistory(data);
 }
 
-// Reports a damaged header, and mends it.
+// Reports and repairs a damaged header.
 void Verify(const Block& block, const char* data) {
     char* const start = const_cast<char*>(data) - block.layout->size;
     Checkers::Unpoison(start, block.layout->size);
@@ -79,13 +79,13 @@ void VerifyNeighbour(const Block& block, std::size_t link) {
     if (const Block* const neighbour = blocks.Find(data)) { Verify(*neighbour, data); }
 }
 
-// Marks a block as freed. Its header is the heap's again.
+// Marks a block as freed. Its header belongs to the heap again.
 void Release(Block& block, const char* data) {
     Checkers::Unpoison(data - block.layout->size, block.layout->size);
     Blocks::Release(block);
 }
 
-// visit(block, its data) for the living blocks of a pool. It may release the block.
+// Calls visit(block, its data) for the living blocks of a pool. It may release the block.
 template <typename Visit>
 void ForEachBlock(const BucketMgr& pool, Visit visit) {
     const auto walk = [&](const void* first, const Layout& layout) {
@@ -103,12 +103,12 @@ void ForEachBlock(const BucketMgr& pool, Visit visit) {
     }
 }
 
-// Only Clear releases a heap record of 0 bytes. That it lives is no fault of the host's.
+// Only Clear releases a heap record of 0 bytes. That it still lives is not the host's fault.
 bool HasNoBytes(const Block& block) {
     return block.IsHeapRecord() && block.size == 0;
 }
 
-// Reports what was never freed, and where the first blocks of it were taken.
+// Reports the blocks that were never freed, and where the first of them were allocated.
 void ReportLiving(const BucketMgr& pool) {
     constexpr std::size_t maxHistories = 3;
     std::vector<const char*> living;
@@ -137,7 +137,7 @@ std::string Reason(const BucketMgr& pool, const void* data, const char* known) {
            " into the block at " + PtrText(known);
 }
 
-// Reports a release that is refused. Returns false.
+// Reports a refused release. Returns false.
 bool Refuse(const BucketMgr& pool, const void* data) {
     TraceLine::BlockFreed(&pool, data);
     const char* const known = blocks.Around(data);

@@ -1,5 +1,5 @@
 // The report of a pool, and the exported operations that print it for one pool or for all. A pool
-// keeps no statistics: the figures are gathered from its buckets first and printed then.
+// keeps no statistics: its figures are gathered from its buckets and then printed.
 
 #include <iomanip>
 #include <iostream>
@@ -17,7 +17,7 @@ namespace OBR::MemPool {
 
 namespace {
 
-// The smallest bucket size that the report advises; not enforced.
+// The smallest bucket size according to the report; not enforced.
 constexpr std::uint32_t minBucketSize = 128;
 
 struct Figures {
@@ -107,15 +107,15 @@ void BucketMgr::DbgReport(std::ostream& stream, std::uint32_t level, bool showBu
 namespace {
 
 // A failed write is silent unless the host has enabled the stream's exceptions. But std::bad_alloc
-// while the stream's buffer grows leaves the report, as it does elsewhere: the stream would swallow
-// it and print half a number.
+// while the stream's buffer grows is thrown on, as everywhere else: the stream would swallow it
+// after half a number.
 void Print(const BucketMgr& pool, bool detailed) {
     const Checked::Use use(pool);
-    const std::ios::iostate told = std::cout.exceptions();
-    const bool tellsAll = (told & std::ios::badbit) != 0;
-    if (!std::cout.bad()) { std::cout.exceptions(told | std::ios::badbit); }
+    const std::ios::iostate enabled = std::cout.exceptions();
+    const bool throwsAll = (enabled & std::ios::badbit) != 0;
+    if (!std::cout.bad()) { std::cout.exceptions(enabled | std::ios::badbit); }
     const auto restore = [=] {
-        if (!tellsAll) { std::cout.exceptions(told); }
+        if (!throwsAll) { std::cout.exceptions(enabled); }
     };
     try {
         pool.DbgReport(std::cout, 0, detailed, detailed, detailed);
@@ -123,7 +123,7 @@ void Print(const BucketMgr& pool, bool detailed) {
         restore();
         throw;
     } catch (...) {
-        if (tellsAll) { throw; }
+        if (throwsAll) { throw; }
     }
     restore();
 }

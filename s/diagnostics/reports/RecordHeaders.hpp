@@ -1,6 +1,6 @@
 // The headers of records in a bucket that may be damaged. These functions read no byte beyond the
-// size that the bucket's header states: a record's header that does not fit there, its guard aside,
-// counts as one of unknown type without a link.
+// size that the bucket's header states. A record's header that does not fit there (its guard need
+// not) has an unknown type and no link.
 
 #ifndef OBR_DIAGNOSTICS_RECORDHEADERS_HPP
 #define OBR_DIAGNOSTICS_RECORDHEADERS_HPP

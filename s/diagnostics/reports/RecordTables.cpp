@@ -1,5 +1,4 @@
-// The three tables of a bucket: all its records, a histogram of the used ones, and its free list
-// from the head on.
+// The three tables of a bucket: all its records, a histogram of the used ones, and its free list.
 
 #include <algorithm>
 #include <ostream>

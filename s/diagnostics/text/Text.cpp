@@ -1,4 +1,4 @@
-// All addresses have one form, and one class makes its digits in place, without the heap.
+// Addresses have the same digits everywhere. One class makes them, without the heap.
 
 #include "diagnostics/text/Text.hpp"
 

@@ -1,4 +1,4 @@
-// The exact text of each traced event, and how it reaches the buffer of standard output whole.
+// The exact line of each traced event, written as a whole to the buffer of standard output.
 
 #include "diagnostics/text/TraceLine.hpp"
 
@@ -15,7 +15,7 @@ namespace OBR::MemPool::TraceLine {
 
 namespace {
 
-// Gives access to protected members of any stream buffer: how far its memory is filled.
+// Gives access to the protected members that say how far the memory of a stream buffer is filled.
 class Buffer : std::streambuf {
 public:
     struct Extent {
@@ -44,8 +44,8 @@ public:
 // Writes to the buffer directly, since the stream's operators use its width and its locale and may
 // throw. A stream in a failed state gets no line, like any other output.
 //
-// A buffer that must grow for a line and cannot (a string stream's, if memory is exhausted) keeps
-// the beginning of the line. That is removed, or the next line would be glued to it.
+// A buffer that cannot grow for a line (a string stream's, if memory is exhausted) keeps the
+// beginning of the line. That is removed, or the next line would be appended to it.
 void Write(FixedText& text) noexcept {
     if (!std::cout.good()) { return; }
     std::streambuf& buf = *std::cout.rdbuf();

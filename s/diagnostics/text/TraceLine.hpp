@@ -1,9 +1,9 @@
-// The four events of the trace, which write one line each on standard output. With the trace off an
+// The four events of the trace. Each writes one line on standard output. With the trace off an
 // event costs a call and a test of the setting.
 //
-// An event writes one whole line or nothing, and it never fails or changes what the pool does: a
-// line is built without the heap, and it neither uses nor changes the state of the stream, which
-// the host may have set. A line that cannot be written is silently dropped.
+// An event writes one whole line or nothing. It never fails, and never changes what the pool does.
+// A line is built without the heap, and writing it neither uses nor changes the state of the
+// stream, which the host may have set. A line that cannot be written is silently dropped.
 
 #ifndef OBR_DIAGNOSTICS_TRACELINE_HPP
 #define OBR_DIAGNOSTICS_TRACELINE_HPP
