@@ -1,8 +1,7 @@
 #!/usr/bin/env bash
 # Installs the missing Debian packages for the given jobs: build, tools, test, lint, package, docs, abi,
 # bench, fuzz, cross, coverage. Without root rights it prints the command that installs them, and fails.
-# `test` is the largest job: some 300 packages on a bare Debian, 400 MB to download and 1.7 GB on disk.
-# Chromium, for the test of the report's page, takes 290 MB of that.
+# docs/contributing.md says how large `test` is.
 set -euo pipefail
 
 packages=()
