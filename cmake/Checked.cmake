@@ -31,7 +31,7 @@ if(MEMPOOL_HAS_CHECKED)
     target_compile_options(MemPoolCheckedObjects PRIVATE
         -fno-omit-frame-pointer -fno-optimize-sibling-calls)
     mempool_library(MemPoolChecked SHARED MemPoolCheckedObjects)
-    mempool_shared(MemPoolChecked)
+    mempool_shared(MemPoolChecked ObrMemPool.map)
     set_target_properties(MemPoolChecked PROPERTIES
         LIBRARY_OUTPUT_DIRECTORY ${PROJECT_BINARY_DIR}/${checkedDir})
     if(OBR_MEMPOOL_INSTALL)

@@ -1,13 +1,7 @@
 # libObrMemPoolC: the heaps of MemPoolHeap.h, for C, over libObrMemPool. MemPoolC is the default form,
 # MemPoolCStatic the static library.
 
-add_library(MemPoolCObjects OBJECT s/MemPoolC/Heap.cpp)
-set_target_properties(MemPoolCObjects PROPERTIES
-    CXX_EXTENSIONS OFF
-    CXX_VISIBILITY_PRESET hidden
-    POSITION_INDEPENDENT_CODE ON)
-target_include_directories(MemPoolCObjects PUBLIC include s)
-target_link_libraries(MemPoolCObjects PRIVATE MemPoolFlags)
+mempool_objects(MemPoolCObjects s/MemPoolC/Heap.cpp)
 
 # mempool_c_library(NAME SHARED|STATIC LIBRARY)
 function(mempool_c_library name form library)
@@ -22,12 +16,7 @@ endfunction()
 
 if(MEMPOOL_IS_SHARED)
     mempool_c_library(MemPoolC SHARED MemPool)
-    set(map ${CMAKE_CURRENT_SOURCE_DIR}/cmake/ObrMemPoolC.map)
-    set_target_properties(MemPoolC PROPERTIES
-        VERSION ${PROJECT_VERSION}
-        SOVERSION ${PROJECT_VERSION_MAJOR}
-        LINK_DEPENDS ${map})
-    target_link_options(MemPoolC PRIVATE LINKER:--version-script=${map} LINKER:--gc-sections)
+    mempool_shared(MemPoolC ObrMemPoolC.map)
     if(NOT CMAKE_INSTALL_PREFIX STREQUAL "/usr")  # Where the loader looks anyway.
         set_target_properties(MemPoolC PROPERTIES INSTALL_RPATH $ORIGIN)
     endif()
