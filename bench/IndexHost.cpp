@@ -1,7 +1,7 @@
-// Indexes the words of the standard input in containers of std::pmr, and prints those that are on
-// most lines. The containers lie in a heap, which is dropped as a whole, or with --close destroyed
-// first; with --heap in std::pmr's resource over new and delete, and with --pmr in its pool for one
-// thread, which is dropped as a whole too.
+// Indexes the words of the standard input in std::pmr containers, and prints those that are on most
+// lines. The containers are in a heap, which is dropped as a whole; --close destroys them first.
+// With --heap they use std::pmr's resource over new and delete. With --pmr they are in its
+// unsynchronized pool, which is also dropped as a whole.
 
 #include <MemPoolHeap>
 

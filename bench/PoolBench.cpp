@@ -1,4 +1,4 @@
-// The pool and other allocators at the same work. A process runs one subject:
+// Measures the pool and other allocators at the same work. A process runs one subject:
 //
 //     PoolBench --subject=NAME [Google Benchmark's options]
 //
@@ -7,10 +7,10 @@
 // that replaces them, so that every malloc is measured through the same two calls into a shared
 // library. boost, for blocks of one size, and pmr, the standard's pool for one thread, are headers.
 //
-// Each row is a function over a subject. Sizes, orders and traces are made before the clock runs.
+// Each row is a function over a subject. Sizes, orders and traces are made before the clock starts.
 // The first byte of every block is written. The time is that of one operation: an Alloc, a Free, an
 // event of a trace, or a block that is built and dropped. The rows "live N" and "drop N" show how
-// cost grows with work.
+// the cost grows with N.
 
 #include <MemPoolHeap>
 
@@ -49,7 +49,7 @@ using OBR::MemPool::Mgr;
 
 using Blocks = std::vector<void*>;
 
-// The subjects. Free is given the size, which some need. Containers use `memory`.
+// The subjects. Free gets the size, which some need. Containers use `memory`.
 
 // Its blocks are aligned to 4 bytes only, which is enough on x86-64.
 class MgrMemory : public std::pmr::memory_resource {

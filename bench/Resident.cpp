@@ -1,10 +1,10 @@
-// What a live block costs in memory. A process measures one subject and one size:
+// Measures what a live block costs in memory. A process measures one subject and one size:
 //
 //     Resident pool|heap|boost|pmr SIZE
 //
-// prints the resident bytes per block and, for the pool, the bytes per block that it holds from the
-// heap. heap is malloc or, with LD_PRELOAD, what replaces it. All blocks are written whole, and
-// together they are large compared with the rest of the process.
+// It prints the resident bytes per block and, for the pool, the bytes per block that it has
+// allocated from the heap. heap is malloc or, with LD_PRELOAD, the allocator that replaces it. All
+// blocks are written completely, and together they are large compared with the rest of the process.
 
 #include <MemPool>
 

@@ -1,5 +1,5 @@
 // Runs a Ruby program in mruby, whose interpreter takes every block from a heap. The options are
-// those of examples/JsHost.cpp, and so is what they do.
+// those of examples/JsHost.cpp.
 
 #include <MemPoolHeap>
 

@@ -47,8 +47,8 @@ struct Node {
 };
 
 // The tree of a unit on pools. A compiler frees almost nothing before it drops the tree, so large
-// buckets are filled to the end and few are needed. No bucket runs empty before the drop, so it is
-// of no use to keep empty ones.
+// buckets are filled completely, and few are needed. No bucket becomes empty before the drop, so
+// keeping empty ones would not help.
 class PoolMemory {
 public:
     explicit PoolMemory(bool on)

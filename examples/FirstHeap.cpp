@@ -1,4 +1,4 @@
-// A heap with the calls of C. The README shows this program.
+// A heap with calls like those of C. The README shows this program.
 
 #include <MemPoolHeap>
 
@@ -7,5 +7,5 @@ int main() {
     void* block = heap.Malloc(24);  // As malloc, aligned to 8 bytes.
     block = heap.Realloc(block, 400);
     heap.Free(block);
-    heap.FreeAll();  // Drops at once whatever is left.
+    heap.FreeAll();  // Drops all remaining blocks at once.
 }

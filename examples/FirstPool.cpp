@@ -4,7 +4,7 @@
 #include <iostream>
 
 int main() {
-    OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);  // Pools built from now on carve records.
+    OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);  // For pools that are built from now on.
     OBR::MemPool::Mgr symbols("symbols");
 
     void* name = symbols.Alloc(10);
@@ -12,5 +12,5 @@ int main() {
     std::cout << symbols.GetSize(name) << " and " << symbols.GetSize(table) << " bytes\n";
 
     symbols.Free(name);
-    symbols.Clear();  // Drops at once whatever is left.
+    symbols.Clear();  // Drops all remaining blocks at once.
 }

@@ -1,10 +1,10 @@
 // Runs a JavaScript program in duktape, whose interpreter takes every block from a heap. When the
-// program is done the heap is dropped as a whole, in place of duk_destroy_heap, which gives back
-// block by block and runs finalizers: a program that counts on those wants --close. With --heap the
-// blocks come from the C library's malloc, for comparison.
+// program ends, the heap is dropped as a whole. duk_destroy_heap would free block by block and run
+// finalizers; use --close for a program that needs those. With --heap the blocks come from the C
+// library's malloc, for comparison.
 //
-// Programs find two functions: print(text), and readLine(), the next line of the standard input or
-// undefined at its end.
+// Programs can call print(text), and readLine(), which returns the next line of the standard input
+// or undefined at its end.
 
 #include <MemPoolHeap>
 
@@ -30,9 +30,9 @@ struct Options {
     bool close = false;
 };
 
-// duktape hands its context to each call. When one gives null it collects garbage, tries again, and
-// at last throws an error of the program's own. No exception crosses its frames: these operations
-// of a heap throw none.
+// duktape passes its context to each call. If one returns null, it collects garbage, tries again,
+// and finally throws an error in the JavaScript program. These operations of a heap throw nothing,
+// so no exception crosses duktape's frames.
 void* Malloc(void* heap, duk_size_t size) {
     return static_cast<Heap*>(heap)->Malloc(size);
 }
@@ -55,7 +55,7 @@ duk_ret_t ReadLine(duk_context* js) {
     return 1;
 }
 
-// Takes the text of the program. An error ends in the caller, which has its message.
+// Runs the text of a program. An error returns to the caller, which prints its message.
 duk_ret_t RunProgram(duk_context* js, void* text) {
     duk_push_c_function(js, Print, 1);
     duk_put_global_string(js, "print");
@@ -91,13 +91,13 @@ int Main(int argc, char** argv) {
         ->required()
         ->check(CLI::ExistingFile);
     app.add_flag("--heap", options.useMalloc, "Use the C library's malloc instead of pools");
-    app.add_flag("--off", options.off, "Disable pools: each block by itself, for a memory checker");
+    app.add_flag("--off", options.off, "Disable pools, so that a memory checker sees each block");
     app.add_flag("--close", options.close, "Run finalizers and free all blocks before the heap");
     CLI11_PARSE(app, argc, argv);
 
     std::ifstream input(options.program);
     const std::string text(std::istreambuf_iterator<char>(input), {});
-    std::ios::sync_with_stdio(false);  // Reading the standard input is not what is shown here.
+    std::ios::sync_with_stdio(false);  // Faster input: reading is not what is measured here.
     return Run(options, text) ? 0 : 1;
 }
 

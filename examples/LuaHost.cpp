@@ -29,13 +29,13 @@ using OBR::MemPool::HeapSettings;
 // An interpreter has hundreds of thousands of small blocks of few sizes, so it gains most from the
 // largest buckets: few are made, and blocks that are allocated together lie together. The collector
 // frees thousands of blocks at a time and almost empties a size class, so empty buckets are kept.
-// Records of up to 1000 bytes hold all objects and small tables; larger blocks are few.
+// Records of up to 1000 bytes hold all objects and small tables. There are few larger blocks.
 HeapSettings Settings(bool on) {
     return HeapSettings().On(on).BucketSize(65535).MaxRecordSize(1000).KeepEmptyBuckets(true);
 }
 
-// Lua's one call for all. Null makes Lua collect garbage, try again, and at last raise its own "not
-// enough memory". No exception crosses its frames.
+// Lua's allocator. If it returns null, Lua collects garbage, tries again, and finally raises its
+// own "not enough memory". No exception crosses Lua's frames.
 void* FromHeap(void* heap, void* block, std::size_t oldSize, std::size_t size) {
     return static_cast<Heap*>(heap)->Call(block, oldSize, size);
 }
@@ -68,7 +68,8 @@ int AddTraceback(lua_State* lua) {
     return 1;
 }
 
-// Takes the script's name. Runs in protected mode, since each call here can run out of memory.
+// Runs the script of that name. Called in protected mode, since each call here can run out of
+// memory.
 int RunScript(lua_State* lua) {
     const auto* const name = static_cast<const char*>(lua_touserdata(lua, 1));
     luaL_openlibs(lua);

@@ -27,7 +27,7 @@ using OBR::MemPool::Heap;
 using OBR::MemPool::HeapSettings;
 
 // SQLite has two kinds of blocks. The small ones of the parser and of prepared statements live as
-// long as a statement, so size classes often run empty, and empty buckets are kept. The pages of
+// long as a statement, so size classes often become empty, and empty buckets are kept. The pages of
 // the page cache, some 4360 bytes each, live long; as heap records they waste less memory than in
 // buckets. Few blocks live at a time, so larger buckets would not help.
 HeapSettings Settings(bool on) {

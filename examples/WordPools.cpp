@@ -1,7 +1,7 @@
 // Counts the words of texts. Each text has a pool, named after its file, in which every line and
-// every distinct word is a block: a record of a bucket, or a heap record if it is long. All texts
-// live until they have been reported, and then each is dropped: with one Clear, or block by block
-// if pools are off. The last line of the output has the times and the memory that this took.
+// every distinct word is a block: a record of a bucket, or a heap record if it is long. After all
+// texts have been reported, each is dropped: with one Clear, or block by block if pools are off.
+// The last line of the output has the times and the memory that this took.
 
 #include <MemPool>
 
@@ -155,7 +155,7 @@ void ReadFile(Text& text, const std::string& file, Progress& progress) {
     text.Read(input, progress);
 }
 
-// Returns whether the file could be read. If it could not, there is no text of it.
+// Returns whether the file could be read. Otherwise no text is added.
 bool AddText(std::deque<Text>& texts, const std::string& file, Progress& progress) {
     const auto refuse = [&, numBefore = texts.size()](const char* reason) {
         if (texts.size() > numBefore) { texts.pop_back(); }
@@ -261,7 +261,7 @@ bool CountAll(const Options& options) {
 
 constexpr const char* description =
     R"(Counts the words of texts, with every line and distinct word in a pool named after its file.
-A word is a run of letters, digits and bytes above 127; capitals count as small letters.
+A word is a run of letters, digits and bytes above 127. Upper and lower case count as the same.
 
 The last line of the output has the processor time to read and to drop the texts, and the peak of
 resident memory.

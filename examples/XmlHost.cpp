@@ -1,6 +1,6 @@
-// Reads XML documents with libxml2, each into a heap of its own. When a document is done its heap
-// is dropped as a whole, in place of xmlFreeDoc, which walks the document and gives back node by
-// node. With --heap the blocks come from the C library's malloc, for comparison.
+// Reads XML documents with libxml2, each into a heap of its own. When a document is done, its heap
+// is dropped as a whole; xmlFreeDoc would walk the document and free node by node. With --heap the
+// blocks come from the C library's malloc, for comparison.
 
 #include <MemPoolHeap>
 
@@ -29,8 +29,8 @@ struct Options {
     bool close = false;
 };
 
-// libxml2's calls take no context. What it makes once for all documents must outlive them: as long
-// as no document is read, blocks come from `library`.
+// libxml2's hooks have no context argument. While no document is read, blocks come from `library`,
+// since data for all documents must outlive each of them.
 Heap* library = nullptr;
 Heap* document = nullptr;
 
@@ -38,7 +38,7 @@ void* Malloc(std::size_t size) {
     return (document != nullptr ? document : library)->Malloc(size);
 }
 
-// A block goes back to the heap that it came from: a heap refuses those of another.
+// A heap refuses the blocks of another heap.
 void Free(void* block) {
     if (document == nullptr || !document->Free(block)) { library->Free(block); }
 }
@@ -71,7 +71,7 @@ void Count(const xmlNode* node, Figures& figures) {
     }
 }
 
-// Reads from a descriptor: a name would be looked up in libxml2's catalogs, which it reads when it
+// Reads from a descriptor. libxml2 would look up a name in its catalogs, which it reads when it
 // first needs them, and which would then be dropped with the document.
 bool Read(const std::string& file, bool close) {
     const int descriptor = open(file.c_str(), O_RDONLY | O_CLOEXEC);
@@ -84,7 +84,7 @@ bool Read(const std::string& file, bool close) {
                     figures.textBytes);
         if (close) { xmlFreeDoc(made); }
     }
-    xmlResetLastError();  // A copy of the last message is the document's as well.
+    xmlResetLastError();  // The copy of the last message is in the document's heap too.
     return made != nullptr;
 }
 
@@ -109,7 +109,7 @@ int Main(int argc, char** argv) {
     CLI::App app("Reads XML files, each into a memory pool of its own.", "XmlHost");
     app.add_option("FILE", options.files, "XML files")->required()->check(CLI::ExistingFile);
     app.add_flag("--heap", options.useMalloc, "Use the C library's malloc instead of pools");
-    app.add_flag("--off", options.off, "Disable pools: each block by itself, for a memory checker");
+    app.add_flag("--off", options.off, "Disable pools, so that a memory checker sees each block");
     app.add_flag("--close", options.close, "Free each document node by node before its heap");
     CLI11_PARSE(app, argc, argv);
 

@@ -1,13 +1,13 @@
-/* Prints the outline of XML documents: which elements lie in which, and how many of each.
+/* Prints the outline of XML documents: which elements contain which, and how many of each.
 
        XmlOutline [--report] FILE...
 
    Each document has a heap of its own, for expat's blocks and for the outline. When the document is
-   done the heap is deleted, in place of a walk over the outline. --report prints the pool's report
-   before that, on standard error.
+   done, the heap is deleted, without a walk over the outline. --report first prints the pool's
+   report on standard error.
 
-   Expat's memory hooks take no context pointer, so the heap that they use is a variable of the
-   thread: threads can then work on documents of their own. */
+   Expat's memory hooks have no context argument, so the heap that they use is a thread-local
+   variable: each thread can then work on documents of its own. */
 
 #include <MemPoolHeap.h>
 
@@ -31,7 +31,7 @@ static void Free(void* block) {
 
 static const XML_Memory_Handling_Suite hooks = {Allocate, Reallocate, Free};
 
-/* All elements of one name in one place of the outline. */
+/* All elements with the same name in one place of the outline. */
 struct Element {
     struct Element* parent;
     struct Element* firstChild;
