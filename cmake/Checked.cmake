@@ -1,8 +1,8 @@
-# The checked library, which reports a host's faults: the library's own sources, compiled once more
-# with a watch on each block. It has the same name and interface and lies in a folder of its own, by
-# which a host picks it.
+# The checked library, which reports faults of the host: the library's own sources, compiled a second
+# time with checks of each block. It has the same name and interface, and a folder of its own, through
+# which a host selects it.
 #
-# A build with a sanitizer leaves it out. It must not be instrumented, since it reads memory that it
+# A build with a sanitizer leaves it out: it must not be instrumented, since it reads memory that it
 # has poisoned for the host.
 
 set(MEMPOOL_HAS_CHECKED OFF)
@@ -27,7 +27,7 @@ if(MEMPOOL_HAS_CHECKED)
     elseif(PROJECT_IS_TOP_LEVEL)
         message(STATUS "The checked library prints no stacks under Valgrind without the Debian package valgrind")
     endif()
-    # A checker follows the frames up to the host when it records where a block was taken.
+    # A checker follows the frames up to the host when it records where a block was allocated.
     target_compile_options(MemPoolCheckedObjects PRIVATE
         -fno-omit-frame-pointer -fno-optimize-sibling-calls)
     mempool_library(MemPoolChecked SHARED MemPoolCheckedObjects)
@@ -38,7 +38,7 @@ if(MEMPOOL_HAS_CHECKED)
         install(TARGETS MemPoolChecked
             LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR}/${checkedDir}
                 COMPONENT tools NAMELINK_SKIP)
-    elseif(NOT PROJECT_IS_TOP_LEVEL)  # A host that has the sources builds it if it asks for it.
+    elseif(NOT PROJECT_IS_TOP_LEVEL)  # Then the other project builds it on demand.
         set_target_properties(MemPoolChecked MemPoolCheckedObjects PROPERTIES EXCLUDE_FROM_ALL ON)
     endif()
 endif()

@@ -1,9 +1,9 @@
-# The commands and printers for gdb, which loads them with the library. It looks for a file with the
-# name of the library's real file and "-gdb.py", beside the library and, under the library's whole
-# path, in folders of its own. That file is a link to the script, which has its package beside it.
+# The commands and printers for gdb, which loads them with the library. gdb looks for a file with the
+# name of the library's real file and "-gdb.py", in the library's folder and, under the library's whole
+# path, in gdb's own folders. That file is a link to the script, which has its package beside it.
 # gdb loads only files from folders that it trusts; in Debian these are below
-# /usr/share/gdb/auto-load. An install under /usr therefore has the link there, and every other one
-# beside the library, where gdb itself says what to add to ~/.gdbinit.
+# /usr/share/gdb/auto-load. An install under /usr therefore has the link there. Every other one has it
+# beside the library, and gdb prints what to add to ~/.gdbinit.
 
 set(gdbDir ${PROJECT_SOURCE_DIR}/tools/gdb)
 set(gdbLinkName $<TARGET_FILE_NAME:MemPool>-gdb.py)

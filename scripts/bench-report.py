@@ -1,9 +1,9 @@
 #!/usr/bin/env python3
-"""Writes docs/performance.md from what bench-run.py measured, for scripts/bench.sh.
+"""Writes docs/performance.md from the results of bench-run.py, for scripts/bench.sh.
 
 usage: bench-report.py RESULTS OUTPUT
 
-The figures for the pictures go beside RESULTS, as ratios.dat, growth.dat and hosts.dat.
+Writes the figures for the pictures beside RESULTS, as ratios.dat, growth.dat and hosts.dat.
 """
 
 import json
@@ -54,7 +54,7 @@ def median_ratio(own, other):
 
 
 class Measured:
-    """What each subject took for each row: figures by round, as times[subject][row]."""
+    """The time of each subject for each row: figures by round, as times[subject][row]."""
 
     def __init__(self, times):
         self.times = times
@@ -130,7 +130,7 @@ class Hosts:
 
 
 def goals(measured, rows, resident, hosts):
-    """(what, goal, measured): ratios that are to stay at or below their goals."""
+    """(what, goal, measured): ratios that should be at or below their goals."""
     one_size = "200k x 32, free in "
     beside_pmr = [row for row in rows if measured.ratio(row, "pmr") and row != "pair, no other block"]
     index = [work for work in hosts.plain if work.startswith("IndexHost")]
@@ -153,7 +153,7 @@ def goals(measured, rows, resident, hosts):
         ("traces, best setting, geometric mean / mimalloc", 1.15,
          measured.mean(TRACES, "mimalloc", "best")),
         ("the same, stretch", 1.0, measured.mean(TRACES, "mimalloc", "best")),
-        ("worst row but the empty pool's pair / pmr", 0.9, measured.worst(beside_pmr, "pmr")),
+        ("worst row except the empty pool's pair / pmr", 0.9, measured.worst(beside_pmr, "pmr")),
         ("all those rows, geometric mean / pmr", 0.5, measured.mean(beside_pmr, "pmr")),
     ] + [
         (f"resident bytes of {size} / best malloc", 1.0,
@@ -219,28 +219,28 @@ def machine():
 
 def resident_tables(resident, held):
     subjects = [subject for subject in ["pool"] + PEERS if subject in resident]
-    yield from table(["bytes asked"] + subjects,
+    yield from table(["bytes requested"] + subjects,
                      ([str(size)] + [number(resident[subject][size], 1) for subject in subjects]
                       for size in sorted(held)))
-    yield "What the pool itself counts at its default settings: the bytes that it holds from the heap,"
-    yield "the part of them beyond those asked for, and what of that is left without bucket headers and"
-    yield "tails. A pool rounds a size up to a multiple of 4; all sizes here are one."
+    yield "The pool's own count, at its default settings: the bytes per block that it holds, those of them"
+    yield "that the program did not request, and the latter without bucket headers and tails. A pool"
+    yield "rounds sizes up to a multiple of 4; all sizes here are one."
     yield ""
     lines = []
     for size, bytes_held in sorted(held.items()):
         header = 48 / ((4010 - 2) // (size + 4))
         lines.append([str(size), number(bytes_held), number(bytes_held - size), number(header),
                       number(bytes_held - size - header)])
-    yield from table(["bytes asked", "held per block", "overhead", "of it bucket header and tail",
-                      "the rest"], lines)
+    yield from table(["bytes requested", "held per block", "overhead", "bucket header and tail",
+                      "the rest of the overhead"], lines)
 
 
 def hosts_section(hosts):
     yield from ["## Whole programs", "",
-                "Each program reads an input of 20 MB that `bench/make-inputs.py` makes and prints the same on",
-                "every memory. A `Heap` has its default settings: the program says only its name and that it is",
-                "on. It is freed block by block, or dropped whole with `FreeAll`. `mi_heap_destroy` drops a heap",
-                "of mimalloc whole, in the same program. Ratios to malloc are medians of those within a round.",
+                "Each program reads an input of 20 MB, which `bench/make-inputs.py` makes, and prints the same",
+                "on every allocator. A `Heap` has its default settings and `On(true)`. It is freed block by",
+                "block, or dropped as a whole with `FreeAll`. `mi_heap_destroy` drops a heap of mimalloc as a",
+                "whole, in the same program. The ratios to malloc are medians of the ratios within a round.",
                 "",
                 "- `XmlHost`: libxml2 reads a document, walks it and frees it.",
                 "- `JsHost`: duktape parses JSON line by line, keeps the objects and groups them.",
@@ -249,10 +249,9 @@ def hosts_section(hosts):
                 "![Whole programs compared with malloc](hosts.svg)", "",
                 "Processor time, user and system:", ""]
     yield from hosts.ratios_table(hosts.seconds, "s", 1)
-    yield from ["Peak of resident memory:", ""]
+    yield from ["Peak resident memory:", ""]
     yield from hosts.ratios_table(hosts.kilobytes, "MB", 1024)
-    yield from ["Programs of `examples` whose settings were chosen for their work, seconds of processor time:",
-                ""]
+    yield from ["Programs of `examples` with settings chosen for their work, seconds of processor time:", ""]
     yield from hosts.tuned_table()
 
 
@@ -271,23 +270,24 @@ def main():
     compared = [peer for peer in ("glibc", "mimalloc", "pmr") if peer in peers]
 
     text = ["# Performance", "",
-            f"Written by `scripts/bench.sh`, which anybody can repeat. Measured on {machine()}.", ""]
+            f"`scripts/bench.sh` writes this page. Measured on {machine()}.", ""]
     text += hosts_section(hosts)
     text += ["## Single operations", "",
              "![Time per operation compared with glibc](performance.svg)", "",
              "pool is a bare `Mgr` with the default settings. pool-keep also keeps empty buckets, and",
-             "pool-64k has buckets of 65535 bytes, as layer has, which is a `Heap`. All subjects are called",
+             "pool-64k has buckets of 65535 bytes. layer is a `Heap` with such buckets. All of them are called",
              "through the dynamic linker, except boost and pmr, which are partly headers. boost serves only",
              "one size.", "",
-             "Each row runs in a process of its own. Its heap is first made long and kept so by a block at",
-             "its end, as the other data of a program would. Otherwise the C library returns the memory",
-             "of each round to the system, and the rows measure that. The subjects take turns row by row.",
+             "Each row runs in a process of its own. Its heap is first made long, and a block at its end keeps",
+             "it long, as the other data of a program would. Otherwise the C library would return the memory",
+             "of each round to the system, and the rows would measure that. The allocators take turns row by",
+             "row.",
              "", "Nanoseconds per operation, medians:", ""]
     subjects = POOLS + ["layer"] + peers
     text += table(["work"] + subjects,
                   ([row] + [number(measured.median(row, subject), 2) for subject in subjects]
                    for row in rows))
-    text += ["Ratios, medians of those within a round; below 1 the pool is faster:", ""]
+    text += ["Ratios, medians of the ratios within a round; below 1 the pool is faster:", ""]
     text += table(["work"] + [f"pool / {peer}" for peer in compared] +
                   [f"best setting / {peer}" for peer in compared],
                   ([row] + [number(measured.ratio(row, peer, subject))

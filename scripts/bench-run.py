@@ -1,8 +1,8 @@
 #!/usr/bin/env python3
-"""Runs the benchmarks of a build and writes what they measured, for scripts/bench.sh.
+"""Runs the benchmarks of a build and writes their results, for scripts/bench.sh.
 
-Every subject does a piece of work right after the others, each in a process of its own, so that
-what the machine does meanwhile meets all of them. The parts, all of them by default:
+The subjects do each piece of work one right after the other, each in a process of its own, so that
+other load on the machine affects all of them. The parts, all of them by default:
 
   rows      nanoseconds per operation
   resident  bytes of memory per live block
@@ -33,7 +33,7 @@ HOSTS = ["XmlHost orders.xml", "JsHost examples/js/orders.js < orders.jsonl",
 TUNED_HOSTS = ["Ast --definitions 50000", "LuaHost examples/lua/objects.lua",
                "LuaHost examples/lua/trees.lua", "LuaHost examples/lua/strings.lua",
                "SqliteHost examples/sql/orders.sql"]
-# What a host's memory can be, with the option that asks for it.
+# The kinds of memory of a host, each with its option.
 MEMORIES = {"malloc": "--heap", "mimalloc": "--heap", "Heap": "--close", "FreeAll": None,
             "mi_heap": None, "pmr": "--pmr", "off": "--off"}
 
@@ -43,7 +43,7 @@ def step(text):
 
 
 def preloads():
-    """The mallocs that can take the place of the C library's, by name."""
+    """The mallocs that can replace the C library's, by name."""
     known = subprocess.run(["/sbin/ldconfig", "-p"], capture_output=True, text=True,
                            check=True).stdout
     found = {"glibc": ""}
@@ -88,7 +88,7 @@ class Runner:
             step(f"Rows, round {turn + 1} of {self.rounds}")
             order = list(times)[turn:] + list(times)[:turn]  # Each round begins with another.
             for row in rows["pool-64k"]:
-                # How cost grows is one long look.
+                # The rows about growth are long and run once.
                 if re.match("live|drop", row) and (turn > 0 or self.quick and "0000000/" in row):
                     continue
                 for subject in order:
@@ -179,7 +179,7 @@ def main():
     parser.add_argument("output", type=pathlib.Path)
     parser.add_argument("parts", nargs="*", default=["rows", "resident", "hosts"])
     parser.add_argument("--quick", action="store_true", help="fewer and shorter rounds")
-    parser.add_argument("--smoke", action="store_true", help="small inputs, to see that all run")
+    parser.add_argument("--smoke", action="store_true", help="small inputs, to check that all run")
     options = parser.parse_args()
     runner = Runner(options.build.resolve(), options.quick, options.smoke)
     results = {part: getattr(runner, part)() for part in options.parts}
