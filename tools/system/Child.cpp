@@ -72,7 +72,7 @@ pid_t Start(const std::vector<std::string>& command, const std::function<void()>
 
 int EndLike(int waitStatus) {
     if (WIFEXITED(waitStatus)) { return WEXITSTATUS(waitStatus); }
-    const rlimit noCore = {0, 0};  // The program has left its own, if any.
+    const rlimit noCore = {0, 0};  // The program has dumped its own, if any.
     setrlimit(RLIMIT_CORE, &noCore);
     std::signal(WTERMSIG(waitStatus), SIG_DFL);
     std::raise(WTERMSIG(waitStatus));

@@ -12,17 +12,17 @@
 namespace System {
 
 // From now on a write above the limit of file sizes fails in this process instead of ending it. The
-// programs that it runs do not notice.
+// programs that it runs are not affected.
 void SurviveFileSizeLimit();
 
-// Turns this process into the program, which is looked up in PATH. `command` is its name and its
-// arguments. A program that cannot be run is a Failure.
+// Replaces this process by the program, which is looked up in PATH. `command` is its name and its
+// arguments. Throws a Failure if the program cannot be run.
 [[noreturn]] void Become(const std::vector<std::string>& command);
 
-// Starts the program as a child, in which `prepare` runs first, and returns its process number.
+// Starts the program as a child, in which `prepare` runs first, and returns its process id.
 pid_t Start(const std::vector<std::string>& command, const std::function<void()>& prepare);
 
-// Ends this process as a child has ended, by its signal or by the exit status that this returns.
+// Ends this process by the signal that ended a child, or else returns the child's exit status.
 int EndLike(int waitStatus);
 
 }  // namespace System

@@ -11,7 +11,7 @@ namespace System {
 
 class Descriptor {
 public:
-    // A negative number is that of no file.
+    // A negative number stands for no file.
     explicit Descriptor(int number) : descriptor(number) {}
     Descriptor(const Descriptor&) = delete;
     Descriptor& operator=(const Descriptor&) = delete;

@@ -1,8 +1,8 @@
-// The exit statuses of a command that runs another program, as env, nohup and timeout have them.
+// The exit statuses of a command that runs another program, as of env, nohup and timeout.
 //
 // Once the program has run, its exit status is that of the command; if a signal has killed it, the
-// command dies by the same signal. Three statuses, which programs seldom use, are for what comes
-// before that or fails beside it.
+// command ends by the same signal. Three statuses, which programs rarely use, are for failures
+// before that and for failures of the command itself.
 
 #ifndef OBR_TOOLS_SYSTEM_EXITSTATUS_HPP
 #define OBR_TOOLS_SYSTEM_EXITSTATUS_HPP
@@ -12,17 +12,17 @@
 
 namespace System {
 
-constexpr int ownFailure = 125;  // The command itself has failed; its message says at what.
-constexpr int cannotRun = 126;   // The program is there, and cannot be run or not as it should be.
-constexpr int notFound = 127;    // There is no such program.
+constexpr int ownFailure = 125;  // The command itself has failed.
+constexpr int cannotRun = 126;   // The program exists, but cannot be run as requested.
+constexpr int notFound = 127;    // The program does not exist.
 
-// A failure that ends the command with a status of its own.
+// A failure that ends the command with one of these statuses.
 class Failure final : public std::runtime_error {
 public:
     Failure(int exitStatus, const std::string& text)
         : std::runtime_error(text), status(exitStatus) {}
 
-    // "subject: " and what the error number means.
+    // The text is "subject: " and the meaning of the error number.
     Failure(int exitStatus, const std::string& subject, int error);
 
     int Status() const { return status; }

@@ -1,6 +1,5 @@
-// The loader ignores a preloaded library in a program that runs with other rights than ours and in
-// one for another kind of machine, and a static program has no loader. The program's file says so
-// before the program has run.
+// A preloaded library has no effect in a program that runs with other rights, is built for another
+// kind of machine, or is statically linked. The program's file shows that before the program runs.
 
 #include "system/ProgramFile.hpp"
 
@@ -62,7 +61,7 @@ std::string Interpreter(const std::string& path) {
     return interpreter;
 }
 
-// A file that libelf reads. One that cannot be read or is of another kind has no ELF.
+// A file that libelf reads. Get is null if it cannot be read or is not an ELF file.
 class ElfFile {
 public:
     explicit ElfFile(const std::string& path)
@@ -87,7 +86,7 @@ private:
 
 void CheckElf(const std::string& name, const std::string& path, const std::string& done) {
     const ElfFile file(path);
-    if (file.Get() == nullptr) { return; }  // It may be executed and not read.
+    if (file.Get() == nullptr) { return; }  // It may be executable but not readable.
     const std::string damaged = "is damaged or cut short: cannot be " + done;
     GElf_Ehdr header = {};
     GElf_Ehdr own = {};

@@ -7,11 +7,11 @@
 
 namespace System {
 
-// The file of a program, looked up in PATH as a shell does; the name itself if there is none.
+// The file of a program, looked up in PATH as by a shell; the name itself if there is no such file.
 std::string FindProgram(const std::string& name);
 
-// Refuses a program that no library can be preloaded into, so that it cannot be `done`. Returns the
-// file that is executed: the program's, or the interpreter's of a script.
+// Throws a Failure for a program into which no library can be preloaded, so that it "cannot be
+// `done`". Returns the file that is executed: that of the program, or of a script's interpreter.
 std::string CheckPreload(const std::string& name, const std::string& done);
 
 // Whether the ELF file is built with AddressSanitizer.

@@ -59,7 +59,7 @@ bool CompactReader::ReadEvent(Event& event) {
     return true;
 }
 
-// Reads an entry; true if it makes an event.
+// Reads an entry; true if it is an event.
 bool CompactReader::ReadEntry(Event& event) {
     const auto tag = static_cast<std::uint8_t>(rest.front());
     rest.remove_prefix(1);
@@ -163,8 +163,8 @@ bool CompactReader::End(const char* why) {
     return false;
 }
 
-// Keeps whose block it is. A recorder may have missed the release of an earlier one at its address,
-// which then precedes it.
+// Notes the pool and the thread of a block. The recorder may have missed the release of an earlier
+// block at that address; that release then comes first.
 bool CompactReader::Own(Event& event) {
     if (!isOwned || !isSound) { return true; }
     const auto [place, isNew] = owners.try_emplace(event.block);

@@ -1,4 +1,4 @@
-// Reads a trace in its compact form, a damaged one up to the damage.
+// Reads a trace in its compact form. A damaged trace is read up to the damage.
 
 #ifndef OBR_TOOLS_TRACE_COMPACTREADER_HPP
 #define OBR_TOOLS_TRACE_COMPACTREADER_HPP
@@ -65,7 +65,7 @@ private:
     std::unordered_map<std::uint64_t, Owner> owners;  // Of live blocks, by address.
     std::uint64_t numForeignFrees = 0;
     std::string foreignFrees;   // The same as text.
-    std::optional<Event> next;  // An event read already, if another one had to precede it.
+    std::optional<Event> next;  // An event that was read already but comes after another one.
 };
 
 }  // namespace Trace

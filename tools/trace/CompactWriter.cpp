@@ -87,7 +87,8 @@ void CompactWriter::Finish() {
     sink({packed.data(), chunkHeaderSize});
 }
 
-// Finds the index of the pool, or gives it one. Returns samePool if it is the last one again, or 0.
+// Finds the index of the pool, or gives it one. Returns samePool if it is the last one again, else
+// 0.
 std::uint8_t CompactWriter::PoolFlag(std::uint64_t address) {
     if (address == lastPool && !poolIndices.empty()) { return samePool; }
     auto place = poolIndices.find(address);
@@ -111,7 +112,7 @@ void CompactWriter::TagWithPool(Entry entry, std::uint64_t pool) {
     if (flag == 0) { AppendNumber(lastPoolIndex); }
 }
 
-// The tag, the index that PoolFlag has found, if the entry has one, and the block.
+// Writes the tag, the pool's index that PoolFlag has found (if the entry has one), and the block.
 void CompactWriter::TagWithBlock(Entry entry, std::uint8_t flags, std::uint64_t block) {
     const bool hasPool = entry != Entry::Released && (flags & samePool) == 0;
     std::uint64_t distance = block - lastBlock;

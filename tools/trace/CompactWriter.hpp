@@ -28,9 +28,9 @@ public:
     // A Malformed event is ignored. A text is cut at its largest size.
     void Write(const Event& event);
 
-    // For a recorder, which does not know the pool of a block that is freed: after WriteOwned a
-    // released block is read as freed from its pool, and a block that another thread than its own
-    // releases is counted in the fact "foreign_frees".
+    // For a recorder, which does not know the pool of a block that is freed. After WriteOwned the
+    // reader finds the pool of a released block, and counts the blocks that another thread releases
+    // in the fact "foreign_frees".
     void WriteOwned() { Tag(Entry::Owned, 0); }
     void WriteReleased(std::uint64_t block) {
         TagWithBlock(Entry::Released, 0, block);
@@ -38,7 +38,7 @@ public:
     }
     void WriteThread(std::uint64_t number);
 
-    // Writes what is still in memory, so that it is not lost whatever happens next.
+    // Writes what is still in memory, so that it is not lost.
     void Flush();
 
     // Flushes and writes the end of the file.

@@ -21,8 +21,8 @@ constexpr std::string_view WholeCharacters(std::string_view text, std::size_t by
     return text.substr(0, bytes);
 }
 
-// The text, or if it has more than `bytes` bytes, its beginning, "..." and its end, with at most as
-// many together.
+// The text; if it has more than `bytes` bytes, its beginning, "..." and its end, with at most
+// `bytes` bytes together.
 inline std::string CutText(std::string_view text, std::size_t bytes) {
     if (text.size() <= bytes) { return std::string(text); }
     constexpr std::string_view dots = "...";

@@ -1,5 +1,5 @@
-// An *event* is one thing that a trace reports: what happened to a pool or to a block, each named
-// by its address. An *event source* reads the events of a trace in order, whatever its form.
+// An *event* says what happened to a pool or to a block, each identified by its address. An *event
+// source* reads the events of a trace in order, whatever the form of the trace.
 
 #ifndef OBR_TOOLS_TRACE_EVENT_HPP
 #define OBR_TOOLS_TRACE_EVENT_HPP
@@ -21,7 +21,7 @@ enum class Kind : std::uint8_t {
     Named,      // The name of a pool.
     Info,       // A fact about the whole recording.
     Time,       // When the events that follow happened.
-    Malformed,  // A line that begins like an event and has no known form. The last kind.
+    Malformed,  // A line that begins like an event but has no known form. Must be the last kind.
 };
 
 // Only the fields of its kind are set. Both texts live until the next event is read.
@@ -29,7 +29,7 @@ struct Event {
     Kind kind = Kind::Malformed;
     std::uint64_t pool = 0;
     std::uint64_t block = 0;
-    std::uint64_t size = 0;  // Bytes asked for; the largest number if 64 bits do not hold them.
+    std::uint64_t size = 0;  // Requested bytes; the largest number if they need more than 64 bits.
                              // Of Time, milliseconds since the recording began.
     std::string_view key;    // Of Info; its value is in `text`.
     std::string_view text;

@@ -1,4 +1,4 @@
-// Reads through zlib, which knows a compressed file by its first bytes and passes on any other.
+// Reads through zlib, which recognises a compressed file by its first bytes and copies any other.
 
 #include "trace/GzSource.hpp"
 

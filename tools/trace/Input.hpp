@@ -1,5 +1,5 @@
-// The bytes of a trace. A *byte source* reads them piece by piece; an Input keeps those that are
-// not yet used side by side, so that a reader sees a line or a chunk as a whole.
+// The bytes of a trace. A *byte source* reads them piece by piece. An Input keeps the unused ones
+// contiguous, so that a reader sees a line or a chunk as a whole.
 
 #ifndef OBR_TOOLS_TRACE_INPUT_HPP
 #define OBR_TOOLS_TRACE_INPUT_HPP
@@ -30,7 +30,7 @@ class Input {
 public:
     explicit Input(std::unique_ptr<ByteSource> byteSource);
 
-    // The bytes read and not yet used. Valid until the next ReadMore.
+    // The bytes that are read but not yet used. Valid until the next ReadMore.
     std::string_view Ahead() const { return {buffer.data() + first, last - first}; }
 
     // Appends to the bytes ahead; false at the end.

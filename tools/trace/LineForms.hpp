@@ -1,5 +1,5 @@
-// The forms of a trace line: the mark, the letter of the kind, then the fields, each after a colon.
-// The library writes the four on the left, a recorder all of them.
+// The forms of a trace line: a mark, the letter of the kind, then the fields, each after a colon.
+// The library writes the four forms on the left, a recorder all of them.
 //
 //     xmpt:c:POOL               xmpt:x:POOL
 //     xmpt:d:POOL               xmpt:n:POOL:TEXT
@@ -33,7 +33,7 @@ struct LineForm {
     std::array<Field, 3> fields;  // Up to the first None.
 };
 
-// In the order of Kind; all but Malformed have one.
+// In the order of Kind. All kinds except Malformed have a form.
 inline constexpr LineForm lineForms[] = {
     {Kind::Created, 'c', {Field::Pool}},
     {Kind::Destroyed, 'd', {Field::Pool}},

@@ -1,4 +1,4 @@
-// The one place that knows which forms of a trace there are.
+// The only place that knows the forms of a trace.
 
 #include "trace/OpenTrace.hpp"
 

@@ -1,6 +1,6 @@
-// Follows the events of a trace and finds the pool and the block of each: a *step* has them as
-// indices, since other pools and blocks reuse an address. An event that makes no sense after those
-// before it is a *fault*, and changes nothing.
+// Follows the events of a trace and finds the pool and the block of each. A *step* is an event that
+// has them as indices, since other pools and blocks may reuse an address. An event that makes no
+// sense after the earlier ones is a *fault*, and changes nothing.
 
 #ifndef OBR_TOOLS_TRACE_RESOLVER_HPP
 #define OBR_TOOLS_TRACE_RESOLVER_HPP
@@ -17,8 +17,8 @@
 namespace Trace {
 
 struct Block {
-    std::uint32_t index;  // Below NumBlocks; used again once the block is gone.
-    std::uint32_t size;   // Bytes asked for.
+    std::uint32_t index;  // Below NumBlocks; reused after the block is freed.
+    std::uint32_t size;   // Requested bytes.
 };
 
 struct Step {
@@ -50,8 +50,8 @@ public:
     // Sets `step`, or returns why there is none. Only the kind of an Info or a Time is set.
     std::optional<Fault> Resolve(const Event& event, Step& step);
 
-    // The blocks that the last step, a Cleared or a Destroyed, has dropped, by index, which is
-    // roughly the order of the allocations.
+    // The blocks that the last step, a Cleared or a Destroyed, has dropped, sorted by index, which
+    // is roughly the order of their allocation.
     const std::vector<Block>& Dropped() const { return dropped; }
 
     // Ends one of the live pools as if the trace destroyed it; Dropped has its blocks. False if

@@ -1,5 +1,4 @@
-// A trace as the tools read it: its events resolved to steps, its bad lines counted and its facts
-// collected on the way.
+// Reads a trace for the tools: resolves events to steps, counts bad lines, and collects facts.
 
 #ifndef OBR_TOOLS_TRACE_STEPREADER_HPP
 #define OBR_TOOLS_TRACE_STEPREADER_HPP
@@ -55,7 +54,7 @@ public:
     // Keys and values of the Info events.
     const std::map<std::string, std::string>& Facts() const { return facts; }
 
-    // After the end: a warning if the trace is incomplete, or empty. What was read is good.
+    // After the end: a warning if the trace is incomplete, else empty. The steps read are valid.
     std::string Warning() const;
 
 private:

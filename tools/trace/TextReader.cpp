@@ -80,7 +80,7 @@ void Take(Fields& fields, Field field, Event& event) {
     }
 }
 
-// The line behind its mark.
+// Parses the line after its mark.
 void Parse(std::string_view text, Event& event) {
     event.kind = Kind::Malformed;
     Fields fields(text);
@@ -115,7 +115,7 @@ bool TextReader::Next(Event& event) {
 }
 
 // Reads the next line, without its end and possibly without its beginning: see Shorten. The last
-// line needs no end; but if the bytes are cut off, its last number may be too, and it is dropped.
+// line of a file needs no end. If the file is incomplete, its last line may be too, and is dropped.
 bool TextReader::NextLine(std::string_view& line) {
     input.Skip(lineSize);
     lineSize = 0;
@@ -139,8 +139,8 @@ bool TextReader::NextLine(std::string_view& line) {
     return true;
 }
 
-// Bounds the memory for a line whose end is not read yet. Drops what precedes its mark, or what may
-// be the first part of one; and all of a line that is too long.
+// Bounds the memory for a line whose end is not read yet. Drops what precedes its mark, or what
+// precedes the last bytes, which may be the start of a mark. Drops all of a line that is too long.
 void TextReader::Shorten() {
     const std::string_view begin = input.Ahead();
     const std::size_t start = begin.find(mark);

@@ -27,8 +27,8 @@ private:
     void Shorten();
 
     Input input;
-    std::size_t lineSize = 0;  // Bytes of the last line with its end; they are still ahead.
-    bool isTooLong = false;    // Whether the last line is; its bytes are dropped.
+    std::size_t lineSize = 0;  // Bytes of the last line with its end, not skipped yet.
+    bool isTooLong = false;    // Whether the last line is too long; its bytes are dropped.
     std::uint64_t number = 0;  // Of the last line.
 };
 

@@ -14,7 +14,7 @@ namespace Trace {
 // the line. A Malformed event has no line.
 void AppendLine(std::string& lines, const Event& event);
 
-// Appends an address as it stands in a line.
+// Appends an address in the form of a line.
 void AppendAddress(std::string& text, std::uint64_t address);
 
 }  // namespace Trace
