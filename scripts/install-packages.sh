@@ -17,7 +17,7 @@ for job in "$@"; do
         bench) packages+=(liblua5.4-dev libsqlite3-dev libxml2-dev duktape-dev libmruby-dev libbenchmark-dev libmimalloc-dev zlib1g-dev libzstd-dev libmimalloc2.0 libjemalloc2 libtcmalloc-minimal4
             libboost-dev gnuplot-nox python3) ;;
         cross) packages+=(g++-aarch64-linux-gnu g++-riscv64-linux-gnu qemu-user-static googletest) ;;
-        coverage) packages+=(libgmock-dev gcovr) ;;
+        coverage) packages+=(libgmock-dev gcovr python3 valgrind) ;;
         fuzz) packages+=(libgmock-dev zlib1g-dev libzstd-dev clang libclang-rt-14-dev) ;;
         *)
             echo "install-packages.sh: unknown job '$job'" >&2
