@@ -49,6 +49,6 @@ block != "" && isComplete { printf "%s", block }
 {
     print
     isComplete = /;( *\/\/.*)?$|\{.*\} *$/
-    if (/^ *(class|struct|enum|namespace) .*\{$/) { block = "" }
+    if (/^ *((typedef )?(class|struct|enum|namespace) .*|extern "C" )\{$/) { block = "" }
     else if (!/^ *\}/) { depth = opened($0) }
 }

@@ -14,8 +14,8 @@ BRIEF=$(sed -n 's/^ *DESCRIPTION "\(.*\)")$/\1/p' CMakeLists.txt)
 [ -n "$VERSION" ] && [ -n "$BRIEF" ]
 export VERSION BRIEF
 doxygen docs/Doxyfile
-for class in Mgr Heap HeapSettings HeapStats Resource Allocator; do
-    [ -n "$(find build/docs/html -name "*1_1${class}.html")" ] ||
-        { echo "The reference has no page for $class." >&2; exit 1; }
+for type in 1_1{Mgr,Heap,HeapSettings,HeapStats,Resource,Allocator} structobr__heap__settings; do
+    [ -n "$(find build/docs/html -name "*$type.html")" ] ||
+        { echo "The reference has no page for $type." >&2; exit 1; }
 done
 echo "build/docs/html/index.html"
