@@ -1,8 +1,8 @@
 // The memory that a recorded program shares with `mempool record`, which drains it while the
-// program runs. The program's threads put *slots* into a ring without a lock: a thread takes the
-// next number, which is the slot's place in the order of all, and fills the slot. So a signal
-// handler may interrupt another event at any point, and no thread ever waits for one that does not
-// run, but for room in the ring.
+// program runs. The program's threads fill *slots* of a ring without a lock: a thread takes the
+// next number, which is the slot's place in the order of all slots, and fills the slot. A signal
+// handler may therefore interrupt another event at any point, and no thread waits for another one,
+// only for room in the ring.
 
 #ifndef OBR_TOOLS_RECORD_CHANNEL_HPP
 #define OBR_TOOLS_RECORD_CHANNEL_HPP
@@ -27,18 +27,18 @@ enum class Op : std::uint8_t {
     PoolAllocated,  // Pool; a Data slot with the block and the size follows.
     PoolFreed,      // Pool; likewise.
     PoolNamed,      // Pool, size of the name; Data slots with 8 bytes each follow.
-    Data,           // Alone it means nothing.
-    Executed,       // The program has become another one.
+    Data,           // Only as a part of another event.
+    Executed,       // Another program has replaced this one.
 };
 
-// `where` is the address above 16 bits of the thread's number. `what` holds, from the low bits on,
-// the size, the group, the op and the lap.
+// `where` has the thread's number in the low 16 bits, and above it the address. `what` holds, from
+// the low bits on, the size, the group, the op and the lap.
 struct Slot {
     std::atomic<std::uint64_t> where;
     std::atomic<std::uint64_t> what;  // Stored last. Its lap shows that the slot is filled.
 };
 constexpr unsigned int addressShift = 16;
-constexpr std::uint64_t maxThread = 0xFFFF;  // Of all threads after so many.
+constexpr std::uint64_t maxThread = 0xFFFF;  // The number of all later threads.
 constexpr unsigned int sizeBits = 36;
 constexpr std::uint64_t maxSize =
     (std::uint64_t{1} << sizeBits) - 1;  // Stands for larger ones too.
@@ -49,7 +49,7 @@ constexpr unsigned int lapShift = 60;
 
 constexpr std::size_t numSlots = std::size_t{1} << 19;
 
-// How often the ring was full before: 1 to 15, and 1 again. A fresh ring is all 0.
+// The lap of the ring: 1 to 15, then 1 again. A new ring has only 0.
 constexpr std::uint64_t Lap(std::uint64_t index) {
     return (1 + index / numSlots % 15) << lapShift;
 }
@@ -72,7 +72,7 @@ struct Module {
 };
 constexpr std::size_t numModules = 1024;  // The first stands for code outside of any.
 
-// The timed calls of about the same length.
+// Timed calls of about the same length.
 struct Samples {
     std::atomic<std::uint64_t> number;
     std::atomic<std::uint64_t> ticks;
@@ -80,7 +80,7 @@ struct Samples {
 constexpr std::size_t numSampleLengths = 20;
 
 struct Channel {
-    // Read at every event and seldom written.
+    // Read at every event, and rarely written.
     alignas(64) std::uint64_t magic;
     std::atomic<std::uint64_t> tail;  // Slots drained.
     By by;
@@ -88,9 +88,9 @@ struct Channel {
     std::int32_t parentPid;                  // Of the process that drains the channel.
     std::int32_t descriptor;                 // Of the channel, in that process.
     std::atomic<std::uint32_t> isTaken;      // Set by the program's recorder, once.
-    std::atomic<std::uint32_t> numExecs;     // How often the program has become another one.
+    std::atomic<std::uint32_t> numExecs;     // How often another program has replaced this one.
     std::atomic<std::uint32_t> tailFutex;    // The low bits of the tail, to wait on.
-    std::atomic<std::uint32_t> numWaiting;   // Threads that do.
+    std::atomic<std::uint32_t> numWaiting;   // Threads that wait.
     std::atomic<std::uint32_t> modulesUsed;  // The index of the last one.
     std::atomic<std::uint32_t> modulesLock;
 
@@ -98,17 +98,17 @@ struct Channel {
     alignas(64) std::atomic<std::uint64_t> head;  // Slots taken.
     std::atomic<std::uint32_t> numThreads;
 
-    // What the recorder itself takes: the ticks of so many events and of so many timed calls beside
-    // the call, measured at its start, and the processor time of all unwinding.
+    // The cost of the recorder itself: the ticks of numCalibrationEvents events and of as many
+    // empty measurements, taken at its start, and the processor time of all unwinding.
     alignas(64) std::atomic<std::uint64_t> eventTicks;
     std::atomic<std::uint64_t> timerTicks;
     std::atomic<std::uint64_t> unwindNanoseconds;
 
-    // Patterns of functions that are no callers, each with its end, then an empty one.
+    // Patterns of functions that are not callers, each ended by a 0, then an empty one.
     char skipped[1024];
 
-    // The calls of the allocator that were timed, by the power of two of their ticks, those of the
-    // timer among them.
+    // The timed calls of the allocator, by the power of two of their ticks, which include the
+    // timer's.
     Samples samples[numSampleLengths];
 
     alignas(64) Slot slots[numSlots];

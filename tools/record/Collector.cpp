@@ -1,5 +1,5 @@
-// From slots to events. Which pool of the trace a block lies in is decided here: a group of the
-// recording is a pool, whose address is no more than a number.
+// Turns slots into events. Each group of the recording becomes a pool of the trace, whose address
+// is just a number.
 
 #include "record/Collector.hpp"
 
@@ -58,7 +58,7 @@ bool Collector::Drain(bool atEnd) {
     return true;
 }
 
-// The channel is drained so often that its events have just happened.
+// The channel is drained so often that the time of draining is that of the events.
 void Collector::WriteTime() {
     using std::chrono::milliseconds;
     constexpr milliseconds interval{10};
@@ -82,7 +82,7 @@ void Collector::Write(std::uint64_t& index, std::uint64_t where, std::uint64_t w
     writer.Write({Trace::Kind::Allocated, pool, AddressOf(where), SizeOf(what), {}, {}});
 }
 
-// An event of a pool, whose Data slots follow and are filled before it is.
+// Writes an event of a pool. Its Data slots follow it and were filled before it.
 void Collector::WritePoolEvent(std::uint64_t& index, std::uint64_t pool, std::uint64_t what) {
     switch (OpOf(what)) {
         case Op::PoolCreated:
@@ -119,7 +119,7 @@ void Collector::WritePoolEvent(std::uint64_t& index, std::uint64_t pool, std::ui
     }
 }
 
-// What the program had goes when it becomes another one.
+// The memory of a program is gone when another one replaces it.
 void Collector::EndPools() {
     for (std::uint64_t pool = 0; pool != knownPools.size(); ++pool) {
         if (knownPools[pool]) { pools.insert(pool); }
@@ -151,7 +151,7 @@ std::uint64_t Collector::NumberOfPool(std::uint64_t group, std::uint64_t thread)
     return 1;
 }
 
-// The pool of the trace, which begins with its first block.
+// The pool of the trace, created at its first block.
 std::uint64_t Collector::PoolOf(std::uint64_t group, std::uint64_t thread) {
     const std::uint64_t pool = NumberOfPool(group, thread);
     if (!knownPools[pool]) {

@@ -17,11 +17,11 @@ namespace Recorder {
 
 class Collector {
 public:
-    // Of the pools of the library, or of the heap.
+    // Collects the events of the library's pools, or of the heap.
     Collector(Channel& fromChannel, Trace::CompactWriter& toWriter, bool ofPools);
 
-    // Takes what is there, some thousand events at most, and returns whether there was any. At the
-    // end of the program slots that were taken and never filled are passed over.
+    // Writes the events in the channel, a few thousand at most, and returns whether there were any.
+    // At the end of the program, slots that were taken but never filled are skipped.
     bool Drain(bool atEnd = false);
 
     std::uint64_t NumEvents() const { return numEvents; }
@@ -40,10 +40,10 @@ private:
     Trace::CompactWriter& writer;
     Symbols symbols;
     const bool isOfPools;
-    std::vector<bool> knownPools;   // Groups of the heap that have begun.
-    std::set<std::uint64_t> pools;  // Of the library, alive.
+    std::vector<bool> knownPools;   // Groups of the heap that have a pool.
+    std::set<std::uint64_t> pools;  // Live pools of the library.
     const std::chrono::steady_clock::time_point start = std::chrono::steady_clock::now();
-    std::chrono::milliseconds nextTime{0};  // When the trace needs the time again.
+    std::chrono::milliseconds nextTime{0};  // When to write the time next.
     std::uint64_t lastThread = 0;
     std::uint64_t numEvents = 0;
 };

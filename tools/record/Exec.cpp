@@ -1,8 +1,8 @@
-// A recorded program that becomes another one by exec stays recorded: the calls here put the
-// recorder into the environment of the other one, which RestoreEnvironment takes out again there.
+// Keeps recording when a program replaces itself through exec: the calls here add the recorder to
+// the environment of the new program, where RestoreEnvironment removes it again.
 //
-// They may be called in a signal handler or while other threads hold any lock: all memory that they
-// need is on the stack.
+// They may be called in a signal handler or while other threads hold any lock, so all memory that
+// they need is on the stack.
 
 #include <alloca.h>
 #include <dlfcn.h>
@@ -37,8 +37,8 @@ Function* Next(const char* name) {
     return function;
 }
 
-// Calls `execute` with an environment that has the recorder in it, if this process is recorded. A
-// child that shares its memory, as vfork makes one, is not.
+// Calls `execute`, with an environment that has the recorder in it if this process is recorded. A
+// child that shares the memory of a recorded process, as after vfork, is not recorded.
 template <typename Execute>
 int Follow(Words environment, Execute execute) {
     Channel* const channel = ActiveChannel();
@@ -112,8 +112,8 @@ RECORDER_API int fexecve(int file, Words arguments, Words environment) noexcept 
     return Follow(environment, [=](Words with) { return next(file, arguments, with); });
 }
 
-// The arguments of a call that takes them one by one, from `first` to the null after them, as
-// `words` on the stack. `list` is after that null then.
+// Collects the arguments of a variadic call, from `first` to the null after them, in `words` on the
+// stack. `list` is then positioned after that null.
 #define COLLECT_WORDS                                                               \
     std::va_list list;                                                              \
     std::size_t number = 1;                                                         \

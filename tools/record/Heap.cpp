@@ -1,9 +1,9 @@
-// The calls of the malloc family, as the program sees them: each is passed on to the allocator that
-// the program would have without the recorder, and recorded. Operator new and delete reach the
-// allocator through these calls too.
+// The malloc family that the program calls. Each call is passed on to the allocator that the
+// program would have without the recorder, and recorded. Operator new and delete use these calls
+// too.
 //
-// A block is recorded after it is allocated and its release before it is freed. So no other thread
-// can record its address in between.
+// A block is recorded after it is allocated, and its release before it is freed, so that no other
+// thread can record the same address in between.
 
 #include <dlfcn.h>
 #include <malloc.h>
@@ -37,8 +37,8 @@ struct Next {
 Next next = {};
 std::atomic<bool> isReady = false;
 
-// The memory that looking up the calls may take comes from here, as does that of any other call
-// before they are known. It is never given back and never recorded.
+// Looking up the allocator's functions may itself allocate. Blocks that are requested before they
+// are known come from here. They are never reused and never recorded.
 alignas(16) char earlyMemory[std::size_t{1} << 17];
 std::atomic<std::size_t> earlyUsed = 0;
 
@@ -130,7 +130,7 @@ __attribute__((noinline)) void* AllocateTimed(Channel& channel, std::size_t size
     return block;
 }
 
-// Carries out `call`, which returns a block of `size` bytes or null.
+// Makes the call, which returns a block of `size` bytes or null, and records it.
 template <typename Call>
 inline __attribute__((always_inline)) void* Allocate(std::size_t size, const CallSite& site,
                                                      Call call) {
@@ -150,7 +150,7 @@ __attribute__((noinline)) void FreeTimed(Channel& channel, void* block) {
     sample.LeaveAllocator();
 }
 
-// A block of the early memory moves to the heap.
+// Moves a block of the early memory to the heap.
 void* MoveEarly(void* block, std::size_t size, const CallSite& site) {
     void* const moved = Allocate(size, site, [=] { return next.Malloc(size); });
     const std::size_t earlySize = EarlySize(block);
@@ -173,7 +173,7 @@ void* Reallocate(void* block, std::size_t size, const CallSite& site) {
     if (channel == nullptr) { return next.Realloc(block, size); }
     Put(*channel, Op::Released, block, 0, 0);
     void* const moved = Allocate(size, site, [=] { return next.Realloc(block, size); });
-    // One that fails leaves the block where it was. The size once asked for is not known.
+    // A failure leaves the block in its place. Its requested size is unknown.
     if (moved == nullptr && size != 0) {
         RecordAllocated(*channel, block, next.UsableSize(block), site);
     }
@@ -182,8 +182,8 @@ void* Reallocate(void* block, std::size_t size, const CallSite& site) {
 
 }  // namespace
 
-// AddressSanitizer asks for its options. Otherwise it refuses to run after another library that has
-// been preloaded.
+// AddressSanitizer reads these default options. Without them it refuses to run after another
+// preloaded library.
 RECORDER_API const char* SanitizerOptions() asm("__asan_default_options");
 const char* SanitizerOptions() {
     return "verify_asan_link_order=0";

@@ -1,8 +1,8 @@
-// The calls of OBR::MemPool::Mgr, as a program sees them that uses the shared library: each is
-// passed on to the library and recorded. The functions have the names of the library's exports.
+// The calls of OBR::MemPool::Mgr of a program that uses the shared library. Each is passed on to
+// the library and recorded. The functions have the names of the library's exports.
 //
-// A pool is for one thread at a time, so a call is recorded once it is done. Only the end of a pool
-// is recorded before: another pool may be built at its address at once.
+// Only one thread at a time uses a pool, so a call is recorded after it is done. Only the end of a
+// pool is recorded before, since another pool may then be built at its address.
 
 #include <dlfcn.h>
 
@@ -22,7 +22,8 @@ namespace {
 
 constexpr const char* library = POOLS_LIBRARY;
 
-// An export of the library. A plugin that no other may see has loaded it if it does not come next.
+// An export of the library. If it is not the next symbol, a plugin that was loaded with RTLD_LOCAL
+// has loaded the library.
 template <typename Function>
 Function* LookUp(const char* name) {
     void* address = dlsym(RTLD_NEXT, name);
@@ -48,7 +49,7 @@ bool IsEnabled(const void* mgr) {
     return next(mgr);
 }
 
-// An event with a block: the slot after the first is filled before it.
+// Puts an event with a block. The second slot is filled first.
 void PutBlock(Channel& channel, Op op, const void* mgr, const void* block, std::uint64_t size) {
     std::uint64_t index = 0;
     if (!Take(channel, 2, index)) { return; }
@@ -73,7 +74,7 @@ void PutName(Channel& channel, const void* mgr) {
     Fill(channel, index, Where(channel, PoolOf(mgr)), What(Op::PoolNamed, size, 0));
 }
 
-// The library's function is looked up at the first call of ours.
+// A function of the library, looked up at the first call.
 template <typename Function>
 class Next {
 public:
@@ -98,7 +99,7 @@ Next<void*(void*, unsigned int)> nextAlloc("_ZN3OBR7MemPool3Mgr5AllocEj");
 Next<bool(void*, void*)> nextFree("_ZN3OBR7MemPool3Mgr4FreeEPv");
 Next<void(void*)> nextClear("_ZN3OBR7MemPool3Mgr5ClearEv");
 
-// Carries out `call` and times it if it is its turn.
+// Makes the call, and times it if it is sampled.
 template <typename Call>
 inline __attribute__((always_inline)) auto Timed(Channel& channel, Call call) {
     if (!IsSampled()) { return call(); }

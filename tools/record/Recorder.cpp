@@ -1,5 +1,5 @@
-// How the recorder finds its channel and leaves no trace of itself in the program's environment,
-// and the slow paths of an event.
+// Finds the channel, removes the recorder from the program's environment, and has the slow paths of
+// an event.
 
 #include "record/Recorder.hpp"
 
@@ -21,7 +21,7 @@ namespace {
 
 std::atomic<bool> isSearched = false;
 
-// Takes a variable out of the environment.
+// Removes a variable from the environment.
 void Forget(char** place) {
     do { place[0] = place[1]; } while (*place++ != nullptr);
 }
@@ -33,8 +33,8 @@ char* ValueOf(char* variable, const char* name) {
                                                                             : nullptr;
 }
 
-// What the program executes finds the environment as it was before: the recorder is the first
-// of those preloaded.
+// Restores the environment for the programs that this one executes. The recorder is the first of
+// the preloaded libraries.
 void RestoreEnvironment() {
     for (char** place = environ; *place != nullptr;) {
         char* const preloaded = ValueOf(*place, "LD_PRELOAD");
@@ -50,7 +50,7 @@ void RestoreEnvironment() {
     }
 }
 
-// The channel that the descriptor leads to, if it is meant for this process and was never taken.
+// The channel of the descriptor, if it is for this process and not taken yet; else null.
 Channel* TakeChannel(int descriptor) {
     void* const memory =
         mmap(nullptr, sizeof(Channel), PROT_READ | PROT_WRITE, MAP_SHARED, descriptor, 0);
@@ -73,7 +73,7 @@ void Activate(Channel* channel) {
     active = static_cast<Active*>(page);
 }
 
-// The ticks of the shortest of a few rounds, which is one that was not interrupted.
+// The ticks of the shortest of a few rounds, which was not interrupted.
 template <typename Round>
 std::uint64_t LeastTicks(Round round) {
     std::uint64_t least = ~std::uint64_t{0};
@@ -81,7 +81,7 @@ std::uint64_t LeastTicks(Round round) {
     return least;
 }
 
-// What it takes to time nothing at all, so many times.
+// The ticks that so many empty measurements count.
 std::uint64_t TimerTicks() {
     return LeastTicks([] {
         std::uint64_t ticks = 0;
@@ -93,8 +93,8 @@ std::uint64_t TimerTicks() {
     });
 }
 
-// What so many events cost, from a channel that is not drained. Its memory is touched for the first
-// time, as that of the true channel.
+// The ticks of so many events into a channel that is not drained. Its memory is touched for the
+// first time, like that of the real channel.
 std::uint64_t EventTicks() {
     void* const memory = mmap(nullptr, sizeof(Channel), PROT_READ | PROT_WRITE,
                               MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
@@ -113,8 +113,8 @@ std::uint64_t EventTicks() {
     return least;
 }
 
-// The program that this one was before is over, and so are its threads: a slot that one of them has
-// not filled never will be. Once its last events are drained, its code is forgotten.
+// The former program of this process and its threads have ended, so a slot that they have not
+// filled never will be. After its last events are drained, its code addresses are forgotten.
 void TakeOver(Channel& channel) {
     const std::uint64_t head = channel.head.load();
     for (std::uint64_t index = channel.tail.load(); index != head; ++index) {
@@ -125,7 +125,7 @@ void TakeOver(Channel& channel) {
         }
     }
     Put(channel, Op::Executed, nullptr, 0, 0);
-    WaitForRoom(channel, head + numSlots);  // Room for so many is there once it is drained.
+    WaitForRoom(channel, head + numSlots);  // Waits until all slots before it are drained.
     for (Caller& caller : channel.callers) {
         caller.address.store(0);
         caller.state.store(Caller::Unknown);
@@ -155,7 +155,7 @@ void Attach() {
     errno = oldErrno;
 }
 
-// For a program that asks for nothing.
+// For a program that allocates nothing.
 __attribute__((constructor)) static void AttachAtStart() {
     Attach();
 }
@@ -166,8 +166,8 @@ void NumberThread(Channel& channel) {
     threadState.random = number;
 }
 
-// Sleeps until the slot is drained. If the process that drains the channel is gone, the recorder
-// gives up, and the program goes on unrecorded.
+// Sleeps until the slot is drained. If the process that drains the channel has ended, recording
+// ends and the program goes on.
 bool WaitForRoom(Channel& channel, std::uint64_t index) {
     const int oldErrno = errno;
     const timespec limit = {0, 100000000};
@@ -188,14 +188,14 @@ bool WaitForRoom(Channel& channel, std::uint64_t index) {
     return isDrained;
 }
 
-// A thread that is interrupted within a call seems to spend a long time there. A call that long is
-// counted as no longer than most that really are.
+// A call in which the thread is interrupted seems to take very long. The counted ticks are limited.
 void Sample::End() {
     constexpr std::uint64_t longest = (std::uint64_t{1} << numSampleLengths) - 1;
     ThreadState& state = threadState;
     state.isWarm = !state.isWarm;
     if (state.isWarm) { return; }
-    // The next one is 32 to 95 calls away, so that no pattern of the program keeps step.
+    // The next sample is 32 to 95 calls away, so that samples do not follow a pattern of the
+    // program.
     state.random = state.random * 1664525U + 1013904223U;
     state.countdown = samplePeriod / 2 + (state.random >> 26) - 1;
 

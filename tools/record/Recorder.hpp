@@ -1,5 +1,5 @@
-// The recorder inside of the program: whether it records, and how an event gets into the channel.
-// It asks the program's heap for nothing.
+// The recorder in the program: whether it records, and how an event gets into the channel. It
+// allocates nothing from the program's heap.
 
 #ifndef OBR_TOOLS_RECORD_RECORDER_HPP
 #define OBR_TOOLS_RECORD_RECORDER_HPP
@@ -14,8 +14,8 @@
 
 namespace Recorder {
 
-// On a page of its own, which the kernel clears in a forked child: the child goes on unrecorded,
-// however it was made.
+// On a page of its own, which the kernel clears in a child, so that no child is recorded, however
+// it is created.
 struct Active {
     std::atomic<Channel*> channel;
 };
@@ -28,7 +28,7 @@ struct ThreadState {
     std::uint32_t random;
     bool isWarm;  // The last call was timed to warm the caches; the next one counts.
 };
-// In the memory that the loader gives each thread from the start: its first use allocates nothing.
+// In the static thread-local memory, so that its first use allocates nothing.
 inline thread_local ThreadState threadState __attribute__((tls_model("initial-exec"))) = {};
 
 // The channel, or null while nothing is recorded.
@@ -60,8 +60,8 @@ inline void Fill(Channel& channel, std::uint64_t index, std::uint64_t where, std
     slot.what.store(what | Lap(index), std::memory_order_release);
 }
 
-// Takes `number` slots in a row and returns the index of the first in `index`; false if nothing is
-// recorded any more.
+// Takes `number` consecutive slots and sets `index` to that of the first. False if recording has
+// ended.
 inline bool Take(Channel& channel, std::uint64_t number, std::uint64_t& index) {
     index = channel.head.fetch_add(number, std::memory_order_acq_rel);
     const std::uint64_t last = index + number - 1;
@@ -85,9 +85,8 @@ inline void Put(Channel& channel, Op op, const void* block, std::uint64_t size,
     }
 }
 
-// Whether this call is one to be timed. Two calls in a row are, of which the second counts: the
-// code that times is rarely run, and the first would show how slow it is when it is not in the
-// cache.
+// Whether this call is timed. Two calls in a row are timed, and the second one counts: the first
+// warms the cache for the timing code, which rarely runs.
 inline bool IsSampled() {
     if (__builtin_expect(threadState.countdown != 0, 1)) {
         --threadState.countdown;
@@ -96,8 +95,8 @@ inline bool IsSampled() {
     return true;
 }
 
-// Times the allocator's part of a call. What the recorder takes around it is not sampled: within
-// the rest of a program it overlaps with that, and costs a fraction of what a clock would show.
+// Times the allocator's part of a call. The recorder's own part is not timed: it overlaps with the
+// program's code, and costs a fraction of what a clock would show.
 class Sample {
 public:
     explicit Sample(Channel& toChannel) : channel(toChannel) {}

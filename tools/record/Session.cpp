@@ -1,5 +1,5 @@
-// The process of `mempool record` beside that of the program: it starts the program, drains the
-// channel, passes signals on and ends the trace.
+// The part of the recorder in the process of `mempool record`: it starts the program, drains the
+// channel, forwards signals and completes the trace.
 
 #include "record/Session.hpp"
 
@@ -39,7 +39,7 @@ using Clock = std::chrono::steady_clock;
     throw System::Failure(System::ownFailure, what, errno);
 }
 
-// The channel's memory, which has no name and goes with the last of its users.
+// The channel's memory, which has no name and is released with its last user.
 class SharedChannel {
 public:
     SharedChannel() : descriptor(memfd_create("mempool-record", 0)) {
@@ -79,7 +79,8 @@ void Skip(Channel& channel, const std::vector<std::string>& patterns) {
     }
 }
 
-// Signals that reach this process are taken one by one where it waits, and pass to the program.
+// Receives the signals of this process one by one, where it waits, and forwards them to the
+// program.
 class Signals {
 public:
     Signals() {
@@ -94,7 +95,7 @@ public:
     Signals(const Signals&) = delete;
     Signals& operator=(const Signals&) = delete;
     ~Signals() {
-        // The failed write is reported as such.
+        // Discards the signal: the failed write is reported.
         sigset_t broken = {};
         sigaddset(&broken, SIGPIPE);
         const timespec atOnce = {};
@@ -104,7 +105,7 @@ public:
 
     void Restore() const { sigprocmask(SIG_SETMASK, &former, nullptr); }
 
-    // Waits for a signal, but not for long. Those of the terminal have reached the program as well.
+    // Waits for a signal, for at most `time`. The terminal sends its signals to the program too.
     void Wait(std::chrono::nanoseconds time, pid_t program) const {
         const timespec limit = {0, static_cast<long>(time.count())};
         siginfo_t info = {};
@@ -117,7 +118,7 @@ private:
     sigset_t former = {};
 };
 
-// Where the recorder is: beside the program `mempool`, as installed or as built.
+// The path of the recorder, relative to the program `mempool`, as installed or as built.
 std::string FindRecorder(bool pools) {
     const std::filesystem::path folder =
         std::filesystem::read_symlink("/proc/self/exe").parent_path();
@@ -136,7 +137,7 @@ std::string FindRecorder(bool pools) {
     throw System::Failure(System::ownFailure, name + ": not found beside mempool");
 }
 
-// What the recorder in the program needs, in the child that becomes the program.
+// Runs in the child, before it becomes the program: sets what the recorder in the program needs.
 void Prepare(const Order& order, const SharedChannel& channel, const std::string& recorder,
              const Signals& signals) {
     channel->pid = getpid();
@@ -154,7 +155,7 @@ std::string Text(double number) {
     return text.str();
 }
 
-// The processor time of a process that has ended and is still known, without that of its children.
+// The processor time of a process that has ended but has not been waited for, without its children.
 double ProcessorSeconds(pid_t program) {
     clockid_t clock = {};
     timespec time = {};
@@ -162,7 +163,7 @@ double ProcessorSeconds(pid_t program) {
     return static_cast<double>(time.tv_sec) + static_cast<double>(time.tv_nsec) / 1e9;
 }
 
-// How many ticks a second has, from the time that the program took.
+// Measures the ticks per second while the program runs.
 class TickRate {
 public:
     double PerSecond() const {
@@ -189,8 +190,8 @@ void WriteStart(Trace::CompactWriter& writer, const Order& order) {
     WriteInfo(writer, "by", order.pools ? "pools" : names[static_cast<std::size_t>(order.by)]);
 }
 
-// What the timed calls took together. Of few of them a single one that was interrupted would be
-// the most: the longest three are taken for as long as those next to them.
+// The total of the timed calls. If there are few, a single call that was interrupted could dominate
+// it, so the longest three count with the mean of the next shorter ones.
 struct TimedCalls {
     explicit TimedCalls(const Channel& channel) {
         double numLongest = 3;
@@ -216,9 +217,8 @@ struct TimedCalls {
     double ticks = 0;
 };
 
-// The recorder's part of the processor time is not the program's own. It is known to a fraction,
-// so that no more than half of the whole is taken for it. The share is left out where it would
-// be a guess.
+// The recorder's part of the processor time is subtracted. It is only an estimate, so at most half
+// of the whole is subtracted. The share is left out if there are too few samples for it.
 void WriteTimes(Trace::CompactWriter& writer, const Channel& channel, double whole,
                 const TickRate& rate) {
     constexpr double leastCalls = 200;
@@ -245,8 +245,8 @@ bool IsRunning(pid_t program) {
     return info.si_pid == 0;
 }
 
-// Drains the channel until the program ends, which is not waited for yet. What is drained soon gets
-// into the file, so that it is there even if this process is killed.
+// Drains the channel until the program ends, but does not wait for it. Flushes the trace regularly,
+// so that little is lost if this process is killed.
 void Follow(pid_t program, Collector& collector, Trace::CompactWriter& writer,
             const Signals& signals) {
     using namespace std::chrono_literals;

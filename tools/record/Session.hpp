@@ -15,22 +15,21 @@ struct Order {
     std::vector<std::string> command;  // The program and its arguments.
     std::string tracePath;             // "-" is the standard output.
     By by = By::All;
-    std::vector<std::string> skipped;  // Patterns of functions that are no callers.
-    bool pools = false;                // The calls of Mgr in place of the heap's.
+    std::vector<std::string> skipped;  // Patterns of functions that are not callers.
+    bool pools = false;                // Records the calls of Mgr instead of the heap's.
 };
 
 struct Outcome {
-    int waitStatus = 0;  // How the program ended, as waitpid says it.
+    int waitStatus = 0;  // How the program ended, from waitpid.
     std::uint64_t numEvents = 0;
     std::uint64_t numThreads = 0;
     std::uint64_t traceSize = 0;
-    bool isCutByExec = false;         // The program has become one that cannot be recorded.
+    bool isCutByExec = false;         // The program was replaced by one that cannot be recorded.
     bool isAddressSanitized = false;  // The program is built with AddressSanitizer.
 };
 
-// Records the program. Signals sent to this process meanwhile go on to the program. A
-// System::Failure is thrown before the program starts, or after its end if the trace could not be
-// written.
+// Records the program. Signals sent to this process are forwarded to the program. Throws a
+// System::Failure before the program starts, or after its end if the trace could not be written.
 Outcome RecordProgram(const Order& order);
 
 }  // namespace Recorder

@@ -1,4 +1,4 @@
-// Symbol tables, those of separate debug files included, are elfutils' work.
+// elfutils reads the symbol tables, including those in separate debug files.
 
 #include "record/Symbols.hpp"
 
@@ -19,8 +19,7 @@ std::string Hex(std::uint64_t number) {
     return text.str();
 }
 
-// Without template arguments, which would fill a line by themselves, and without the hash that ends
-// a name of Rust.
+// Removes template arguments, which can be very long, and the hash at the end of a Rust name.
 std::string Shortened(std::string_view name) {
     constexpr std::size_t hashSize = std::string_view("::h0123456789abcdef").size();
     if (name.size() > hashSize && name.substr(name.size() - hashSize, 3) == "::h") {
@@ -60,7 +59,7 @@ std::string Symbols::Name(const Module& module, std::uint64_t address) {
     if (module.path[0] == '\0') { return Hex(address); }
     const std::string file = NameOf(module);
     if (Dwfl* const dwfl = Open(module)) {
-        // A call may be the last instruction of a function: what matters lies before the return.
+        // A call may be the last instruction of a function, so look before the return address.
         if (Dwfl_Module* const found = dwfl_addrmodule(dwfl, address - 1)) {
             GElf_Off offset = 0;
             GElf_Sym symbol = {};

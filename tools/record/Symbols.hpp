@@ -1,4 +1,4 @@
-// The names of code addresses, from the files that the code was loaded from.
+// Names code addresses, from the files that the code was loaded from.
 
 #ifndef OBR_TOOLS_RECORD_SYMBOLS_HPP
 #define OBR_TOOLS_RECORD_SYMBOLS_HPP

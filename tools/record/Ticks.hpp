@@ -1,5 +1,5 @@
-// A clock that is cheap to read, in ticks of its own. Some processors count several of them at
-// once, so that one reading more or less says little, and only a mean over many does.
+// A clock that is cheap to read, in ticks of its own. On some processors it advances by several
+// ticks at once, so that only the mean of many measurements is meaningful.
 
 #ifndef OBR_TOOLS_RECORD_TICKS_HPP
 #define OBR_TOOLS_RECORD_TICKS_HPP
@@ -29,8 +29,8 @@ inline std::uint64_t Ticks() {
 #endif
 }
 
-// The time at which the code before this is done. A processor that runs instructions out of order
-// may read a counter before a short call in front of it has returned.
+// The time at which the code before this call is done. Without the barrier, a processor may read
+// the counter before a short call ahead of it has returned.
 inline std::uint64_t TicksWhenDone() {
 #if defined(__x86_64__)
     _mm_lfence();
