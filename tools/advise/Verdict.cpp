@@ -226,7 +226,7 @@ std::vector<std::string> CodeOf(const Replay::PoolSettings& settings, Replay::La
     std::vector<std::string> lines = {"OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);"};
     if (isForHeap) { lines = {"OBR::MemPool::HeapSettings()", "    .On(true)"}; }
     for (const auto& row : OBR::MemPool::SettingTable::all) {
-        if (isForHeap && !Replay::IsSaid(row, settings)) { continue; }
+        if (isForHeap && !Replay::IsSetInHeap(row, settings)) { continue; }
         const unsigned int value = row.In(settings);
         const std::string argument = !row.IsFlag() ? std::to_string(value)
                                      : value != 0  ? "true"

@@ -1,21 +1,20 @@
-// Runs a program on pools, unchanged; `mempool try` does that and compares:
+// Runs an unchanged program on pools. `mempool try` uses it to compare pools with malloc:
 //
 //     LD_PRELOAD=.../libMallocOnPools.so NUV_OBR_MEMPOOL_BUCKET_SIZE=65450 perl ...
 //
-// It takes the place of the malloc family. Blocks up to the largest record of its one Heap come
-// from there, aligned to 16 bytes as malloc promises; larger ones stay with the C library, which
-// can grow them in place. The settings are those of the environment, except that pools are on
-// unless NUV_OBR_MEMPOOL_ON says no (then every block is the C library's), and that there is no
+// It replaces the malloc family. Blocks up to the largest record come from one Heap, aligned to 16
+// bytes as malloc promises. Larger ones come from the C library, which can grow them in place. The
+// settings are those of the environment, with two exceptions: pools are on, unless
+// NUV_OBR_MEMPOOL_ON disables them (then all blocks come from the C library), and there is no
 // trace. MALLOC_ON_POOLS_REPORT=FILE appends the pool's report to FILE when a process exits.
 //
-// Threads: a heap has no lock of its own, so that calls take one here as soon as the process has a
-// second thread. It works then, but no better than any one lock: this is for programs without
-// threads.
+// Threads: a heap has no lock, so calls take one here once the process has a second thread.
+// Programs with threads work, but all of them share that lock.
 //
-// Whose block? A block of the C library has its size in the 8 bytes ahead of it, so that the 4
-// bytes directly ahead are 0 below 4 GB, and never look like what a Heap writes there. A Heap thus
-// refuses such a block by one look at it, whenever and by whomever it was made: before this library
-// was ready, in another thread, or by the C library itself.
+// Whose block? A block of the C library has its size in the 8 bytes before it, so that the 4 bytes
+// directly before it are 0 below 4 GB, and never look like what a Heap writes there. A Heap thus
+// refuses such a block after one look, even if it was allocated before this library was ready, in
+// another thread, or by the C library itself.
 
 #include <MemPoolHeap>
 
@@ -39,7 +38,7 @@
 
 #include "replay/Layer.hpp"
 
-// The C library's own functions, by names that nobody takes the place of.
+// The C library's own functions, by names that no library replaces.
 // NOLINTBEGIN(bugprone-reserved-identifier)
 extern "C" {
 void* __libc_malloc(std::size_t size);
@@ -56,10 +55,10 @@ using OBR::MemPool::Heap;
 
 using Replay::alignmentOfMalloc;
 
-Heap* heap = nullptr;  // Lives from the start-up to the end of the process, behind all exit steps.
+Heap* heap = nullptr;  // Lives from the start-up to the end of the process, after all exit steps.
 
-// Blocks of fewer bytes than that come from the heap. 0 while it must not be asked: before the
-// start-up, while it reports, and while its exhaustion is on its way to the caller.
+// Blocks of fewer bytes than this come from the heap. 0 while the heap must not be used: before the
+// start-up, while it prints its report, and while its exception is thrown to the caller.
 std::atomic<std::size_t> limit{0};
 std::size_t usualLimit = 0;  // What it is otherwise.
 
@@ -135,15 +134,15 @@ __attribute__((constructor)) void StartUp() {
     using namespace OBR::MemPool;  // NOLINT(google-build-using-namespace)
     FindUsableSize();
     if (std::getenv("NUV_OBR_MEMPOOL_ON") != nullptr && !NUV_OBR_MEMPOOL_ON()) { return; }
-    NUV_OBR_MEMPOOL_TRACE(false);  // Its lines would allocate, which is an event to be traced.
+    NUV_OBR_MEMPOOL_TRACE(false);  // Writing a line may allocate, which would be traced again.
     try {
         heap = new Heap("malloc", Replay::HeapSettingsOf(Replay::PoolSettings::OfProcess()));
     } catch (const std::exception& error) {
         std::fprintf(stderr, "MallocOnPools: %s\n", error.what());
         std::_Exit(1);
     }
-    // Whoever forks holds the lock, so that the child finds the heap whole. There the lock is new:
-    // the child's thread is another than the one that holds it.
+    // The thread that forks holds the lock, so that the child's heap is consistent. The child gets
+    // a new lock, since its thread is not the one that holds the old one.
     pthread_atfork([] { mutex.lock(); }, [] { mutex.unlock(); },
                    [] { ::new (&mutex) std::recursive_mutex; });
 
@@ -166,8 +165,8 @@ __attribute__((destructor)) void Report() {
 
 }  // namespace
 
-// What the pool itself asks for comes from the C library. These are this library's own: a program's
-// new and delete end in the malloc below. Throwing asks malloc for the exception's memory.
+// The pool's own memory comes from the C library. Only this library uses these operators: those of
+// the program call the malloc below. Throwing calls malloc for the exception's memory.
 void* operator new(std::size_t size) {
     void* const block = __libc_malloc(size);
     if (block == nullptr) {
@@ -202,7 +201,7 @@ void* calloc(std::size_t count, std::size_t size) noexcept {
     return block == nullptr ? nullptr : std::memset(block, 0, bytes);
 }
 
-// A block that shrinks stays, unless less than half of it would be used.
+// A block that shrinks stays in its place, unless less than half of it would be used.
 void* realloc(void* block, std::size_t size) noexcept {
     if (block == nullptr) { return malloc(size); }
     const std::size_t usable = Usable(block);
@@ -243,7 +242,7 @@ void* aligned_alloc(std::size_t alignment, std::size_t size) noexcept {
     return IsPowerOfTwo(alignment) ? Aligned(alignment, size) : Fail(EINVAL);
 }
 
-// valloc and pvalloc remain the C library's: their blocks are refused by the heap like all of its.
+// valloc and pvalloc stay those of the C library. The heap refuses their blocks like all of its.
 
 std::size_t malloc_usable_size(void* block) noexcept {
     if (block == nullptr) { return 0; }

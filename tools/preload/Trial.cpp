@@ -34,7 +34,7 @@ namespace {
 
 namespace fs = std::filesystem;
 
-// The library of the pools: in an install, or where it is built.
+// The preloaded library of the pools, as installed or as built.
 std::string PoolsLibrary() {
     const fs::path here = fs::read_symlink("/proc/self/exe").parent_path();
     std::istringstream places(PRELOAD_PLACES);
@@ -45,7 +45,7 @@ std::string PoolsLibrary() {
     throw std::runtime_error(PRELOAD_NAME " is not installed beside " + here.string());
 }
 
-// Whether the loader finds the library. Asked in a child, which the library may change.
+// Whether the loader finds the library. Loads it in a child, since it may change the process.
 bool IsInstalled(const char* library) {
     const pid_t child = fork();
     if (child == 0) { _exit(dlopen(library, RTLD_NOW) == nullptr ? 1 : 0); }
@@ -54,7 +54,7 @@ bool IsInstalled(const char* library) {
     return status == 0;
 }
 
-// What one run writes on one stream, in a file without a name.
+// The output of one run on one stream, in a file without a name.
 class Output {
 public:
     Output() : file(std::tmpfile()) {
@@ -68,7 +68,7 @@ public:
 
     int Descriptor() const { return fileno(file); }
 
-    // The next piece of it, empty at the end.
+    // The next piece, empty at the end.
     std::string_view Read() {
         return {piece.data(), std::fread(piece.data(), 1, piece.size(), file)};
     }
@@ -110,7 +110,7 @@ double Seconds(const timeval& time) {
     return static_cast<double>(time.tv_sec) + 1e-6 * static_cast<double>(time.tv_usec);
 }
 
-// In the child, before the program.
+// Runs in the child, before the program.
 void Prepare(const Order& order, const Side& side, int input, const Run& run) {
     std::signal(SIGINT, SIG_DFL);
     dup2(input, STDIN_FILENO);
@@ -142,7 +142,7 @@ std::unique_ptr<Run> RunOnce(const Order& order, const Side& side) {
     return run;
 }
 
-// While this lives SIGINT ends the program that runs, not this process.
+// While this lives, SIGINT ends only the program that runs, not this process.
 class Interruption {
 public:
     Interruption() : before(std::signal(SIGINT, [](int) { isAsked = 1; })) { isAsked = 0; }
@@ -198,7 +198,7 @@ Trial TryProgram(const Order& order,
     for (unsigned int round = 1; round <= order.rounds; ++round) {
         std::vector<std::unique_ptr<Run>> runs(trial.sides.size());
         for (std::size_t i = 0; i < runs.size(); ++i) {
-            const std::size_t place = (i + round) % runs.size();  // Each is the first one at times.
+            const std::size_t place = (i + round) % runs.size();  // Each is first in turn.
             if (Interruption::IsAsked()) { return trial; }
             atRun(round, trial.sides[place].name);
             runs[place] = RunOnce(order, trial.sides[place]);
@@ -226,7 +226,7 @@ Conclusion Conclude(const Trial& trial) {
     }
     const Advise::Figures& before = conclusion.figures.at(0);
     const Advise::Figures& pools = conclusion.figures.at(1);
-    // Of the whole program, which thus has a share of 1 and events enough.
+    // The whole program was measured, so the share is 1, and the number of events does not matter.
     const Advise::Program whole = {1000000, 0, 1};
     const auto judge = [&](const Advise::Figures& figures) {
         return Advise::Judge({before, {{{}, figures}}, {}}, whole);

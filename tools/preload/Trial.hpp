@@ -1,4 +1,4 @@
-// A program run as it is, on pools and on mimalloc, in turns, and compared.
+// Runs an unchanged program on malloc, on pools and on mimalloc, in turns, and compares.
 
 #ifndef OBR_TOOLS_PRELOAD_TRIAL_HPP
 #define OBR_TOOLS_PRELOAD_TRIAL_HPP
@@ -15,36 +15,36 @@ namespace Preload {
 
 struct Order {
     std::vector<std::string> command;  // The program and its arguments.
-    std::string input;                 // The file that is its standard input; empty for none.
+    std::string input;                 // The file for its standard input; empty for none.
     Replay::PoolSettings settings;
     unsigned int rounds = 9;
-    bool showsOnErrors = false;  // What the program prints is shown on the standard error alone.
+    bool showsOnErrors = false;  // Shows all output of the program on standard error.
 };
 
 // A way to serve the program's blocks.
 struct Side {
     std::string name;                // "malloc", "pools" or "mimalloc".
-    std::string library;             // The one that is preloaded; empty for malloc.
+    std::string library;             // The preloaded library; empty for malloc.
     std::vector<double> cpuSeconds;  // User and system time, a value for each round.
     std::vector<double> wallSeconds;
     std::vector<double> peakBytes;  // Resident memory.
-    bool isSame = true;  // Output and exit status were those of the first run in each round.
+    bool isSame = true;             // Output and exit status were the same as in the first run.
 };
 
 struct Trial {
     std::vector<Side> sides;  // malloc is the first one.
-    unsigned int rounds = 0;  // Those that are whole.
+    unsigned int rounds = 0;  // Complete rounds.
     int waitStatus = 0;       // Of the first run.
 };
 
-// Runs the program. The first run counts for nothing: what it prints is shown, and the other runs
-// are compared with it. `atRun` is called before each run. SIGINT ends the program and the trial,
-// which then has the rounds that are whole. A program that cannot be run, or a library that is not
-// installed, is a std::exception.
+// Runs the program. The first run is not measured: its output is shown, and the other runs are
+// compared with it. Calls `atRun` before each run. SIGINT ends the program and the trial, which
+// then has the complete rounds. Throws a std::exception if the program cannot be run or a library
+// is not installed.
 Trial TryProgram(const Order& order,
                  const std::function<void(unsigned int round, const std::string& side)>& atRun);
 
-// What a trial means.
+// The result of a trial.
 struct Conclusion {
     std::vector<Advise::Figures> figures;  // Of each side; the time is seconds of the processor.
     std::optional<bool> sameOutput;        // None if malloc's own runs differ.

@@ -14,7 +14,7 @@ namespace {
 bool counting = false;
 std::int64_t heldBytes = 0;
 
-// What the heap takes for a block beside its usable bytes.
+// The bytes of the heap for a block in addition to its usable bytes.
 #ifdef __GLIBC__
 constexpr std::size_t headerSize = sizeof(std::size_t);
 #else
@@ -51,7 +51,7 @@ void* operator new(std::size_t size) {
 void* operator new[](std::size_t size) {
     return Lend(size);
 }
-// Of the C++ library these two may call their own malloc, and a sanitizer's do.
+// Those of the C++ library may call another malloc, and those of a sanitizer do.
 void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
     return LendOrNull(size);
 }

@@ -1,6 +1,6 @@
-// Counts what operator new lends to this program, the library's requests included. A program that
-// links this replaces the operators of the C++ library by ones that can count; while they do not,
-// they pay one test of a flag for it.
+// Counts the bytes that this program allocates with operator new, including those of the library. A
+// program that links this file has operators that can count; while they do not count, that costs
+// one test of a flag.
 
 #ifndef OBR_TOOLS_REPLAY_HEAPCOUNT_HPP
 #define OBR_TOOLS_REPLAY_HEAPCOUNT_HPP
@@ -9,12 +9,11 @@
 
 namespace HeapCount {
 
-// Counts from 0 on.
+// Starts to count, from 0.
 void Start();
 
-// Stops, and returns the bytes lent since the start and not given back: rounded as the allocator
-// rounds, as malloc_usable_size tells, and with the header that the GNU C library keeps for each
-// block.
+// Stops, and returns the bytes that were allocated since the start and not freed, with the
+// allocator's rounding (malloc_usable_size) and the GNU C library's header of each block.
 std::int64_t Stop();
 
 }  // namespace HeapCount

@@ -1,4 +1,4 @@
-// The settings in the environment are meant for the programs that the tools run, not for the tools.
+// The settings in the environment are for the programs that the tools run, not for the tools.
 
 #include <HostLayer/HostEnv.hpp>
 

@@ -1,5 +1,5 @@
-// What serves a program's blocks in place of malloc. The blocks of a layer cost what they cost the
-// program that uses it.
+// A layer serves a program's blocks instead of malloc. Its blocks cost as much here as in a program
+// that uses it.
 
 #ifndef OBR_TOOLS_REPLAY_LAYER_HPP
 #define OBR_TOOLS_REPLAY_LAYER_HPP
@@ -21,16 +21,15 @@ enum class Layer : std::uint8_t {
 
 constexpr std::size_t alignmentOfMalloc = 16;
 
-// The preloaded library serves blocks of fewer bytes than this from its Heap, and leaves the others
-// to the C library. A block takes up to 16 bytes more in its record: the header, and the way to its
-// alignment.
+// The preloaded library serves blocks of fewer bytes than this from its Heap. The others come from
+// the C library. A record has up to 16 bytes more than its block, for the header and the alignment.
 constexpr std::size_t MallocLimit(std::size_t maxRecordSize) {
     return maxRecordSize < 2 * alignmentOfMalloc
                ? 0
                : ((maxRecordSize - alignmentOfMalloc) & ~std::size_t{7}) + 1;
 }
 
-// What a layer makes of settings: a Heap rounds the data alignment up to a multiple of 4.
+// The settings as a layer uses them: a Heap rounds the data alignment up to a multiple of 4.
 inline PoolSettings InLayer(PoolSettings settings, Layer layer) {
     if (layer != Layer::Mgr) {
         settings.dataAlignment = OBR::MemPool::RoundUp(settings.dataAlignment, 4);
@@ -38,19 +37,19 @@ inline PoolSettings InLayer(PoolSettings settings, Layer layer) {
     return settings;
 }
 
-// Whether a Heap is told this setting: one that is told no bucket size begins with the default, and
-// goes on in larger buckets where it becomes large.
-inline bool IsSaid(const OBR::MemPool::Setting& row, const PoolSettings& settings) {
+// Whether a Heap gets this setting. A default bucket size is not set, so that large size classes
+// continue in larger buckets.
+inline bool IsSetInHeap(const OBR::MemPool::Setting& row, const PoolSettings& settings) {
     return row.size != &PoolSettings::bucketSize || row.In(settings) != row.In(PoolSettings());
 }
 
 // The settings of a Heap.
 inline OBR::MemPool::HeapSettings HeapSettingsOf(const PoolSettings& settings) {
-    OBR::MemPool::HeapSettings said;
-    if (IsSaid(OBR::MemPool::SettingTable::bucketSize, settings)) {
-        said.BucketSize(settings.bucketSize);
+    OBR::MemPool::HeapSettings heapSettings;
+    if (IsSetInHeap(OBR::MemPool::SettingTable::bucketSize, settings)) {
+        heapSettings.BucketSize(settings.bucketSize);
     }
-    return said.On(true)
+    return heapSettings.On(true)
         .MaxRecordSize(settings.maxRecordSize)
         .MinRecordSize(settings.minRecordSize)
         .DataAlignment(settings.dataAlignment)

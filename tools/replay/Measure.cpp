@@ -1,4 +1,4 @@
-// Replays, counted or timed, never both.
+// Replays a recording and either counts bytes or measures time, never both at once.
 
 #include "replay/Measure.hpp"
 

@@ -12,14 +12,14 @@
 
 namespace Replay {
 
-// One replay of one side: what it holds from the heap at the peak, in bytes. `atPeak` is called
-// while the pools stand there.
+// Replays one side and returns the bytes that it holds from the heap at the peak. Calls `atPeak`
+// while the pools are at the peak.
 std::int64_t BytesHeldByPools(
     const Recording& recording, Layer layer, const std::function<void()>& atPeak = [] {});
 std::int64_t BytesHeldByHeap(const Recording& recording);
 
-// One replay of one side: processor time per event in nanoseconds, page faults included. There must
-// be an event.
+// Replays one side and returns the processor time per event in nanoseconds, including page faults.
+// There must be an event.
 double PoolNanosecondsPerEvent(const Recording& recording, Layer layer);
 double HeapNanosecondsPerEvent(const Recording& recording);
 

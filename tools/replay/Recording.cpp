@@ -15,7 +15,7 @@ class Recorder {
 public:
     explicit Recorder(std::size_t max) : maxSteps(max) {}
 
-    // Adds a step behind which `blocks` stands.
+    // Adds a step. `blocks` is the state after it.
     void Add(Trace::Step step, const Trace::Resolver& blocks) {
         if (recording.steps.size() == maxSteps) {
             if (step.kind != Trace::Kind::Named) { ++recording.numLeftOut; }
@@ -52,7 +52,7 @@ public:
     }
 
 private:
-    // Keeps the blocks that go with the step and returns their number.
+    // Keeps the blocks that the step drops and returns their number.
     std::uint32_t Drop(Trace::Step& step, const std::vector<Trace::Block>& dropped) {
         step.block.index = static_cast<std::uint32_t>(recording.dropped.size());
         step.block.size = static_cast<std::uint32_t>(dropped.size());
@@ -99,8 +99,8 @@ Recording ReadRecording(Trace::StepReader& reader,
         }
         return recorder.Finish(reader.Blocks());
     };
-    // In a thread of its own, which has an arena of its own in the C library: the heap of the
-    // calling thread, which a replay uses, stays as fresh as that of a program that starts.
+    // In another thread, which has an arena of its own in the C library: the heap of the calling
+    // thread, which a replay uses, stays as fresh as that of a new program.
     return std::async(std::launch::async, read).get();
 }
 

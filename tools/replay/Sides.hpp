@@ -1,7 +1,6 @@
-// The sides of a replay, which carry the steps of a recording out: pools that drop their blocks at
-// once, and pools whose blocks are freed one by one, the C library's heap among them. What a side
-// still holds, its destructor gives back. `untimed` is time that no step is charged with, in
-// nanoseconds.
+// The sides of a replay, which execute the steps of a recording: pools that drop their blocks at
+// once, and pools whose blocks are freed one by one, such as the C library's heap. The destructor
+// of a side frees what is left. `untimed` is the time, in nanoseconds, that does not count.
 
 #ifndef OBR_TOOLS_REPLAY_SIDES_HPP
 #define OBR_TOOLS_REPLAY_SIDES_HPP
@@ -21,7 +20,7 @@
 
 namespace Replay {
 
-// The pools have the settings of the process.
+// These pools have the settings of the process.
 
 class HeapPool {
 public:
@@ -67,7 +66,7 @@ public:
     void Free(void* block) { ::operator delete[](block); }
 };
 
-// A pool for each one in the recording.
+// Has a pool for each one in the recording.
 template <typename Pool>
 class DroppingSide {
 public:
@@ -92,9 +91,10 @@ private:
     std::vector<void*> blocks;
 };
 
-// One pool for all. Where a pool of the recording drops its blocks at once, these are freed one by
-// one, so that it holds no more than that pool does. What a program clears it would have to free
-// otherwise: that is charged. What it leaves to the end of a pool it never asks for: that is not.
+// Has one pool for all. Blocks that a pool of the recording drops at once are freed one by one
+// here, so that both hold the same blocks. For a Clear that time counts, since without pools a
+// program would have to free these blocks. At the end of a pool it does not: a program need not
+// free them.
 template <typename Pool>
 class FreeingSide {
 public:
@@ -136,7 +136,7 @@ private:
     std::vector<void*> blocks;
 };
 
-// Carries the first `numSteps` steps out.
+// Executes the first `numSteps` steps.
 template <typename Side>
 void Run(Side& side, const Recording& recording, std::size_t numSteps) {
     const Trace::Step* step = recording.steps.data();
@@ -161,7 +161,7 @@ void Run(Side& side, const Recording& recording, std::size_t numSteps) {
             case Trace::Kind::Info:
             case Trace::Kind::Time:
             case Trace::Kind::Malformed:
-                break;  // In no recording.
+                break;  // Not in a recording.
         }
     }
 }
