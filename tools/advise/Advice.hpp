@@ -23,11 +23,11 @@ struct Advice {
 struct Question {
     Replay::Layer layer = Replay::Layer::Heap;
     bool mergesGroups = false;  // One pool for all groups of a recorded heap.
-    double seconds = 30;        // How long to search, about.
+    double seconds = 30;        // The approximate time of the search.
 };
 
-// Reads the trace and searches. `show` is called with a line about the progress now and then. A
-// trace without an allocation is a std::runtime_error.
+// Reads the trace and searches. Calls `show` with a line of progress from time to time. Throws a
+// std::runtime_error if the trace has no allocation.
 Advice TakeAdvice(Trace::StepReader& reader, const Question& question,
                   const std::function<void(const std::string&)>& show);
 

@@ -1,4 +1,4 @@
-// What was measured of the heap and of each setting, and the ways to compare them.
+// The measurements of the heap and of all settings, and how they are compared.
 
 #ifndef OBR_TOOLS_ADVISE_FIGURES_HPP
 #define OBR_TOOLS_ADVISE_FIGURES_HPP
@@ -14,7 +14,7 @@ namespace Advise {
 
 struct Figures {
     double nsPerEvent = 0;  // The median of the rounds.
-    double nsSpread = 0;    // Between their lower and their upper quartile. 0 of a single round.
+    double nsSpread = 0;    // Between the lower and the upper quartile; 0 for a single round.
     double bytesHeld = 0;   // At the peak.
     unsigned int rounds = 0;
 };
@@ -31,20 +31,20 @@ struct GivenUp {
 
 struct Findings {
     Figures heap;
-    std::vector<Measured> settings;  // The first one has the defaults, unless it was given up.
+    std::vector<Measured> settings;  // The first are the defaults, unless they were given up.
     std::vector<GivenUp> givenUp;
 };
 
-// What a setting can be good at. Both is time and bytes alike: half of one is worth twice the
-// other.
+// What settings are judged by. Both weighs time and bytes equally: half of one makes up for twice
+// the other.
 enum class Aim { Both, Time, Bytes };
 inline constexpr std::array<Aim, 3> aims = {Aim::Both, Aim::Time, Aim::Bytes};
 
-// How much it takes of what the heap takes: below 1 it is better, and less is better.
+// The ratio to the heap: below 1 is better than the heap, and less is better.
 double Cost(const Figures& figures, const Figures& heap, Aim aim);
 
-// The value below which the share `share` of the values lies, between the nearest two if it is none
-// of them. There must be one.
+// The value below which the share `share` of the values lies, interpolated between the nearest two.
+// There must be at least one value.
 double Quantile(std::vector<double> values, double share);
 
 }  // namespace Advise

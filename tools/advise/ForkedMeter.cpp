@@ -1,5 +1,5 @@
-// The child writes its figure into a pipe and leaves without a trace: no exit handler runs, no
-// buffer is written, and what the library may say on standard output is not seen.
+// The child writes its figure to a pipe and ends without side effects: it runs no exit handler,
+// flushes no buffer, and its standard output is discarded.
 
 #include "advise/ForkedMeter.hpp"
 
@@ -33,12 +33,12 @@ namespace {
 
 constexpr int statusOutOfMemory = 3;
 
-// Seconds that the pools may always take, and the heap.
+// Seconds that a replay of the pools or of the heap may always take.
 constexpr double leastLimit = 0.5;
 constexpr double limitOfHeap = 3600;
 
-// A trace of few events is replayed so often that it takes about this long: the clock and the
-// caches of the processor would show more of themselves than of it.
+// A short trace is replayed several times, so that a measurement takes about this long. Otherwise
+// the clock and the caches of the processor would dominate it.
 constexpr double leastNanoseconds = 2e7;
 
 [[noreturn]] void BeChild(const std::function<double()>& work, int result) {
@@ -68,9 +68,9 @@ double ProcessorSeconds(pid_t child) {
     return static_cast<double>(used.tv_sec) + 1e-9 * static_cast<double>(used.tv_nsec);
 }
 
-// Waits until the child writes its figure or ends; false if it uses more time than that, looked at
-// now and then. A timer in the child would do it too, but while one runs, Linux counts the time of
-// the process in ticks.
+// Waits until the child writes its figure or ends. False if it uses more processor time than that,
+// which is checked from time to time. A timer in the child would be simpler, but makes Linux count
+// the time of the process in coarse ticks.
 bool EndsInTime(pid_t child, int result, double processorSeconds) {
     constexpr int milliseconds = 20;
     pollfd pipe = {result, POLLIN, 0};
@@ -123,10 +123,10 @@ ForkedMeter::ForkedMeter(const Replay::Recording& replayed, Replay::Layer measur
       mostOfHeapTime(limit),
       start(std::chrono::steady_clock::now()) {
 #ifdef __GLIBC__
-    malloc_trim(0);  // What reading the trace has left over is not for the replays to use up.
+    malloc_trim(0);  // The replays must not use memory that was freed after reading the trace.
 #endif
-    // The number is the same for all, since the first replay in a process is slower than the
-    // others.
+    // The number is the same for all measurements, since the first replay in a process is slower
+    // than the others.
     const Outcome one = Time(std::nullopt);
     const double length = one.figure.value_or(0) * static_cast<double>(recording.steps.size());
     if (length > 0) {

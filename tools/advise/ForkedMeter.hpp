@@ -1,6 +1,6 @@
-// A meter that replays a recording through the real library and the real heap, each time in a child
-// process of its own: it begins with the memory of this process, the recording among it, and what
-// it does to its heap or dies of is its own affair.
+// A meter that replays a recording on the real library and the real heap, each time in a new child
+// process. The child starts with the memory of this process, including the recording. It cannot
+// affect this process, even if it crashes.
 
 #ifndef OBR_TOOLS_ADVISE_FORKEDMETER_HPP
 #define OBR_TOOLS_ADVISE_FORKEDMETER_HPP
@@ -14,14 +14,15 @@
 
 namespace Advise {
 
-// Runs `work` in a child process and returns its figure, or what became of the child. It may use
-// that many seconds of the processor, then it is stopped.
+// Runs `work` in a child process and returns its figure, or why there is none. The child is stopped
+// when it has used that many seconds of processor time.
 Outcome InChild(const std::function<double()>& work, double processorSeconds);
 
 class ForkedMeter final : public Meter {
 public:
-    // The recording must have an event, and live as long as this. A replay of the pools that takes
-    // more than `limit` times the time of the heap, and more than a while, is stopped.
+    // The recording must have an event, and live as long as the meter. A replay of the pools is
+    // stopped if it takes much longer than one of the heap: more than `limit` times its time, and
+    // more than half a second.
     ForkedMeter(const Replay::Recording& replayed, Replay::Layer measured, double limit = 8);
 
     Outcome Time(const Side& side) override;

@@ -1,5 +1,5 @@
-// What a search asks for: one replay at a time, of the heap or of pools with some settings. A test
-// has a meter with costs of its own.
+// The measurements that a search needs: one replay at a time, of the heap or of pools with some
+// settings. A test has a meter with made-up costs.
 
 #ifndef OBR_TOOLS_ADVISE_METER_HPP
 #define OBR_TOOLS_ADVISE_METER_HPP
@@ -19,7 +19,7 @@ struct Outcome {
     std::optional<double> figure;
     std::string problem;
 
-    // The figure. If there is none, a std::runtime_error with that text before the problem.
+    // The figure. If there is none, throws a std::runtime_error with that text before the problem.
     double OrFail(const std::string& text) const;
 };
 
@@ -36,7 +36,7 @@ public:
     // Bytes held at the peak.
     virtual Outcome Held(const Side& side) = 0;
 
-    // Seconds on the wall since the meter was made.
+    // Elapsed seconds since the meter was made.
     virtual double Elapsed() const = 0;
 };
 

@@ -1,6 +1,6 @@
-// The times of a setting are kept as ratios: each one beside those of the heap right before and
-// right after it. A machine that is slower for a while, for other work or for heat, is so for both,
-// and the settings stay comparable however far apart in time they were looked at.
+// The times of settings are kept as ratios: each one to the times of the heap right before and
+// right after it. If the machine is slower for a while, it is slower for both, so that settings can
+// be compared even if they were measured at different times.
 
 #include "advise/Search.hpp"
 
@@ -18,23 +18,23 @@ namespace {
 
 using Replay::PoolSettings;
 
-// The leaders at the end have this many rounds, unless time is out.
+// The leaders have this many rounds at the end, unless time runs out.
 constexpr unsigned int enoughRounds = 15;
-// No setting leads on fewer rounds: a lucky one would lead the search astray.
+// Settings with fewer rounds never lead: a lucky round would mislead the search.
 constexpr unsigned int trustedRounds = 3;
-// What a neighbour must be better by to be walked to.
+// The search steps to a neighbour only if its ratio is at most this.
 constexpr double worthAStep = 0.99;
-// How many settings are timed between two replays of the heap.
+// Settings that are timed between two replays of the heap.
 constexpr std::size_t batchSize = 4;
-// Which share of the time may have gone when a phase is left.
+// Each phase ends when this share of the time has passed.
 constexpr double lookingShare = 0.4;
 constexpr double walkingShare = 0.7;
 
-// A setting in the course of the search.
+// Settings during the search.
 struct Candidate {
     PoolSettings settings;
     double bytesHeld;
-    std::vector<double> ratios;  // Of its time to the heap's, a round each.
+    std::vector<double> ratios;  // Of its time to the heap's, one per round.
 };
 
 struct Less {
@@ -63,7 +63,7 @@ public:
                   grid.begin() + static_cast<std::ptrdiff_t>(end)});
         }
         for (const Aim aim : aims) { Walk(aim); }
-        // So many of the most promising get so many rounds.
+        // The number of the most promising, and the rounds that they get.
         constexpr std::pair<std::size_t, unsigned int> halvings[] = {{8, 3}, {4, 6}, {2, 10}};
         for (const auto& [numBest, rounds] : halvings) {
             for (const Aim aim : aims) { AddRounds(Best(aim, numBest), rounds); }
@@ -71,7 +71,7 @@ public:
         for (const Aim aim : aims) { Confirm(aim, enoughRounds, 1); }
         AddRounds(Alive(), trustedRounds);
         for (const Aim aim : aims) { Confirm(aim, enoughRounds, 1); }
-        // Here time does not count: the figure of a single round says nothing.
+        // Without a time limit: the figure of a single round is worthless.
         for (const Aim aim : aims) { Confirm(aim, trustedRounds, 1e9); }
         return Finish();
     }
@@ -83,7 +83,7 @@ private:
         heapTimes.push_back(meter.Time(std::nullopt).OrFail("the replay on the heap failed"));
     }
 
-    // Tries what was not tried yet, one round each.
+    // Tries those that were not tried yet, one round each.
     void Look(const std::vector<PoolSettings>& settings) {
         std::vector<std::size_t> added;
         for (const PoolSettings& each : settings) {
@@ -100,7 +100,7 @@ private:
         Time(added);
     }
 
-    // A round for each of these.
+    // Measures one round for each of these.
     void Time(const std::vector<std::size_t>& indices) {
         for (std::size_t i = 0; i < indices.size(); i += batchSize) {
             const std::size_t end = std::min(i + batchSize, indices.size());
@@ -126,7 +126,7 @@ private:
         }
     }
 
-    // Steps to the best neighbour as long as that is better.
+    // Steps to the best neighbour as long as it is better.
     void Walk(Aim aim) {
         auto center = Confirm(aim, trustedRounds, walkingShare);
         while (center.has_value() && HasTime(walkingShare)) {
@@ -139,8 +139,8 @@ private:
         }
     }
 
-    // The leader, once it leads with that many rounds or that share of the time is out. None if all
-    // were given up.
+    // Adds rounds until the leader has that many, or that share of the time has passed. Returns the
+    // leader; none if all were given up.
     std::optional<std::size_t> Confirm(Aim aim, unsigned int rounds, double share) {
         std::vector<std::size_t> leader = Best(aim, 1);
         while (!leader.empty() && NumRounds(leader.front()) < rounds && HasTime(share)) {
@@ -150,7 +150,7 @@ private:
         return leader.empty() ? std::nullopt : std::optional(leader.front());
     }
 
-    // Brings these to that many rounds, as far as there is time.
+    // Adds rounds until these have that many, or time runs out.
     void AddRounds(const std::vector<std::size_t>& indices, unsigned int rounds) {
         for (unsigned int round = 0; round < rounds; ++round) {
             std::vector<std::size_t> batch;
@@ -172,7 +172,7 @@ private:
         return alive;
     }
 
-    // The best of those that are left, the very best first.
+    // The best of those that were not given up, the best first.
     std::vector<std::size_t> Best(Aim aim, std::size_t number) const {
         std::vector<std::size_t> best = Alive();
         std::sort(best.begin(), best.end(), [&](std::size_t a, std::size_t b) {
@@ -197,7 +197,7 @@ private:
                 static_cast<unsigned int>(ratios.size())};
     }
 
-    // The heap's spread is that of its times beside one another, as that of the settings is.
+    // The spread of the heap is that of the ratios of successive times, like that of the settings.
     Figures FiguresOfHeap() const {
         std::vector<double> ratios = {1};
         for (std::size_t i = 2; i < heapTimes.size(); ++i) {
@@ -231,8 +231,8 @@ private:
 
 }  // namespace
 
-// At 10 to 30 nanoseconds an event these are 30 to 100 replays, which do for a coarse look. Fewer
-// steps would make more replays of what may be another program: its peak tends to come late.
+// At 10 to 30 nanoseconds per event this allows 30 to 100 replays, enough for a coarse look. With
+// fewer steps there would be more replays, but of a less typical part: the peak tends to come late.
 std::size_t MaxSteps(double seconds) {
     constexpr double perSecond = 1000000;
     constexpr double least = 4000000;

@@ -1,6 +1,6 @@
-// The values, each from small to large. The sizes of buckets keep a block of the heap with a bucket
-// and its header just below a power of two. A data alignment below 4 would be slower, and few
-// programs could use such blocks.
+// The values, in ascending order. With these bucket sizes the heap block of a bucket, with its
+// header, is just below a power of two. A data alignment below 4 would be slower, and few programs
+// could use such blocks.
 
 #include "advise/Space.hpp"
 
@@ -33,7 +33,8 @@ bool Fits(const PoolSettings& settings) {
     return !OBR::MemPool::PoolSizes(settings).IsMaxAboveRoom();
 }
 
-// Makes the bucket that was just changed and the largest record fit each other, if values can.
+// One of bucket size and maximum record size was just changed: makes the other one fit, if a value
+// does.
 bool Repair(PoolSettings& settings, bool bucketWasChanged) {
     if (Fits(settings)) { return true; }
     if (bucketWasChanged) {
@@ -50,7 +51,7 @@ bool Repair(PoolSettings& settings, bool bucketWasChanged) {
     return true;
 }
 
-// By the environment and by HeapSettings.
+// Whether both the environment and HeapSettings accept the settings.
 bool CanBeSet(const PoolSettings& settings) {
     const OBR::MemPool::PoolSizes sizes(settings);
     return !sizes.IsMaxAboveRoom() && !sizes.IsMinAboveMax() && OBR::MemPool::CanStartUp(settings);

@@ -9,14 +9,15 @@
 
 namespace Advise {
 
-// In how many of the settings the two differ.
+// The number of settings in which the two differ.
 unsigned int NumDifferences(const Replay::PoolSettings& a, const Replay::PoolSettings& b);
 
-// What to look at first: the defaults, then a coarse grid around them, the most telling first.
+// What to try first: the defaults, then a coarse grid around them, the most important first.
 std::vector<Replay::PoolSettings> CoarseGrid();
 
-// One setting a step up or down. Where a bucket would not take the largest record, the other one of
-// the two goes along. Both ways of the environment and of HeapSettings take all of these.
+// The settings with one value a step up or down. If the largest record would no longer fit into a
+// bucket, the other one of these two values changes too. Both the environment and HeapSettings
+// accept all results.
 std::vector<Replay::PoolSettings> Neighbours(const Replay::PoolSettings& center);
 
 }  // namespace Advise

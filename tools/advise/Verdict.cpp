@@ -14,17 +14,16 @@ namespace Advise {
 
 namespace {
 
-// What the bytes must differ by to count. They are not timed, and stray by little but what the heap
-// splits off a block.
+// The smallest difference in bytes that counts. Bytes vary little from run to run.
 constexpr double leastBytes = 0.01;
-// What the time of the whole program must differ by to be noticed.
+// The smallest difference in the time of the whole program that is noticed.
 constexpr double leastTime = 0.01;
-// Fewer events make no program faster or smaller.
+// With fewer events there is nothing to gain.
 constexpr std::uint64_t leastEvents = 1000;
 
 using Index = std::optional<std::size_t>;
 
-// The first of those that pass with the least key.
+// The first one with the smallest key among those that pass.
 template <typename Key>
 Index Least(const std::vector<Measured>& settings,
             const std::function<bool(const Figures&)>& passes, const Key& key) {
@@ -40,7 +39,7 @@ std::string Percent(double share) {
     return fmt::format("{:.{}f} %", 100 * share, share < 0.1 ? 1 : 0);
 }
 
-// Judges settings by what they do to one program.
+// Judges settings by their effect on one program.
 class Judging {
 public:
     Judging(const Findings& measured, const Program& whole) : findings(measured), program(whole) {}
@@ -87,12 +86,12 @@ private:
 
     bool HasFewEvents() const { return program.numEvents < leastEvents; }
 
-    // By how much less time the program would take, as a share of it.
+    // The share of the program's time that it would save.
     double Saved(const Figures& figures) const {
         return program.allocationShare.value_or(1) * (1 - TimeRatio(figures));
     }
 
-    // Whether the difference is more than the spread of the runs of either.
+    // Whether the difference is greater than the spread of either.
     bool TimeDiffers(const Figures& figures) const {
         const double spread = std::max(figures.nsSpread, findings.heap.nsSpread);
         return std::abs(figures.nsPerEvent - findings.heap.nsPerEvent) > spread;
@@ -111,8 +110,8 @@ private:
         return ratio > 1 + leastBytes ? Effect::Price : Effect::None;
     }
 
-    // The one with the least cost at both, or one that is as good, within the spread of its runs,
-    // with fewer changes.
+    // The settings with the least cost in time and bytes, or ones with fewer changes that are as
+    // good within the spread.
     Index Simplest(const std::function<bool(const Figures&)>& passes) const {
         const auto cost = [&](const Figures& figures) {
             return Cost(figures, findings.heap, Aim::Both);

@@ -1,5 +1,5 @@
-// What follows from the figures: which settings are best at what, whether the program would gain
-// from one of them, at which price, and why. Whoever prints a verdict decides nothing.
+// The verdict: which settings are best at what, whether the program would gain from one of them, at
+// which price, and why. Code that prints a verdict decides nothing.
 
 #ifndef OBR_TOOLS_ADVISE_VERDICT_HPP
 #define OBR_TOOLS_ADVISE_VERDICT_HPP
@@ -18,23 +18,23 @@ namespace Advise {
 
 // What the trace says about the program.
 struct Program {
-    std::uint64_t numEvents = 0;            // Replayed ones,
-    std::uint64_t numLeftOut = 0;           // and those after them, which were too many.
+    std::uint64_t numEvents = 0;            // Replayed events.
+    std::uint64_t numLeftOut = 0;           // Later events, above the limit.
     std::optional<double> allocationShare;  // Of its processor time, an estimate.
 };
 
-// What pools do to the time or the bytes of the program. A difference within the spread of the
-// runs, or one that the program would not notice, is none.
+// The effect of pools on the time or the bytes of the program. None if the difference is within the
+// spread, or so small that it would not be noticed.
 enum class Effect : std::uint8_t { None, Gain, Price };
 
 // Indices into the settings of the findings.
 struct Verdict {
     std::optional<std::size_t> fastest;
     std::optional<std::size_t> smallest;
-    std::optional<std::size_t> best;  // Of those at no price.
+    std::optional<std::size_t> best;  // Of those without a price.
 
-    // What to use, if pools help: the best, if it gains anything, or else what gains more than it
-    // costs.
+    // The settings to use, if pools help: the best, if they gain anything, else settings that gain
+    // more than they cost.
     std::optional<std::size_t> advised;
     Effect time = Effect::None;  // Of the advised settings.
     Effect bytes = Effect::None;
@@ -49,11 +49,11 @@ struct Verdict {
 
 Verdict Judge(const Findings& findings, const Program& program);
 
-// The share in the text, between 0 and 1; none if the text is something else.
+// The share in the text, between 0 and 1; none if the text is not such a number.
 std::optional<double> ShareOf(const std::string& text);
 
-// The settings to paste: variables of the environment, in the order in which they are read, and
-// lines of C++, none for a layer that needs none.
+// The settings to paste: the environment variables, in the order in which they are read, and lines
+// of C++, empty for a layer that needs none.
 std::vector<std::pair<std::string, std::string>> EnvironmentOf(
     const Replay::PoolSettings& settings);
 std::vector<std::string> CodeOf(const Replay::PoolSettings& settings, Replay::Layer layer);
