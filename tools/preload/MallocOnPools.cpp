@@ -20,6 +20,7 @@
 
 #include <dlfcn.h>
 #include <pthread.h>
+#include <sys/mman.h>
 #include <sys/single_threaded.h>
 
 #include <algorithm>
@@ -46,6 +47,10 @@ void* __libc_calloc(std::size_t count, std::size_t size);
 void* __libc_realloc(void* block, std::size_t size);
 void* __libc_memalign(std::size_t alignment, std::size_t size);
 void __libc_free(void* block);
+
+// Where this library begins and where its code ends.
+extern char __ehdr_start __attribute__((visibility("hidden")));
+extern char etext __attribute__((visibility("hidden")));
 }
 // NOLINTEND(bugprone-reserved-identifier)
 
@@ -64,20 +69,13 @@ std::size_t usualLimit = 0;  // What it is otherwise.
 
 std::recursive_mutex mutex;  // A report, and an exception, give blocks back on their way.
 
-class Lock {
-public:
-    Lock() : isHeld(__libc_single_threaded == 0) {
-        if (isHeld) { mutex.lock(); }
-    }
-    Lock(const Lock&) = delete;
-    Lock& operator=(const Lock&) = delete;
-    ~Lock() {
-        if (isHeld) { mutex.unlock(); }
-    }
-
-private:
-    const bool isHeld;  // The first thread may come or go meanwhile.
-};
+// Does it while no other thread is in the heap.
+template <typename Action>
+auto Alone(const Action& action) {
+    if (__libc_single_threaded != 0) { return action(); }
+    const std::lock_guard<std::recursive_mutex> lock(mutex);
+    return action();
+}
 
 void* Fail(int error) {
     errno = error;
@@ -86,27 +84,19 @@ void* Fail(int error) {
 
 // A block of the heap; null, with the reason in errno, if there is no memory.
 void* Take(std::size_t size, std::size_t alignment) {
-    const Lock lock;
-    try {
-        return heap->Allocate(size, alignment);
-    } catch (const std::bad_alloc&) {
-        limit = usualLimit;
-        return Fail(ENOMEM);
-    }
-}
-
-// False for what is no block of the heap.
-bool GiveBack(void* block) {
-    if (heap == nullptr) { return false; }
-    const Lock lock;
-    return heap->Free(block);
+    return Alone([&]() -> void* {
+        try {
+            return heap->Allocate(size, alignment);
+        } catch (const std::bad_alloc&) {
+            limit = usualLimit;
+            return Fail(ENOMEM);
+        }
+    });
 }
 
 // 0 for what is no block of the heap.
 std::size_t Usable(void* block) {
-    if (heap == nullptr) { return 0; }
-    const Lock lock;
-    return heap->UsableSize(block);
+    return heap == nullptr ? 0 : Alone([&] { return heap->UsableSize(block); });
 }
 
 void* Aligned(std::size_t alignment, std::size_t size) {
@@ -129,10 +119,18 @@ void FindUsableSize() {
         reinterpret_cast<UsableSizeOfLibrary>(dlsym(RTLD_NEXT, "malloc_usable_size"));
 }
 
+// Forgets which pages of this library are in use, as the start-up of the C++ library uses most of
+// them and nothing else does. Those that are used again come back.
+void DropPages() {
+    char* const end = &etext - reinterpret_cast<std::uintptr_t>(&etext) % 4096;
+    madvise(&__ehdr_start, static_cast<std::size_t>(end - &__ehdr_start), MADV_DONTNEED);
+}
+
 // After the start-up of the library, which reads the environment.
 __attribute__((constructor)) void StartUp() {
     using namespace OBR::MemPool;  // NOLINT(google-build-using-namespace)
     FindUsableSize();
+    DropPages();
     if (std::getenv("NUV_OBR_MEMPOOL_ON") != nullptr && !NUV_OBR_MEMPOOL_ON()) { return; }
     NUV_OBR_MEMPOOL_TRACE(false);  // Writing a line may allocate, which would be traced again.
     try {
@@ -153,7 +151,7 @@ __attribute__((constructor)) void StartUp() {
 __attribute__((destructor)) void Report() {
     const char* const name = std::getenv("MALLOC_ON_POOLS_REPORT");
     if (name == nullptr || heap == nullptr) { return; }
-    const Lock lock;
+    const std::lock_guard<std::recursive_mutex> lock(mutex);
     limit = 0;
     std::ofstream file(name, std::ios::app);
     std::streambuf* const output = std::cout.rdbuf(file.rdbuf());
@@ -190,7 +188,8 @@ void* malloc(std::size_t size) noexcept {
 }
 
 void free(void* block) noexcept {
-    if (block != nullptr && !GiveBack(block)) { __libc_free(block); }
+    const bool isOfHeap = heap != nullptr && Alone([block] { return heap->Free(block); });
+    if (!isOfHeap) { __libc_free(block); }
 }
 
 void* calloc(std::size_t count, std::size_t size) noexcept {
