@@ -10,7 +10,7 @@ scripts/install-packages.sh build tools coverage
 # Remove the counts of an earlier build.
 if [ -d build/coverage ]; then find build/coverage -name '*.gcda' -delete; fi
 options=(-DOBR_MEMPOOL_TESTS=ON -DOBR_MEMPOOL_TOOLS=ON)
-build coverage "${coreTests[@]}" mempool Faulty FaultySanitized
+build coverage "${coreTests[@]}" MemPoolChecked mempool Faulty FaultySanitized
 step "Test preset coverage"
 ctest --preset coverage --tests-regex "$coreNames|^Checked\$" --quiet --output-log build/coverage/tests.log || {
     cat build/coverage/tests.log
