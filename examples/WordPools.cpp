@@ -189,7 +189,7 @@ void PrintPools(const std::deque<Text>& texts) {
             return &candidate.Pool() == mgr;
         });
         std::cout << "pool " << mgr->GetName() << ": " << text->NumBlocks() << " blocks, "
-                  << text->NumBytes() << " bytes asked for, "
+                  << text->NumBytes() << " bytes requested, "
                   << (mgr->IsEnabled() ? "enabled" : "disabled") << '\n';
     }
     std::cout << '\n';

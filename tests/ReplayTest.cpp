@@ -1,6 +1,6 @@
-// `mempool replay` as its users run it: traces in files, the report on standard output, all of it
-// against expected/replay.txt. Times, and what the allocator makes of a request, are no fixed
-// figures: they are held against bounds. OBR_MEMPOOL_APPROVE makes the test write the text anew.
+// `mempool replay` as its users run it. Compares the whole report with expected/replay.txt, which
+// OBR_MEMPOOL_APPROVE rewrites. Times, and the allocator's rounding, vary and are compared with
+// bounds.
 
 #include <sys/wait.h>
 #include <unistd.h>
@@ -141,7 +141,7 @@ TEST(Replay, RefusesSettingsThatMakeNoPool) {
                                 "--layer mgr --alignment 3 --bucket-size 1002", "--bucket-size 3",
                                 "--min-record 1001", "--max-record 3"}) {
         EXPECT_THAT(Tool(options + (" " + path), 1),
-                    HasSubstr("mempool: these settings make no pool: "));
+                    HasSubstr("mempool: no pool can have these settings: "));
     }
     EXPECT_THAT(Tool(path, 1, {{"NUV_OBR_MEMPOOL_BUCKET_SIZE", "20"}}),
                 HasSubstr("a maximum record size of 1000 needs a bucket size of at least 1004, "

@@ -124,7 +124,7 @@ static_assert(__BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__,
 struct ExtRec {
     ExtRec* next;          // Next in the pool's list, null at the end.
     ExtRec* prev;          // Previous one, null at the front.
-    std::uint32_t length;  // Bytes asked for, not rounded. With 0 no test recognises the record.
+    std::uint32_t length;  // Requested bytes, not rounded. With 0 no test recognises the record.
     RecHdr hdr;            // In the place of a record's header: the 4 bytes before the data.
 
     // Makes a heap record that is on no list.

@@ -1,4 +1,4 @@
-// What follows from figures.
+// The verdict on given figures.
 
 #include "advise/Verdict.hpp"
 
@@ -14,7 +14,7 @@ using testing::StartsWith;
 
 namespace {
 
-// The heap takes 10 ns and 1000 bytes, and strays by 1 ns.
+// The heap takes 10 ns and 1000 bytes, with a spread of 1 ns.
 struct Setting {
     double ns;
     double bytes;
@@ -104,19 +104,20 @@ TEST(Verdict, CountsWhatTheProgramWouldNotice) {
     expect({12, 800}, 0.2, "smaller", "Pools would help, at a price: they take 1.20");
     expect({9.5, 800}, 0.2, "smaller", "Pools would help: they take 0.95 of the heap's time (the");
     expect({9.5, 1000}, 0.2, "none", "Pools would not help: no settings gain more than the spread");
-    expect({5, 500}, 0.5, "none", "The program would not notice: 999 events are few.", 999);
+    expect({5, 500}, 0.5, "none", "The program would not notice: it has only 999 events.", 999);
 }
 
 TEST(Verdict, SaysWhatTheFiguresMeanForTheProgram) {
     EXPECT_EQ(Judge({{6, 1000}}, {1000, 0, 0.12}).sentences.at(1),
               "Allocation calls take about 12 % of the program's time: with pools the program "
               "would take about 95 %.");
-    EXPECT_EQ(Judge({}, {1000, 500, 0.05}).sentences,
-              (std::vector<std::string>{
-                  "Pools would not help: no settings gain more than the spread of the runs and "
-                  "more than they cost.",
-                  "The first 1000 of 1500 events were judged; more --seconds take in more.",
-                  "Allocation calls take about 5.0 % of the program's time."}));
+    EXPECT_EQ(
+        Judge({}, {1000, 500, 0.05}).sentences,
+        (std::vector<std::string>{
+            "Pools would not help: no settings gain more than the spread of the runs and "
+            "more than they cost.",
+            "Only the first 1000 of 1500 events were replayed; a larger --seconds covers more.",
+            "Allocation calls take about 5.0 % of the program's time."}));
     EXPECT_EQ(Advise::ShareOf("0.125"), std::optional(0.125));
     for (const char* text : {"", "x", "-0.1", "1.1", "0.5 ", "nan"}) {
         EXPECT_EQ(Advise::ShareOf(text), std::nullopt) << text;

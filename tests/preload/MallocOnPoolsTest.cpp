@@ -1,4 +1,4 @@
-// The malloc family as a program sees it that runs on the preloaded pools.
+// The malloc family in a program that runs on the preloaded pools.
 
 #include <dlfcn.h>
 #include <malloc.h>
@@ -23,7 +23,7 @@ extern "C" void* __libc_malloc(std::size_t size);
 
 namespace {
 
-// What a compiler knows of malloc would do away with half of this.
+// A compiler that knows malloc would optimise half of this away.
 void* (*volatile const Malloc)(std::size_t) = malloc;
 void* (*volatile const Calloc)(std::size_t, std::size_t) = calloc;
 void* (*volatile const Realloc)(void*, std::size_t) = realloc;
@@ -37,7 +37,7 @@ bool IsAligned(const void* block, std::size_t alignment) {
     return reinterpret_cast<std::uintptr_t>(block) % alignment == 0;
 }
 
-// Blocks change their sizes at random, in the pool and beyond it. False if one lost a byte.
+// Blocks change their sizes at random, in the pool and outside of it. False if one lost a byte.
 bool Works(unsigned int seed) {
     std::mt19937 random(seed);
     struct Block {
@@ -61,7 +61,7 @@ bool Works(unsigned int seed) {
     return works;
 }
 
-// Runs `action` in a child; what it returns is told.
+// Runs `action` in a child and returns its result.
 template <typename Action>
 bool InChild(Action action) {
     const pid_t child = fork();
@@ -86,7 +86,7 @@ TEST(MallocOnPoolsTest, ServesEverySize) {
     EXPECT_EQ(Realloc(none, 0), nullptr);
     free(nullptr);
     EXPECT_EQ(malloc_usable_size(nullptr), 0U);
-    // Up to the largest record of 1000 bytes. What stands ahead of a block tells whose it is.
+    // Up to the largest record of 1000 bytes. The bytes before a block show where it came from.
     void* const inPool = Malloc(984);
     EXPECT_NE(static_cast<std::uint32_t*>(inPool)[-1], 0U);
     void* const beyond = Malloc(985);

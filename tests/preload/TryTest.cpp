@@ -74,7 +74,7 @@ TEST(Try, EndsAsTheProgramDoes) {
     Try("sh -c 'kill $$'; exit $?", 128 + 15);
     Try("/nowhere/program", 127);
     Try("--bucket-size 100 true", 125);
-    EXPECT_THAT(Errors(), HasSubstr("mempool: these settings make no pool: "));
+    EXPECT_THAT(Errors(), HasSubstr("mempool: no pool can have these settings: "));
     Try("--stdin /nowhere true", 125);
 }
 

@@ -32,7 +32,8 @@ TEST(CommandLine, IsHelpedWith) {
                           "  -o, --output FILE           The trace to write"));
     EXPECT_THAT(
         Shell::Output(mempool + "help run"),
-        HasSubstr("\n  --seconds N                 How long to search, about [default: 15]\n"));
+        HasSubstr(
+            "\n  --seconds N                 Approximate time of the search [default: 15]\n"));
     EXPECT_EQ(Shell::Output(mempool + "-V"), Shell::Output(mempool + "--version"));
     EXPECT_THAT(Shell::Output(mempool + "-V"), testing::ContainsRegex("^mempool [0-9.]+\n$"));
 }

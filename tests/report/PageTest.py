@@ -126,7 +126,7 @@ class PageTest(unittest.TestCase):
         self.assertGreater(more, 3)
         self.assertLess(abs(peak["one_pool"] / peak["heap_chunks"] - 1), 0.03)
         self.assertEqual([text.replace("\u00a0", " ") for text in self.texts("#verdict")], [
-            f"At the peak the program has asked for {shown_bytes(peak['asked'])} in "
+            f"At the peak the program has requested {shown_bytes(peak['asked'])} in "
             f"{peak['blocks']:,} blocks: {share[0]}, {share[1]} and {share[2]}. A pool for each group "
             f"would hold {shown_bytes(peak['pools'])} for them, {more:.0f} % more than the "
             f"heap’s {shown_bytes(peak['heap_chunks'])}; a single pool for all "

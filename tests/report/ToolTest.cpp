@@ -1,5 +1,6 @@
-// `mempool report` as its users run it. A small made trace, whose figures can be worked out by
-// hand, against expected/report.txt and expected/report.json; OBR_MEMPOOL_APPROVE writes both anew.
+// `mempool report` as its users run it. Compares the report on a small trace, whose figures can be
+// worked out by hand, with expected/report.txt and expected/report.json, which OBR_MEMPOOL_APPROVE
+// rewrites.
 
 #include <sys/wait.h>
 #include <unistd.h>
@@ -142,7 +143,7 @@ TEST(Report, TellsWhatIsWrongWithATrace) {
               "mempool: standard input: not a trace\n");
     EXPECT_EQ(Tool("/nowhere", 1), "mempool: /nowhere: No such file or directory\n");
     EXPECT_THAT(Tool("--bucket-size 1003 other", 1),
-                HasSubstr("mempool: these settings make no pool: "));
+                HasSubstr("mempool: no pool can have these settings: "));
     std::ofstream(Path("small")) << trace;
     const std::string cutCommand =
         "$(gzip <small >whole.gz; head -c 200 whole.gz >cut.gz; echo cut.gz)";

@@ -135,7 +135,8 @@ private:
             verdict.advised.has_value() ? Gain(verdict, Of(*verdict.advised)) : NoGain(verdict)};
         if (program.numLeftOut != 0) {
             sentences.push_back(
-                fmt::format("The first {} of {} events were judged; more --seconds take in more.",
+                fmt::format("Only the first {} of {} events were replayed; a larger --seconds "
+                            "covers more.",
                             program.numEvents, program.numEvents + program.numLeftOut));
         }
         if (!program.allocationShare.has_value()) {
@@ -170,7 +171,7 @@ private:
 
     std::string NoGain(const Verdict& verdict) const {
         if (HasFewEvents()) {
-            return fmt::format("The program would not notice: {} events are few.",
+            return fmt::format("The program would not notice: it has only {} events.",
                                program.numEvents);
         }
         const bool isAnyFaster = verdict.fastest.has_value() && TimeDiffers(Of(*verdict.fastest)) &&

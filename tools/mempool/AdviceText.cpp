@@ -22,7 +22,7 @@ using Advise::Aim;
 using Advise::Figures;
 using Advise::Measured;
 
-// How many of the best the short table has, beside those that are named.
+// The short table has this many of the best settings, and those that are named.
 constexpr std::size_t numShown = 8;
 
 std::string NamesOf(const Advice& advice, std::size_t index) {
@@ -68,7 +68,7 @@ void PrintGivenUp(std::ostream& out, const Advice& advice) {
     }
 }
 
-// A word for a shell.
+// A word, quoted for a shell.
 std::string Quoted(const std::string& word) {
     const char* const plain =
         "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789_-+=./:,@%";

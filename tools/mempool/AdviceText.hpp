@@ -1,4 +1,4 @@
-// An advice as text.
+// Prints advice as text.
 
 #ifndef OBR_TOOLS_MEMPOOL_ADVICETEXT_HPP
 #define OBR_TOOLS_MEMPOOL_ADVICETEXT_HPP
@@ -11,11 +11,11 @@
 
 namespace Tool {
 
-// A line for the heap and a line for each of the settings, the best first: all, or those that
-// matter.
+// Prints a line for the heap and a line for each of the settings, the best first: all, or only
+// the best and those that are named.
 void PrintTable(std::ostream& out, const Advise::Advice& advice, bool all);
 
-// The verdict in words, and the lines to paste if pools would help.
+// Prints the verdict in words, and the lines to paste if pools would help.
 void PrintVerdict(std::ostream& out, const Advise::Advice& advice);
 
 // The command line of `mempool try` with these settings, for a shell.

@@ -24,27 +24,28 @@ constexpr const char* description =
     "Find out whether a program would gain from pools, and with which settings";
 
 constexpr const char* notes =
-    R"(A TRACE is what 'mempool replay' takes. It is replayed through pools with many settings, in turns
-with the heap, each time in a process of its own. 'mempool replay --help' says what counts.
+    R"(TRACE is as for 'mempool replay'. It is replayed on pools with many settings, in turns with the heap,
+each time in a new process. 'mempool replay --help' says what is measured.
 
-ns per event  The median of some replays. A time of pools is taken beside those of the heap right
-              before and after it.
+ns per event  The median of several replays. Each replay of pools is compared with the replays of the
+              heap right before and after it.
 spread        Between the lower and the upper quartile of the replays. A difference within it is
               neither a gain nor a price.
 of heap       The figure divided by that of the heap.
-events        Of a trace of more than --seconds times 1,000,000 events, at least 4,000,000, only the
-              first ones are replayed. The verdict says so then, and --json how many are left out.
-best          Of the settings that are neither slower nor larger than the heap the one with the least
-              time x bytes; of those as good within its spread that with the fewest changes.
-at a price    There is no such gain, but one that is greater than what it costs: time x bytes is less
-              than that of the heap.
-advised       What the verdict is about, with the lines to paste: the best, if it gains anything. At
-              a price it is chosen like the best, among those that gain more than they cost.
-the program   'mempool record' estimates which share of its time its allocation calls take. What
-              changes less than 1 % of the program's time is neither a gain nor a price.
+events        If a trace has more than --seconds times 1,000,000 events, and more than 4,000,000,
+              only the first ones are replayed. The verdict says so, and --json has the number of the
+              others.
+best          Of the settings that are neither slower nor larger than the heap, those with the least
+              time x bytes; among settings as good within the spread, those with the fewest changes.
+at a price    No settings gain without a price, but some gain more than they cost: their time x bytes
+              is less than that of the heap.
+advised       The settings that the verdict is about, with lines to paste: the best, if they gain
+              anything; else settings at a price, chosen in the same way.
+the program   'mempool record' estimates the share of the program's time that allocation calls take.
+              A change of less than 1 % of the program's time is neither a gain nor a price.
 
-No block is written to: that blocks which lie closer together can be faster to use is not measured.
-docs/advisor.md describes the keys of --json.
+A replay does not write to blocks, so it does not show that blocks which lie closer together can be
+faster to use. docs/advisor.md describes the keys of --json.
 )";
 
 struct Options {

@@ -1,4 +1,4 @@
-// mempool check: runs a program with pools on, over the checked library, and under a checker.
+// mempool check: runs a program with pools enabled, with the checked library, and under a checker.
 
 #include <cstdlib>
 #include <filesystem>
@@ -25,26 +25,26 @@ namespace {
 
 namespace fs = std::filesystem;
 
-constexpr const char* description = "Run a program on pools that report its faults";
+constexpr const char* description = "Run a program with pools that report its memory errors";
 
 constexpr const char* notes =
-    R"(The program runs unchanged, with pools enabled and with the checked library in place of the ordinary
-one. There each block is a heap block of its own, so that a checker sees a use after Free or Clear,
-an overrun and an underrun. The library itself reports on standard error each release that it
+    R"(The program runs unchanged, with pools enabled and the checked library instead of the ordinary one.
+In that library each block is a heap block of its own, so that a checker sees a use after Free or
+Clear, an overrun and an underrun. The library itself reports on standard error each release that it
 refuses, each header that an underrun has damaged, and the blocks that are still in use when their
 pool or the process ends.
 
 asan          AddressSanitizer, for a program that is built with -fsanitize=address.
 valgrind      Valgrind's memcheck, for any other program.
-nothing       The library alone: to run the program under another tool, or under gdb.
+nothing       Only the library, for instance to run the program under gdb.
 
 The default is asan for a program that is built with it, else valgrind if it is installed.
 
-Sizes are not rounded, so that one-byte overruns are caught. For a program that relies on the
-rounding, --alignment brings it back.
+Sizes are not rounded, so that one-byte overruns are caught. If the program relies on the rounding,
+use --alignment.
 
-ASAN_OPTIONS            Kept, as VALGRIND_OPTS is. The defaults here are red zones of 128 bytes and
-                        stacks of 30 callers.
+ASAN_OPTIONS            This and VALGRIND_OPTS are kept. By default there are red zones of 128 bytes
+                        and, under Valgrind, stacks of 30 frames.
 MEMPOOL_ABORT           1: the library aborts at a release that it refuses, so that a debugger
                         stops there.
 MEMPOOL_CHECK_STATUS    The exit status, from 1 to 255, for faults that only the library reports, 99
@@ -52,7 +52,7 @@ MEMPOOL_CHECK_STATUS    The exit status, from 1 to 255, for faults that only the
 
 Exit status: the checker's if it found a fault, 1 from AddressSanitizer and 99 from Valgrind; else
 the program's. If that is 0, by exit or at the end of main, but the library reported a fault, it is
-99. Each process that the program starts has its own. 125 if nothing was run, 126 if the program
+99. This applies to each process that the program starts. 125 if nothing was run, 126 if the program
 cannot be run or checked, 127 if it is not found.
 )";
 
@@ -69,7 +69,7 @@ void Say(const std::string& what) {
     std::cerr << "mempool: " << what << '\n';
 }
 
-// The checked library: beside the installed tool, or where the tool was built.
+// The checked library, as installed or as built.
 fs::path CheckedLibrary() {
     const fs::path here = fs::read_symlink("/proc/self/exe").parent_path();
     std::istringstream places(CHECKED_PLACES);
@@ -99,7 +99,7 @@ With Choose(const Options& options, const HostFile& host, const std::string& pro
     return with;
 }
 
-// Puts a value before those that a variable has.
+// Puts a value before the present value of a variable.
 void Prepend(const char* variable, const std::string& value, char separator = ':') {
     const char* const present = std::getenv(variable);
     const bool isEmpty = present == nullptr || *present == '\0';
@@ -111,8 +111,8 @@ void SetEnvironment(const Options& options) {
     setenv("NUV_OBR_MEMPOOL_ON", "1", 1);
     setenv("MEMPOOL_CHECK_ALIGNMENT", std::to_string(options.alignment).c_str(), 1);
     setenv("MEMPOOL_CHECK_STATUS", "99", 0);
-    // A program's own path to its libraries comes before LD_LIBRARY_PATH; only a preload overrides
-    // it. By default AddressSanitizer insists on being the first library.
+    // A program's own RPATH can come before LD_LIBRARY_PATH; only a preload overrides it. By
+    // default AddressSanitizer refuses to run if it is not the first library.
     Prepend("LD_LIBRARY_PATH", library.parent_path());
     Prepend("LD_PRELOAD", library);
     Prepend("ASAN_OPTIONS", "redzone=128:verify_asan_link_order=0");

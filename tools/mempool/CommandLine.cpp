@@ -14,7 +14,7 @@ namespace Tool {
 
 namespace {
 
-// The help in the words of its reader, not of the parser.
+// Formats the help for users. CLI11's own format shows details of the parser.
 class Help final : public CLI::Formatter {
     std::string make_option_usage(const CLI::Option* option) const override {
         return option->get_name(true, false) + make_option_opts(option);
@@ -38,8 +38,8 @@ class Help final : public CLI::Formatter {
     }
 };
 
-// How many letters must be left out, put in, replaced or exchanged with the next to make one of the
-// other.
+// The number of letters to delete, insert, replace or swap with the next one to turn one word into
+// the other.
 std::size_t Distance(const std::string& one, const std::string& other) {
     std::vector<std::size_t> beforeLast;
     std::vector<std::size_t> last;
@@ -77,15 +77,15 @@ std::vector<std::string> OptionNames(const CLI::App& app) {
     return names;
 }
 
-// Why a word of the command line is not known, "" if it is no option.
+// The error for an unknown option; "" if the word is not an option.
 std::string UnknownOption(const CLI::App& app, const std::string& word) {
     if (word.size() < 2 || word[0] != '-') { return ""; }
     const std::string name = word.substr(0, word.find('='));
     return name + ": unknown option" + Suggestion(name, OptionNames(app));
 }
 
-// If the words begin with a subcommand that runs a program, moves what belongs to that program from
-// their end to Program::command.
+// If the words begin with a subcommand that runs a program, moves the program and its arguments
+// from the end of the words to Program::command.
 void CutCommand(Program& program, std::vector<std::string>& words) {
     const auto runner = std::find_if(
         program.runners.begin(), program.runners.end(),
@@ -110,7 +110,7 @@ void CutCommand(Program& program, std::vector<std::string>& words) {
 
 // What is wrong with the command line.
 std::string Problem(const CLI::App& app, const CLI::ParseError& error) {
-    // The parser looks for what is missing before it looks at what is too much.
+    // The parser reports missing arguments before unexpected ones.
     for (const std::string& word : app.remaining()) {
         std::string problem = UnknownOption(app, word);
         if (!problem.empty()) { return problem; }
@@ -150,7 +150,7 @@ bool ReadCommandLine(Program& program, std::vector<std::string> words, int& stat
         problem = first + ": unknown subcommand" + Suggestion(first, names);
     } else {
         try {
-            std::reverse(words.begin(), words.end());  // As the parser takes them.
+            std::reverse(words.begin(), words.end());  // The parser takes them in reverse order.
             app.parse(std::move(words));
             return true;
         } catch (const CLI::Success& success) {
@@ -165,7 +165,7 @@ bool ReadCommandLine(Program& program, std::vector<std::string> words, int& stat
 }
 
 void AddCommand(Program& program, CLI::App& subcommand) {
-    // For the help alone: its words never get there.
+    // Only for the help: CutCommand has removed these words.
     subcommand.add_option("PROGRAM", program.command, "The program to run and its arguments")
         ->type_name("[ARGS...]")
         ->expected(0, 1);

@@ -1,5 +1,5 @@
-// Searches the whole file for a few texts. That also finds what a stripped program contains, and
-// what it loads by name while it runs.
+// Searches the whole file for a few texts. This also works for a stripped program, and for
+// libraries that it loads by name while it runs.
 
 #include "mempool/HostFile.hpp"
 

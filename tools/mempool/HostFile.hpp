@@ -1,4 +1,4 @@
-// What a program's file says about the program before it runs.
+// Facts about a program from its file, before it runs.
 
 #ifndef OBR_TOOLS_MEMPOOL_HOSTFILE_HPP
 #define OBR_TOOLS_MEMPOOL_HOSTFILE_HPP
@@ -14,7 +14,7 @@ struct HostFile {
     bool holdsLibrary = false;  // Contains the archive.
 };
 
-// A file that cannot be read is a Failure.
+// Throws a Failure if the file cannot be read.
 HostFile ReadHostFile(const std::string& path);
 
 }  // namespace Tool

@@ -1,4 +1,4 @@
-// Prints what several subcommands have in their reports.
+// Output that several subcommands share.
 
 #ifndef OBR_TOOLS_MEMPOOL_PRINT_HPP
 #define OBR_TOOLS_MEMPOOL_PRINT_HPP
@@ -10,10 +10,11 @@
 
 namespace Tool {
 
-// How many lines of the trace were ignored, why, and where the first of them are.
+// Prints how many lines of the trace were ignored, why, and where the first of them are.
 void PrintBadLines(std::ostream& out, const std::string& trace, const Trace::BadLines& bad);
 
-// Warns on standard error if the trace breaks off. Returns the exit status: that of a failure then.
+// Warns on standard error if the trace is incomplete. Returns the exit status, which is then that
+// of a failure.
 int WarnOfBrokenTrace(const Trace::StepReader& reader);
 
 }  // namespace Tool

@@ -1,5 +1,5 @@
-// The program `mempool`: a subcommand adds itself to the command line, and leaves here what is to
-// be done once that is read.
+// The program `mempool`. Each subcommand adds itself to the command line and, if it is chosen, sets
+// the job to do.
 
 #ifndef OBR_TOOLS_MEMPOOL_PROGRAM_HPP
 #define OBR_TOOLS_MEMPOOL_PROGRAM_HPP
@@ -15,8 +15,8 @@ namespace Tool {
 
 struct Program {
     CLI::App commandLine;
-    std::function<int()> job;    // Of the subcommand that was asked for; returns the exit status.
-    int failure = EXIT_FAILURE;  // The exit status of a failure of the subcommand itself.
+    std::function<int()> job;              // Of the chosen subcommand; returns the exit status.
+    int failure = EXIT_FAILURE;            // The exit status of a failure of the subcommand itself.
     std::vector<const CLI::App*> runners;  // The subcommands that run a program.
     std::vector<std::string> command;      // That program and its arguments.
 };

@@ -1,5 +1,5 @@
-// One line of a terminal that is written over and over, on standard error. Nothing is shown in a
-// file or a pipe.
+// A line of progress on standard error that replaces the previous one. Shows nothing if standard
+// error is not a terminal.
 
 #ifndef OBR_TOOLS_MEMPOOL_PROGRESS_HPP
 #define OBR_TOOLS_MEMPOOL_PROGRESS_HPP
@@ -14,7 +14,7 @@ namespace Tool {
 
 class Progress {
 public:
-    // Each text begins with what the work is about, such as the path of a trace.
+    // Each line begins with the subject of the work, such as the path of a trace.
     explicit Progress(std::string about) : subject(std::move(about)) {}
     Progress(const Progress&) = delete;
     Progress& operator=(const Progress&) = delete;

@@ -21,29 +21,29 @@ namespace {
 constexpr const char* description = "Run a program and write a trace of its allocations";
 
 constexpr const char* notes =
-    R"(The program runs unchanged, with a recorder loaded before its libraries. Its output, its
-standard streams and its exit status are its own; if a signal kills it, mempool dies by the same.
-Signals sent to mempool go on to the program. What the program becomes by exec is recorded too, what
-it starts is not. A trace that was cut short, by Ctrl-C or a crash of the program, is a whole one.
+    R"(The program runs unchanged, with a recorder that is loaded before its libraries. Its standard streams
+and its exit status do not change; if a signal kills it, mempool ends by the same signal. Signals sent
+to mempool are forwarded to the program. A program that replaces this one through exec is recorded
+too; child processes are not. The trace is complete even if Ctrl-C or a crash ends the program.
 
 Recorded are malloc, calloc, realloc (a release and an allocation), reallocarray, free, the aligned
 forms, and operator new and delete, which call them. An allocator that is linked into the program
-itself cannot be seen.
+itself is not recorded.
 
--o -          The trace goes to standard output, and what the program prints there to standard error.
---by caller   A group is a place that asks for memory: the first return address outside of the C and
-              C++ run-time libraries and of functions that pass memory on, with the function's name
-              if the file has symbols. Such a function is known by its exported symbol: it contains
+-o -          The trace goes to standard output, and the program's standard output to standard error.
+--by caller   A group is a call site: the first return address outside of the C and C++ run-time
+              libraries and of functions that only pass memory on, with the name of the function if
+              the file has symbols. A function passes memory on if its exported symbol contains
               malloc, calloc, realloc, memalign, strdup or strndup, ends in alloc, or belongs to
-              the C++ library. --skip names more of them, such as --skip 'new*'. Calls out of a
-              function that takes stack by a size of its own count as that function's.
---by module   The program's file and each of its shared libraries is a group.
---pools       Records the pools of libObrMemPool in place of the heap, on or off, Mgr::Clear
-              included. The program must use the shared library.
+              the C++ library. --skip names more such functions, for example --skip 'new*'. A
+              function whose stack frame varies in size (alloca) is shown instead of its callers.
+--by module   The program's file and each of its shared libraries are a group.
+--pools       Records the pools of libObrMemPool instead of the heap, whether they are on or off,
+              including Mgr::Clear. The program must use the shared library.
 
-Facts in the trace (mempool text prints them): program, by, cpu_seconds (without the recorder's own
-part), allocation_share (of that time, what the allocation calls take, from a sample), threads,
-foreign_frees (blocks freed by another thread than their own).
+Facts in the trace, which 'mempool text' prints: program, by, cpu_seconds (without the recorder's own
+part), allocation_share (the share of that time that allocation calls take, estimated from samples),
+threads, foreign_frees (blocks freed by another thread than the one that allocated them).
 
 Exit status: the program's own; 125 if recording fails, 126 if the program cannot be run or recorded
 (it is statically linked or runs with other rights), 127 if it is not found.
@@ -76,7 +76,7 @@ void AddRecordOptions(CLI::App& subcommand, Recorder::Order& order) {
                       })->first);
     subcommand
         .add_option("--skip", order.skipped,
-                    "Take no function whose symbol matches PATTERN for a caller; may be repeated")
+                    "Functions whose symbols match PATTERN are not callers; may be repeated")
         ->type_name("PATTERN")
         ->allow_extra_args(false)
         ->check([](const std::string& pattern) {
@@ -113,7 +113,7 @@ void AddRecord(Program& program) {
     order->tracePath = "mempool.trace";
     record
         .add_option("-o,--output", order->tracePath,
-                    "The trace to write, over what is there; - is standard output")
+                    "The trace to write, replacing the file; - is standard output")
         ->type_name("FILE")
         ->capture_default_str();
     AddRecordOptions(record, *order);

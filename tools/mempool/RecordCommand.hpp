@@ -1,4 +1,4 @@
-// Recording as a subcommand does it.
+// Recording, for the subcommands that record.
 
 #ifndef OBR_TOOLS_MEMPOOL_RECORDCOMMAND_HPP
 #define OBR_TOOLS_MEMPOOL_RECORDCOMMAND_HPP
@@ -8,10 +8,10 @@
 
 namespace Tool {
 
-// The options of a recording: by which groups, and of the heap or of pools.
+// Adds the options of a recording: the groups, and whether the heap or pools are recorded.
 void AddRecordOptions(CLI::App& subcommand, Recorder::Order& order);
 
-// Records. Says on standard error why the trace is not what the user may expect.
+// Records the program. Warns on standard error if the trace is not what the user may expect.
 Recorder::Outcome RecordAsOrdered(const Recorder::Order& order);
 
 }  // namespace Tool

@@ -1,4 +1,4 @@
-// mempool replay: replays traces through the pools and through the heap, and compares.
+// mempool replay: replays traces on pools and on the heap, and compares.
 
 #include <cstdint>
 #include <cstdlib>
@@ -33,32 +33,32 @@ namespace Tool {
 namespace {
 
 constexpr const char* description =
-    "Replay traces of a program through the pools and through the heap, and compare";
+    "Replay traces of a program on pools and on the heap, and compare";
 
 constexpr const char* notes =
-    R"(A TRACE is what 'mempool record' has written, or the output of a program that ran with
-NUV_OBR_MEMPOOL_TRACE=1, plain or compressed by gzip. Of text only lines "xmpt:..." count.
+    R"(TRACE is a file of 'mempool record', or the output of a program that ran with
+NUV_OBR_MEMPOOL_TRACE=1, plain or compressed by gzip. In a text, only lines with "xmpt:" count.
 
-A setting without an option here is that of its environment variable, such as
+Settings without an option on the command line come from their environment variables, such as
 NUV_OBR_MEMPOOL_BUCKET_SIZE.
 
-pool          What --layer says. heap: an OBR::MemPool::Heap for each traced pool, its blocks aligned
-              to 8 bytes. mgr: an OBR::MemPool::Mgr for each, blocks aligned to 4 bytes or less.
-              malloc: what 'mempool try' preloads, one Heap for all, blocks aligned to 16 bytes and
-              those above the largest record left to the C library.
-heap          operator new[] and delete[]. What a pool drops is freed on the heap too, block by
-              block; at a pool's end that time is not counted. No block is written to.
-the peak      The moment with the most bytes asked for.
-bytes held    What operator new has lent at the peak, in sizes of malloc_usable_size, and the 8 bytes
-              of the GNU C library's own header for each block. A replay of its own counts them,
-              untimed; a timed one pays one test of a flag for it at each heap request.
-ns per event  Processor time, the median of all rounds. Each replay runs in a process of its own, as
-              a program does that starts: the first use of memory is in it.
+pool          --layer heap: an OBR::MemPool::Heap for each traced pool, with blocks aligned to 8
+              bytes. mgr: an OBR::MemPool::Mgr for each, with blocks aligned to 4 bytes or less.
+              malloc: the library that 'mempool try' preloads, with one Heap for all, blocks aligned
+              to 16 bytes, and larger blocks from the C library.
+heap          operator new[] and delete[]. Blocks that a pool drops are freed one by one; that time
+              does not count at the end of a pool. A replay does not write to blocks.
+the peak      The moment with the most requested bytes.
+bytes held    The bytes of operator new at the peak, as malloc_usable_size counts them, and the GNU C
+              library's header of 8 bytes per block. A replay of its own counts them, without timing.
+              In a timed replay the counters cost one test of a flag per heap request.
+ns per event  Processor time, the median of all rounds. Each replay runs in a new process, so that
+              the first use of memory counts, as in a program that starts.
 spread        Between the lower and the upper quartile of the rounds.
---sweep       The search of 'mempool advise'. All settings that were tried are shown, the best at
-              time x bytes first.
+--sweep       The search of 'mempool advise'. Prints all settings that were tried, those with the
+              least time x bytes first.
 bad lines     Left out of the replay. The library's own trace does not show Mgr::Clear: after one,
-              pointers allocated twice are to be expected.
+              expect pointers that are allocated twice.
 )";
 
 struct Options {
@@ -125,7 +125,7 @@ int Compare(const std::string& path, const Options& options) {
     return WarnOfBrokenTrace(reader);
 }
 
-// Likewise, with the settings that a search tries.
+// The same with the settings that a search tries.
 int Sweep(const std::string& path, const Options& options) {
     Trace::StepReader reader(path);
     const Progress progress(reader.Name());
@@ -161,7 +161,7 @@ int ReplayAll(const Options& options) {
     return status;
 }
 
-// A sweep tries settings of its own, and only a sweep has a length.
+// A sweep chooses its own settings, and only a sweep has --seconds.
 void CheckSweep(const CLI::App& replay, bool isSweep) {
     std::vector<std::string> others = {"--rounds", "--dbg"};
     for (const auto& row : OBR::MemPool::SettingTable::all) { others.emplace_back(row.option); }
@@ -186,10 +186,10 @@ void AddReplay(Program& program) {
         ->type_name("");
     AddLayer(replay, options->layer);
     AddSettings(replay, options->settings);
-    AddNumber(replay, "--rounds", options->rounds, 1, 1000000, "Timed replays a side");
+    AddNumber(replay, "--rounds", options->rounds, 1, 1000000, "Timed replays of each side");
     replay.add_flag("--dbg", options->dbg, "Print the report of each pool at the peak");
     replay.add_flag("--sweep", options->sweep,
-                    "Try many settings in place of one, and print a table of them");
+                    "Try many settings instead of one, and print a table of them");
     AddSeconds(replay, options->seconds);
     replay.callback([&program, &replay, options] {
         CheckSweep(replay, options->sweep);

@@ -1,4 +1,4 @@
-// mempool report: what a trace says about the memory of its program.
+// mempool report: reports on the memory of a program from its trace.
 
 #include "mempool/Report.hpp"
 
@@ -25,39 +25,40 @@ namespace Tool {
 namespace {
 
 constexpr const char* description =
-    "Show from a trace where the memory of a program is: by group, size and lifetime";
+    "Show where a program's memory is, from a trace: by group, size and lifetime";
 
 constexpr const char* notes =
-    R"(Nothing is run: the trace is read once, and what pools and the heap would hold is computed by the
-rules of the library and of the C library's malloc.
+    R"(The trace is read once and not replayed: the bytes that pools and the heap would hold are computed by
+the rules of the library and of the C library's malloc.
 
 event         An allocation, a release, a Clear, or the creation or the destruction of a pool.
-group         What the recording traced as one pool. Those of one name count as one.
-the peak      The first moment with the most bytes asked for.
-bytes held    By pools: buckets, heap records and tables. By the heap: its blocks as malloc rounds
-              them, with its own headers, 8 bytes per block; the last line is without them. Unused
-              memory between blocks is not counted.
+group         What the recording traced as one pool. Pools with the same name are one group.
+the peak      The first moment with the most requested bytes.
+bytes held    By pools: buckets, heap records and tables. By the heap: blocks as malloc rounds them,
+              with its header of 8 bytes per block; the last line is without headers. Unused memory
+              between blocks does not count.
 records       The share of blocks that fit into a bucket. The others are heap records.
 padding       Bytes that rounding adds to those.
 temporary     The share of blocks that the next event of their thread frees.
 short         The share of blocks that are freed within 100 events.
-leaked        Bytes that are not freed until their pool or the trace ends; never: their share.
+leaked        Bytes that are not freed before their pool or the trace ends.
+never         The share of blocks that are leaked.
 together      The share of blocks that die in a series of two or more releases, without an
               allocation of their group in between.
-clear         Of these, the series that leave no block of the group alive: one Clear of a pool
-              would replace them.
+clear         The share of blocks in those series that leave no block of the group alive: one Clear
+              of a pool would replace such a series.
 
---json has the exact figures; docs/report.md lists its keys. A setting without an option here is that
-of its environment variable, such as NUV_OBR_MEMPOOL_BUCKET_SIZE.
+--json has the exact figures; docs/report.md lists its keys. Settings without an option on the
+command line come from their environment variables, such as NUV_OBR_MEMPOOL_BUCKET_SIZE.
 )";
 
 struct Options {
     std::string path;
     OBR::MemPool::PoolSettings settings;
     bool all = false;
-    bool json = false;  // In place of the text.
-    std::string html;   // Where the page goes, besides; "-" is the standard output, with the page
-                        // alone. Empty for none.
+    bool json = false;  // Instead of the text.
+    std::string html;   // The file of the page; "-" writes only the page, to standard output. Empty
+                        // for no page.
 };
 
 // Returns the exit status.
@@ -119,7 +120,7 @@ void AddReport(Program& program) {
     report
         .add_option(
             "--html", options->html,
-            "Also write a page with charts to FILE; - is standard output, with the page alone")
+            "Also write a page with charts to FILE; - writes only the page, to standard output")
         ->type_name("FILE");
     report.add_flag("--all", options->all, "Print every size and every group");
     AddSettings(report, options->settings);

@@ -12,7 +12,7 @@
 
 namespace Tool {
 
-// Opens the file of a page before any work is done for it; null if `path` is empty. A
+// Opens the file of a page before any work is done for it; null if `path` is empty. Throws a
 // std::runtime_error if it cannot be written, is one of the inputs, or no page can be made.
 std::unique_ptr<System::OutputFile> OpenPage(const std::string& path,
                                              const std::vector<std::string>& inputs);

@@ -1,4 +1,4 @@
-// The sections of the report, from the top down.
+// The sections of the report, in the order of the page.
 
 #include "mempool/ReportText.hpp"
 
@@ -59,7 +59,7 @@ std::string Fact(const Analysis& analysis, const char* key) {
     return fact == analysis.facts.end() ? "" : SafeText(fact->second);
 }
 
-// A name without the arguments of templates if they make it too long, and then without its middle.
+// A name; if it is too long, without template arguments, and then without its middle.
 std::string ShortName(std::string name, std::size_t bytes) {
     while (name.size() > bytes) {
         const std::size_t end = name.find('>');
@@ -70,7 +70,7 @@ std::string ShortName(std::string name, std::size_t bytes) {
     return Trace::CutText(name, bytes);
 }
 
-// Two columns without headings: what it is, and a text.
+// Two columns without headings: a label and a text.
 Table Labelled() {
     return Table({{"", 20, Align::Left}, {"", 0, Align::Left}});
 }
@@ -123,7 +123,7 @@ void PrintTotals(std::ostream& out, const Analysis& analysis) {
                     Percent(analysis.peak.*figure, analysis.peak.chunks),
                     Bytes(analysis.most.*figure));
     };
-    add("asked for", &Report::Moment::asked);
+    add("requested", &Report::Moment::asked);
     add("pools, one per group", &Report::Moment::pools);
     add("one pool for all", &Report::Moment::onePool);
     add("heap (malloc)", &Report::Moment::chunks);
@@ -144,11 +144,11 @@ void PrintGraph(std::ostream& out, const Analysis& analysis) {
             columns.at(column) = std::max(columns.at(column), point.most.asked);
         } while (++column < end);
     }
-    out << "\n   BYTES ASKED FOR OVER THE TRACE\n";
+    out << "\n   BYTES REQUESTED OVER THE TRACE\n";
     for (std::uint64_t line = height; line > 0; --line) {
         std::string text;
         for (const std::uint64_t bytes : columns) {
-            // A line is marked from its middle on, and the lowest one by any byte.
+            // A line is marked from its middle on, the lowest one from the first byte on.
             const bool isMarked =
                 2 * height * static_cast<double>(bytes) >=
                     static_cast<double>(2 * line - 1) * static_cast<double>(analysis.peak.asked) ||

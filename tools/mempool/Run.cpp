@@ -1,4 +1,4 @@
-// mempool run: records a program, then reports on it and advises, all in one.
+// mempool run: records a program, then reports and advises.
 
 #include <fcntl.h>
 #include <unistd.h>
@@ -37,13 +37,15 @@ constexpr const char* description =
     "Run a program, and report where its memory is and whether it would gain from pools";
 
 constexpr const char* notes =
-    R"(The program runs as under 'mempool record'. After it ends, mempool prints what 'mempool report' and
-'mempool advise' say about its trace, which is kept in a nameless file in TMPDIR or /tmp. All of this
-goes to standard error: the program's own output and exit status stay as they are. If recording fails
-or the page cannot be written, the status is 125, 126 or 127, as with 'mempool record'. The report is
-by caller unless --by says otherwise. The advice is for one pool for all groups, on the library that
-'mempool try' preloads unless --layer says otherwise, and ends with the command line that tries it.
-Ctrl-C ends the program, and mempool reports on what was recorded; a second one ends that too.
+    R"(The program runs as under 'mempool record'. After it ends, mempool prints the output of 'mempool
+report' and 'mempool advise' for its trace to standard error. The program's own output and exit status
+do not change. If recording fails or the page cannot be written, the status is 125, 126 or 127, as of
+'mempool record'. The trace is in a file without a name in TMPDIR or /tmp, and is gone at the end.
+
+The report is by caller by default. The advice is for one pool for all groups, by default on the
+library that 'mempool try' preloads, and ends with the command line that tries it.
+
+Ctrl-C ends the program, and mempool reports on what was recorded. A second Ctrl-C ends mempool.
 )";
 
 struct Options {
@@ -55,8 +57,8 @@ struct Options {
     Replay::Layer layer = Replay::Layer::Malloc;
 };
 
-// A file that never has a name for longer than it takes to open it: however this process ends,
-// nothing is left. The recorded program does not inherit it.
+// A file whose name is removed as soon as it is open, so that nothing is left however this process
+// ends. The recorded program does not inherit it.
 class NamelessFile {
 public:
     NamelessFile()
@@ -69,10 +71,10 @@ public:
     NamelessFile& operator=(const NamelessFile&) = delete;
     ~NamelessFile() { close(descriptor); }
 
-    // A path that this process can open it by.
+    // A path by which this process can open it.
     std::string Path() const { return "/proc/self/fd/" + std::to_string(descriptor); }
 
-    // The text of an error with its place in place of that path.
+    // The text of an error, with the file's former name instead of that path.
     std::string Named(std::string error) const {
         const std::string path = Path();
         const std::size_t place = error.find(path);

@@ -1,5 +1,5 @@
-// Makes the texts of a trace safe to print. A trace comes from anywhere, and a name in it could be
-// a command to the terminal.
+// Makes the texts of a trace safe to print. A trace cannot be trusted: a name in it could contain
+// an escape sequence for the terminal.
 
 #ifndef OBR_TOOLS_MEMPOOL_SAFETEXT_HPP
 #define OBR_TOOLS_MEMPOOL_SAFETEXT_HPP

@@ -47,7 +47,7 @@ void TakeEnvironment(const CLI::App& subcommand, OBR::MemPool::PoolSettings& set
 }
 
 void AddLayer(CLI::App& subcommand, Replay::Layer& layer) {
-    subcommand.add_option("--layer", layer, "What serves the blocks in place of malloc")
+    subcommand.add_option("--layer", layer, "What serves the blocks instead of malloc")
         ->type_name("LAYER")
         ->transform(CLI::Transformer(layers))
         ->default_str(NameOf(layer));
@@ -59,12 +59,14 @@ const char* NameOf(Replay::Layer layer) {
 }
 
 void AddSeconds(CLI::App& subcommand, unsigned int& seconds) {
-    AddNumber(subcommand, "--seconds", seconds, 1, 100000, "How long to search, about");
+    AddNumber(subcommand, "--seconds", seconds, 1, 100000, "Approximate time of the search");
 }
 
 void CheckSettings(const OBR::MemPool::PoolSettings& settings) {
     const std::string problem = OBR::MemPool::PoolSizes(settings).Problem();
-    if (!problem.empty()) { throw std::runtime_error("these settings make no pool: " + problem); }
+    if (!problem.empty()) {
+        throw std::runtime_error("no pool can have these settings: " + problem);
+    }
 }
 
 }  // namespace Tool

@@ -10,17 +10,18 @@
 
 namespace Tool {
 
-// Adds an option for each setting, which stores it in `settings`. The others keep their values.
+// Adds an option for each setting, which stores it in `settings`. Settings without an option on the
+// command line keep their values.
 void AddSettings(CLI::App& subcommand, OBR::MemPool::PoolSettings& settings);
 
-// Takes the settings for which no option was given from the environment, for the callback of the
-// subcommand. A bad value is an error like a bad option.
+// Takes the settings for which no option was given from the environment. For the callback of the
+// subcommand. An invalid value is an error like an invalid option.
 void TakeEnvironment(const CLI::App& subcommand, OBR::MemPool::PoolSettings& settings);
 
-// Adds --layer, what is measured beside the heap.
+// Adds --layer, the layer that is compared with the heap.
 void AddLayer(CLI::App& subcommand, Replay::Layer& layer);
 
-// The name of a layer, as --layer takes it.
+// The name of a layer, as for --layer.
 const char* NameOf(Replay::Layer layer);
 
 // Adds --seconds, the length of a search.

@@ -38,7 +38,7 @@ Table::Table(std::vector<Column> list) : columns(std::move(list)) {
     for (std::size_t line = 0; line < numLines; ++line) {
         std::vector<std::string> cells;
         for (const std::vector<std::string>& heading : headings) {
-            const std::size_t skipped = numLines - heading.size();  // It stands on the last lines.
+            const std::size_t skipped = numLines - heading.size();  // It is on the last lines.
             cells.push_back(line < skipped ? "" : heading[line - skipped]);
         }
         AddCells(std::move(cells));

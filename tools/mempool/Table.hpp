@@ -1,4 +1,4 @@
-// A table of text: one list of columns gives the headings and the form of the rows.
+// A table of text: one list of columns determines the headings and the form of the rows.
 
 #ifndef OBR_TOOLS_MEMPOOL_TABLE_HPP
 #define OBR_TOOLS_MEMPOOL_TABLE_HPP
@@ -17,7 +17,7 @@ enum class Align : std::uint8_t { Right, Left };
 
 struct Column {
     std::string heading;    // A newline in it begins a second line.
-    std::size_t width = 0;  // At least; the column is as wide as its widest cell.
+    std::size_t width = 0;  // The minimum; the column is as wide as its widest cell.
     Align align = Align::Right;
 };
 
@@ -31,8 +31,8 @@ public:
         AddCells({fmt::format("{}", values)...});
     }
 
-    // Cells that are missing at the end are empty; more than there are columns are a
-    // std::out_of_range.
+    // Missing cells at the end are empty. Throws std::out_of_range if there are more cells than
+    // columns.
     void AddCells(std::vector<std::string> cells);
 
     // Writes the headings, if there are any, and the rows, without blanks at the ends of lines.

@@ -19,17 +19,17 @@ namespace {
 constexpr const char* description = "Print a trace as lines of text";
 
 constexpr const char* notes =
-    R"(TRACE is what mempool record has written, or any text with trace lines among others, plain or
-compressed by gzip. Only well-formed trace lines are printed:
+    R"(TRACE is a file of 'mempool record', or any text with trace lines among others, plain or compressed
+by gzip. Only well-formed trace lines are printed:
 
 xmpt:c:POOL              A pool is created.
 xmpt:n:POOL:TEXT         Its name.
-xmpt:a:POOL:BLOCK:SIZE   A block is allocated; SIZE bytes were asked for.
+xmpt:a:POOL:BLOCK:SIZE   A block of SIZE requested bytes is allocated.
 xmpt:f:POOL:BLOCK:       A block is freed.
 xmpt:x:POOL              A pool drops all its blocks.
 xmpt:d:POOL              A pool is destroyed, with all its blocks.
 xmpt:i:KEY:TEXT          A fact about the whole recording.
-xmpt:t:MILLISECONDS      When the following happened, since the recording began.
+xmpt:t:MILLISECONDS      The time of the following events, since the recording began.
 
 POOL and BLOCK are addresses of 16 hexadecimal digits. The recording of a heap has a pool for each
 group.
@@ -51,7 +51,7 @@ int PrintTrace(const std::string& path) {
         lines.clear();
     }
     std::cout << lines << std::flush;
-    if (!std::cout) { return EXIT_FAILURE; }  // The caller says why.
+    if (!std::cout) { return EXIT_FAILURE; }  // The caller reports it.
     if (numMalformed != 0) {
         std::cerr << "mempool: " << name << ": " << numMalformed << " malformed lines ignored\n";
     }

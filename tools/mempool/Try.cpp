@@ -24,22 +24,24 @@ namespace {
 constexpr const char* description = "Run a program on malloc and on pools, in turns, and compare";
 
 constexpr const char* notes =
-    R"(The program runs unchanged. On pools a library is preloaded that serves its blocks up to the largest
-record from one Heap, aligned to 16 bytes as malloc's; mimalloc is preloaded too where it is installed.
-The first run counts for nothing; its output is the one that is shown. The figures go to standard error.
+    R"(The program runs unchanged, in turns on malloc, on pools and, if it is installed, on mimalloc. For
+pools a library is preloaded that serves blocks up to the largest record from one Heap, aligned to 16
+bytes as malloc's. The first run is not measured; only its output is shown. The figures go to standard
+error.
 
-A setting without an option here is that of its environment variable, such as
+Settings without an option on the command line come from their environment variables, such as
 NUV_OBR_MEMPOOL_BUCKET_SIZE.
 
 cpu s         User and system time, the median of the rounds.
-spread        Between the lower and the upper quartile. A difference within it is neither a gain nor
-              a price, nor is one of less than 1 %.
-peak MB       The most resident memory, the program's code included.
-Standard input is empty unless --stdin names a file. Ctrl-C ends the trial; the rounds that are whole
-are shown.
+spread        Between the lower and the upper quartile. A difference within it, or of less than 1 %,
+              is neither a gain nor a price.
+peak MB       The peak of resident memory, including the program's code.
+
+Standard input is empty unless --stdin names a file. Ctrl-C ends the trial and shows the complete
+rounds.
 
 Exit status: that of the program's first run, or its signal; 125 if nothing was tried, 126 if the
-program cannot be run, 127 if there is none of that name.
+program cannot be run, 127 if it is not found.
 )";
 
 struct Options {
@@ -100,7 +102,7 @@ int Try(const Options& options) {
     const Preload::Trial trial =
         Preload::TryProgram(options.order, [&](unsigned int round, const std::string& side) {
             progress.Clear();
-            if (round == 0) { return; }  // What the program prints comes next.
+            if (round == 0) { return; }  // The output of the program comes next.
             progress.Show(fmt::format("round {} of {}, on {}", round, options.order.rounds, side));
         });
     progress.Clear();
@@ -124,12 +126,12 @@ void AddTry(Program& program) {
     sub.footer(notes);
     AddCommand(program, sub);
     const auto options = std::make_shared<Options>();
-    AddNumber(sub, "--rounds", options->order.rounds, 1, 1000, "Runs that count, on each side");
+    AddNumber(sub, "--rounds", options->order.rounds, 1, 1000, "Measured runs of each side");
     AddSettings(sub, options->order.settings);
     sub.add_option("--stdin", options->order.input, "The program's standard input")
         ->type_name("FILE");
     sub.add_flag("--json", options->json,
-                 "Print the figures as JSON on standard output, and what the program prints on "
+                 "Print the figures as JSON on standard output, and the output of the program on "
                  "standard error");
     sub.callback([&program, &sub, options] {
         options->order.command = program.command;

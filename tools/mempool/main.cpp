@@ -19,8 +19,8 @@
 namespace {
 
 constexpr const char* description =
-    R"(Shows what memory pools do, or would do, for a program: where its memory is, which settings suit
-it, and the faults that it makes with them. Start with 'mempool run PROGRAM'.)";
+    R"(Shows where a program's memory is, what memory pools would gain, which settings suit the program,
+and its faults in the use of pools. Start with 'mempool run PROGRAM'.)";
 
 // A standard stream that is closed would become the first file that is opened. In its place comes
 // one that cannot be written, and that the programs that are run do not inherit.
@@ -30,13 +30,13 @@ void OccupyStandardStreams() {
     }
 }
 
-// Before work is done for it.
+// Checked before any work is done.
 bool CanWriteOutput() {
     return (fcntl(STDOUT_FILENO, F_GETFL) & O_ACCMODE) != O_RDONLY;
 }
 
-// Whether all that went to the standard output has got there, which only a flush shows. The C
-// streams are asked too: a write through them does not change the state of the others.
+// Whether all output has been written, which only a flush shows. C's stream is checked too: its
+// errors do not change the state of std::cout.
 bool IsOutputWritten() {
     std::cout.flush();
     return std::cout.good() && std::ferror(stdout) == 0;

@@ -239,7 +239,7 @@ Conclusion Conclude(const Trial& trial) {
             judge(other).advised.has_value() &&
             Cost(other, before, Advise::Aim::Both) < Cost(pools, before, Advise::Aim::Both);
         conclusion.sentences.push_back(Compared(
-            wins ? "Preloaded mimalloc wins more: with it" : "With mimalloc", other, before));
+            wins ? "Preloaded mimalloc gains more: with it" : "With mimalloc", other, before));
     }
     if (!trial.sides.at(0).isSame) {
         conclusion.sentences.emplace_back(
@@ -250,8 +250,8 @@ Conclusion Conclude(const Trial& trial) {
     if (conclusion.sameOutput == false) {
         conclusion.verdict = "differs";
         conclusion.sentences.insert(conclusion.sentences.begin(),
-                                    "On pools the program writes or ends differently: what it "
-                                    "takes there means nothing.");
+                                    "On pools the program's output or exit status is different, "
+                                    "so its figures there mean nothing.");
     }
     return conclusion;
 }

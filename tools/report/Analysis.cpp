@@ -1,4 +1,4 @@
-// The pass over a trace, and what is summed up after it.
+// The pass over a trace, and the sums after it.
 
 #include "report/Analysis.hpp"
 
@@ -30,7 +30,7 @@ public:
         onePool.Create(0);
     }
 
-    // The last step that the reader has read.
+    // Handles the last step that the reader has read.
     void Take(const Trace::Step& step, const Trace::StepReader& reader) {
         if (step.kind == Trace::Kind::Named) { return; }
         ++result.events;
@@ -128,7 +128,7 @@ private:
                               onePool.Allocate(0, block.size)};
     }
 
-    // For each block that goes. The caller updates the model of its own pool.
+    // Handles the release of a block. The caller updates the model of the block's own pool.
     void Release(std::uint32_t pool, const Trace::Block& block, End end) {
         const Alive& was = alive[block.index];
         onePool.Free(0, was.placeInOne, block.size);
@@ -154,7 +154,7 @@ private:
         if (result.total.live.blocks == 0) { onePool.Clear(0); }
     }
 
-    // After each event.
+    // Called after each event.
     void Look(std::optional<std::uint64_t> milliseconds) {
         const BlockSum& live = result.total.live;
         const Moment now = {result.events,     milliseconds,
@@ -203,7 +203,7 @@ private:
                   });
     }
 
-    // After JoinGroups.
+    // Called after JoinGroups.
     void AddGrowth(const std::vector<Trace::Pool>& traced) {
         const std::size_t numGrowing = std::min(result.groups.size(), maxGrowing);
         std::map<std::string, std::size_t> places;

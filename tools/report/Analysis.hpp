@@ -1,10 +1,11 @@
-// What a trace says about a program's memory: the sizes of its blocks, how long they live, which
-// groups allocate them, and what pools would hold compared with the heap. One pass over the trace,
-// in memory that grows with the live blocks and the pools, not with the events.
+// Analyses a program's memory from a trace: the sizes of its blocks, their lifetimes, the groups
+// that allocate them, and the bytes that pools would hold compared with the heap. It takes one pass
+// over the trace, and memory that grows with the live blocks and the pools, not with the events.
 //
 // A *group* is what the recording traced as one pool: all blocks, or those of a caller, module,
-// thread or real pool. Traced pools of one name are one group; without names, those of one address.
-// An *event* is an allocation, a release, a Clear, or the creation or the destruction of a pool.
+// thread or real pool. Traced pools with the same name are one group; without names, those with the
+// same address. An *event* is an allocation, a release, a Clear, or the creation or the destruction
+// of a pool.
 
 #ifndef OBR_TOOLS_REPORT_ANALYSIS_HPP
 #define OBR_TOOLS_REPORT_ANALYSIS_HPP
@@ -56,8 +57,8 @@ struct Analysis {
     std::uint64_t clears = 0;
     Tally total;
     Runs runs;    // Of all groups.
-    Moment peak;  // The first moment with the most bytes, and of those with the most blocks.
-    Moment most;  // The most of each figure at any time. Its event is not set.
+    Moment peak;  // The first moment with the most bytes and, among equal ones, the most blocks.
+    Moment most;  // The maximum of each figure at any time. Its event is not set.
 
     std::vector<SizeRow> sizes;    // Those that occur, the smallest first.
     std::vector<GroupRow> groups;  // The largest at the peak first.
@@ -67,8 +68,8 @@ struct Analysis {
     std::vector<FillColumn> fill;
 };
 
-// Reads the trace to its end, and calls `atEvent` with the position now and then. A pool must be
-// possible with the settings.
+// Reads the trace to its end, and calls `atEvent` with the position from time to time. The settings
+// must be valid for a pool.
 Analysis Analyse(Trace::StepReader& reader, const Replay::PoolSettings& settings,
                  const std::function<void(std::uint64_t position)>& atEvent);
 

@@ -1,6 +1,6 @@
-# Puts the parts of the page into one another and writes them as C++: all that stands ahead of the
-# data, and all that stands behind. Takes PAGE, the folder of the parts, D3, the script, which may be
-# empty, and OUTPUT. Without the script both are empty.
+# Assembles the parts of the page and writes them as two C++ strings: the page before the data, and the
+# page after it. Takes PAGE, the folder of the parts, D3, the script, and OUTPUT. If D3 is empty, so are
+# both strings.
 
 set(page "@DATA@")
 if(D3)

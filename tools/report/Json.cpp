@@ -161,7 +161,7 @@ void AddGrowth(Json& json, const Analysis& analysis, const JsonLimits& limits) {
     json["growth"] = std::move(growth);
 }
 
-// A row per size class that ever has a bucket; those with the most bytes if they are too many.
+// A row per size class that ever has a bucket; if there are too many, those with the most bytes.
 void AddFill(Json& json, const Analysis& analysis, const JsonLimits& limits) {
     struct Row {
         std::vector<std::uint64_t> used;

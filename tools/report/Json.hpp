@@ -1,4 +1,4 @@
-// An analysis as JSON. docs/report.md lists the keys, which stay as they are.
+// An analysis as JSON. docs/report.md lists the keys, which keep their meaning.
 
 #ifndef OBR_TOOLS_REPORT_JSON_HPP
 #define OBR_TOOLS_REPORT_JSON_HPP
@@ -11,7 +11,7 @@
 
 namespace Report {
 
-// The most that is written of each, for where the whole would be too long.
+// Limits for a JSON that would otherwise be too long.
 struct JsonLimits {
     std::size_t groups = std::numeric_limits<std::size_t>::max();
     std::size_t nameBytes = std::numeric_limits<std::size_t>::max();

@@ -1,5 +1,5 @@
-// An analysis as one self-contained page of HTML, with its style, scripts and figures. The build of
-// the tools puts the fixed parts together, if the library for the charts is installed then.
+// An analysis as one self-contained HTML page, with its style, scripts and figures. The build of
+// the tools assembles the fixed parts, if the library for the charts is installed.
 
 #ifndef OBR_TOOLS_REPORT_PAGE_HPP
 #define OBR_TOOLS_REPORT_PAGE_HPP
@@ -11,11 +11,10 @@
 
 namespace Report {
 
-// Throws a std::runtime_error if the tools were built without the library for the charts, and can
-// make no page.
+// Throws a std::runtime_error if the tools were built without the library for the charts.
 void CheckCanMakePage();
 
-// Only the largest groups, if there are very many: the page stays below 5 MB.
+// If there are very many groups, the page has only the largest, so that it stays below 5 MB.
 std::string MakePage(const Analysis& analysis);
 
 // The page before and after the data, from a file that the build makes.

@@ -131,7 +131,7 @@ std::uint32_t PoolModel::AddBucket(Group& group, SizeClass& sizeClass) {
     return index;
 }
 
-// A bucket that gains room becomes the first.
+// Puts a bucket that has room again in front.
 void PoolModel::LinkFree(Group& group, std::uint32_t index) {
     buckets[index].prevFree = 0;
     buckets[index].nextFree = group.freeHead;

@@ -1,11 +1,11 @@
-// What pools would hold over the course of a trace, computed without their memory: which bucket
-// each block would be in, and how many buckets there are. The rules are those of the library: a
-// size class takes records from the bucket that most recently gained room, a bucket is released
-// with its last record unless it is kept, and a block that is too large is a heap record. Each
-// block takes a few bytes, whatever its size.
+// A model of the memory that pools would hold during a trace, without that memory itself: the
+// bucket of each block, and the number of buckets. The rules are those of the library: a size class
+// takes records from the bucket that was last to get a free record, a bucket is released with its
+// last record unless it is kept, and a block that is too large is a heap record. The model takes a
+// few bytes per block, whatever its size.
 //
-// Bytes are counted as a replay counts them: what malloc lends for buckets, heap records and the
-// pools' own tables. The names of pools are not counted.
+// It counts bytes as a replay does: those that malloc provides for buckets, heap records and the
+// pools' own tables, but not for the names of pools.
 
 #ifndef OBR_TOOLS_REPORT_POOLMODEL_HPP
 #define OBR_TOOLS_REPORT_POOLMODEL_HPP
@@ -30,10 +30,10 @@ struct SizeClass {
 
 class PoolModel {
 public:
-    // A pool must be possible with the settings.
+    // The settings must be valid for a pool.
     explicit PoolModel(const Replay::PoolSettings& settings);
 
-    // The caller numbers the pools: small numbers, each created once.
+    // The caller numbers the pools, with small numbers, and creates each once.
     void Create(std::uint32_t pool);
     Place Allocate(std::uint32_t pool, std::uint32_t size);
     void Free(std::uint32_t pool, Place place, std::uint32_t size);
@@ -43,7 +43,7 @@ public:
     std::uint64_t BytesHeld() const { return bytesHeld; }
     const std::vector<SizeClass>& Classes() const { return classes; }
 
-    // Whether a block of that size goes into a bucket, and if so, its size rounded up.
+    // Whether a block of that size goes into a bucket; if so, its size rounded up.
     bool IsRecord(std::uint32_t size) const { return size < sizesInBuckets; }
     std::uint32_t RecordBytes(std::uint32_t size) const { return classes[ClassOf(size)].dataSize; }
 
@@ -63,7 +63,7 @@ private:
     };
     struct Pool {
         std::vector<Group> groups;    // One per size class.
-        std::uint64_t heapBytes = 0;  // Lent for its heap records.
+        std::uint64_t heapBytes = 0;  // Provided for its heap records.
     };
 
     std::uint32_t ClassOf(std::uint32_t size) const;

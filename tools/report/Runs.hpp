@@ -1,6 +1,6 @@
-// Which blocks of a group die together: a *run* is a series of releases without an allocation of
-// that group in between, and the blocks of a run of two or more die together. If the run leaves no
-// block of the group alive, one Clear of a pool of its own would replace it.
+// Finds the blocks of a group that die together. A *run* is a series of releases without an
+// allocation of that group in between. The blocks of a run of two or more die together. If the run
+// leaves no block of the group alive, one Clear of a pool for the group would replace it.
 
 #ifndef OBR_TOOLS_REPORT_RUNS_HPP
 #define OBR_TOOLS_REPORT_RUNS_HPP
@@ -12,7 +12,7 @@
 
 namespace Report {
 
-// Bins for runs of 2 to 9 blocks, of 10 to 99, and so on; the last one has all that are longer.
+// Bins for runs of 2 to 9 blocks, of 10 to 99, and so on; the last one has all longer runs.
 constexpr std::size_t numLengths = 7;
 constexpr std::size_t LengthBin(std::uint64_t numBlocks) {
     std::size_t bin = 0;
@@ -26,7 +26,7 @@ class Runs {
 public:
     void Release(std::uint64_t numBlocks) { current += numBlocks; }
 
-    // At the next allocation and at the end. `numLive`: blocks of the group that are still alive.
+    // Called at the next allocation and at the end, with the number of live blocks of the group.
     void End(std::uint64_t numLive) {
         if (current >= 2) {
             ++numRuns;

@@ -1,5 +1,5 @@
-// Columns of figures at regular moments of a trace, whose number is bounded: whenever there are too
-// many, every other one is dropped.
+// Columns of figures at regular moments of a trace. When there are too many, every other one is
+// dropped.
 
 #ifndef OBR_TOOLS_REPORT_SAMPLES_HPP
 #define OBR_TOOLS_REPORT_SAMPLES_HPP
@@ -16,7 +16,7 @@ constexpr std::size_t maxSamples = 128;
 template <typename Column>
 class Samples {
 public:
-    // Call it after each event. The column to fill in, or null if this moment has none.
+    // Called after each event. Returns the column to fill in, or null if this moment has none.
     Column* At(std::uint64_t event) {
         if (event % interval != 0) { return nullptr; }
         if (columns.size() == maxSamples) {

@@ -1,5 +1,5 @@
-// The blocks by size. Each size up to 1024 has a row; above that the sizes within an eighth of a
-// power of two share one, so that the table is of bounded length.
+// The blocks by size. Each size up to 1024 has a row. Above that there are eight rows per power of
+// two, so that the length of the table is bounded.
 
 #ifndef OBR_TOOLS_REPORT_SIZES_HPP
 #define OBR_TOOLS_REPORT_SIZES_HPP
@@ -26,11 +26,11 @@ public:
         return rows[place];
     }
 
-    // Rows without a block included.
+    // Including rows without a block.
     const std::vector<SizeRow>& Rows() const { return rows; }
 
 private:
-    // A range ends with a power of two or a multiple of its eighth, which real sizes often are.
+    // A range ends with a power of two or a multiple of an eighth of it: common sizes.
     static std::size_t PlaceOf(std::uint32_t size) {
         constexpr std::uint32_t exact = 1024;
         if (size <= exact) { return size; }

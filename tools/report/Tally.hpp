@@ -11,7 +11,7 @@ namespace Report {
 
 struct BlockSum {
     std::uint64_t blocks = 0;
-    std::uint64_t bytes = 0;  // Asked for.
+    std::uint64_t bytes = 0;  // Requested.
 
     void Add(std::uint32_t size) {
         ++blocks;
@@ -28,7 +28,7 @@ struct BlockSum {
 };
 
 // Bins for lifetimes, in events from the allocation to the release: up to 10, up to 100, and so on;
-// the last one has all that are longer.
+// the last one has all longer lifetimes.
 constexpr std::size_t numLifetimes = 10;
 constexpr std::size_t LifetimeBin(std::uint64_t events) {
     std::size_t bin = 0;
@@ -42,20 +42,21 @@ struct Tally {
     std::uint64_t padding = 0;  // Bytes that rounding adds to those.
     BlockSum live;
     std::array<std::uint64_t, numLifetimes> lifetimes = {};  // Of released blocks.
-    std::uint64_t dropped = 0;    // Released blocks that went when their pool was cleared.
+    std::uint64_t dropped = 0;    // Released blocks that a Clear of their pool dropped.
     std::uint64_t temporary = 0;  // Released blocks that the next event of their thread freed.
     BlockSum never;               // Alive when their pool was destroyed, or at the end.
 
     BlockSum atPeak;  // Alive at the peak of the trace. Set by Finish.
 
-    // Before each change of `live`, with the event of the change and that of the peak so far. The
-    // first change after a peak keeps what was alive at it, so that a new peak costs nothing.
+    // Called before each change of `live`, with the event of the change and that of the peak so
+    // far. The first change after a peak keeps the blocks that were alive at it, so that a new peak
+    // costs nothing.
     void Change(std::uint64_t event, std::uint64_t peak) {
         if (changed <= peak) { atPeak = live; }
         changed = event;
     }
 
-    // At the end of the trace.
+    // Called at the end of the trace.
     void Finish(std::uint64_t peak) {
         if (changed <= peak) { atPeak = live; }
         never.Add(live);

@@ -1,4 +1,4 @@
-// Joins the points in pairs whenever there are too many.
+// Joins the points in pairs when there are too many.
 
 #include "report/Timeline.hpp"
 

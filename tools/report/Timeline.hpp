@@ -16,15 +16,15 @@ struct Moment {
     std::uint64_t event = 0;
     std::optional<std::uint64_t> milliseconds;  // If the trace has times.
 
-    std::uint64_t asked = 0;    // Asked for by the live blocks,
-    std::uint64_t blocks = 0;   // and their number.
-    std::uint64_t pools = 0;    // Held by pools, one per traced pool,
-    std::uint64_t onePool = 0;  // and by a single pool for all blocks.
-    std::uint64_t heap = 0;     // Lent by the heap, without malloc's own headers,
-    std::uint64_t chunks = 0;   // and with them.
+    std::uint64_t asked = 0;    // Requested bytes of the live blocks.
+    std::uint64_t blocks = 0;   // Live blocks.
+    std::uint64_t pools = 0;    // Held by pools, one per traced pool.
+    std::uint64_t onePool = 0;  // Held by a single pool for all blocks.
+    std::uint64_t heap = 0;     // Held by the heap, without malloc's own headers.
+    std::uint64_t chunks = 0;   // The same with these headers.
 };
 
-// The moment of an interval with the most bytes asked for, so that no peak is lost.
+// The moment of an interval with the most requested bytes, so that no peak is lost.
 struct Point {
     Moment most;
     std::uint64_t leastAsked = 0;  // In the interval.
@@ -34,7 +34,7 @@ class Timeline {
 public:
     static constexpr std::size_t maxPoints = 512;
 
-    // After each event.
+    // Called after each event.
     void Add(const Moment& moment) {
         if (filled == 0) {
             points.push_back({moment, moment.asked});

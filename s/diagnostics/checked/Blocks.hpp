@@ -36,7 +36,7 @@ struct Block {
     static constexpr std::size_t maxHeaderSize = sizeof(Bucket) + sizeof(RecHdr);
 
     const BucketMgr* pool;                            // Null once the block is freed.
-    std::uint32_t size;                               // Bytes asked for.
+    std::uint32_t size;                               // Requested bytes.
     const Layout* layout;                             // One of the two above.
     std::array<unsigned char, maxHeaderSize> header;  // What the header must be.
 

@@ -1,4 +1,4 @@
-"""gdb's view of the pools of libObrMemPool: commands and printers that read memory and nothing else.
+"""gdb's view of the pools of libObrMemPool: commands and printers that only read memory.
 
 From the bottom up: layout (the format, byte by byte), memory (the program's bytes), pools (the objects
 in them and the ways through them), report, whois and check (one command each), printers and commands.

@@ -1,7 +1,7 @@
-"""Every invariant of the memory format, in the order in which a pool refers to its memory, so that
-nothing is followed before it was checked. The first that is broken is a Fault.
+"""Checks every invariant of the memory format, in the order in which a pool refers to its memory, so
+that nothing is followed before it is checked. The first broken invariant raises a Fault.
 
-A list is sound when each link back leads to the node before, and the list ends.
+A list is sound if each link back leads to the previous node, and the list ends.
 """
 
 import struct
@@ -55,8 +55,8 @@ def check_pool(pool):
 
 
 def check_settings(pool):
-    """The settings, as a pool rounds them, and what it derives from them. The two rules for record
-    sizes have the words of PoolSizes::Problem."""
+    """The settings, as a pool rounds them, and the values that it derives from them. The two rules for
+    record sizes have the same words as PoolSizes::Problem."""
     align, low, high = pool.dataAlignment, pool.minRecordSize, pool.maxRecordSize
     hdr = layout.REC_HDR.size
     require(pool.bucketSize <= layout.MAX_BUCKET_SIZE, pool, f"a bucket size of {pool.bucketSize}")
@@ -80,7 +80,7 @@ def check_settings(pool):
 
 
 def rec_data_size(pool, index):
-    """The data size of a group: the largest that leads to its place."""
+    """The data size of a group: the largest that has its index."""
     largest = min(pool.minRecordSize + (index + 1) * pool.dataAlignment - 1, pool.maxRecordSize)
     return (largest - layout.REC_HDR.size) // pool.dataAlignment * pool.dataAlignment
 

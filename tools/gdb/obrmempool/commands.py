@@ -9,7 +9,7 @@ from .memory import Fault
 
 
 def write(lines):
-    """Writes the lines; what gdb's character set lacks is escaped."""
+    """Writes the lines, and escapes characters that gdb's character set lacks."""
     text = "".join(lines)
     try:
         gdb.write(text)
@@ -18,7 +18,7 @@ def write(lines):
 
 
 def pool_named(text):
-    """The pool whose name is this text as it is, or else without its quotes."""
+    """The pool whose name is this text, or else the text without its quotes."""
     name = text.strip()
     found, fault = pools.all_pools()
     for candidate in (name, " ".join(gdb.string_to_argv(text))):
@@ -45,7 +45,7 @@ class InfoMempools(gdb.Command):
     """List the memory pools of libObrMemPool.
 Usage: info mempools
 
-Blocks and bytes are those in use, sizes rounded as the pool rounds them. Held are the bytes that the
+Blocks and bytes are those in use, with the pool's rounding. Held are the bytes that the
 pool has from the heap for buckets and heap records. Blocks of a disabled pool are the heap's own and
 are not counted."""
 
@@ -116,10 +116,10 @@ Usage: mempool report NAME [detailed]
 
 
 class MempoolWhois(gdb.Command):
-    """Show the pool, bucket and record that an address lies in, used or free, and what is beside it.
+    """Show the pool, bucket and record that contain an address, used or free, and the neighbours.
 Usage: mempool whois EXPRESSION
 
-EXPRESSION is a pointer, a number, or an object in memory, of which the address counts. It cannot call
+EXPRESSION is a pointer, a number, or an object in memory, whose address is used. It cannot call
 functions of the program."""
 
     def __init__(self):

@@ -1,8 +1,8 @@
 """The memory format: every size and offset that the other files rely on.
 
 A Layout is a struct of the library. It lists the fields in the order of memory as "name:code", with
-codes of the module struct, and gaps by their code alone. All is little-endian, and pointers have 64
-bits. The std::string, std::map and std::vector are those of libstdc++.
+codes of the module struct. A gap has only a code. Everything is little-endian, and pointers have 64
+bits. std::string, std::map and std::vector are those of libstdc++.
 """
 
 import collections
@@ -29,8 +29,8 @@ class Layout:
 
 STRING = Layout("std::string", "text:Q length:Q 16x")
 
-# A std::map of names to pools, then a std::vector of handles, the sharers. `root`, `first` and `last`
-# are in the end node of the tree, which has neither name nor pool.
+# A std::map from names to pools, then a std::vector of handles, the sharers. `root`, `first` and `last`
+# are in the end node of the tree, which has neither a name nor a pool.
 REGISTRY = Layout("OBR::MemPool::MgrRegistry",
                   "16x root:Q first:Q last:Q count:Q sharers:Q sharersEnd:Q 8x")
 TREE_END = 8  # The offset of that node.

@@ -1,7 +1,7 @@
-"""The bytes of the program that gdb looks at, live or a core, and the places of its registries.
+"""Reads the bytes of the program, live or a core, and finds its registries.
 
-Nothing here runs an instruction of the program. Memory that cannot be read is a Fault with its
-address, and so is every damage that the other files find.
+Nothing here runs code of the program. Memory that cannot be read raises a Fault with its address, as
+does every damage that the other files find.
 """
 
 import gdb
@@ -10,7 +10,7 @@ from . import layout
 
 
 class Fault(Exception):
-    """Something at an address is damaged. The text begins with the thing."""
+    """Something at an address is damaged. The text begins with what it is."""
 
     def __init__(self, text, address):
         super().__init__(text)
@@ -42,15 +42,15 @@ def read_string(data, what):
 
 
 def name_text(name):
-    """A pool's name to be shown. Bytes that are not UTF-8, and zeros, are escaped."""
+    """A pool's name, for display. Bytes that are not UTF-8, and zeros, are escaped."""
     return name.decode("utf-8", "backslashreplace").replace("\0", "\\x00")
 
 
 def registry_addresses():
     """The registries: one in each copy of the library that the program has.
 
-    The first is found by its name as the linker knows it, which needs no debug information and does
-    not depend on the language of the code where the program stands. Others need debug information.
+    The first is found by its symbol, which needs no debug information and does not depend on the
+    language of the current frame. The others need debug information.
     """
     if not gdb.selected_inferior().threads():
         raise gdb.GdbError("There is no program: run one, attach to one or load a core.")

@@ -1,7 +1,7 @@
-"""The library's objects as they lie in the program, and the ways through them.
+"""The library's objects in the program's memory, and the walks through them.
 
-An object reads its bytes when it is asked for them, and keeps them: it lives for one command. A way
-ends in a Fault where a link leads into memory that cannot be read, or back to where it has been.
+An object reads its bytes when they are first used, and keeps them: it lives for one command. A walk
+ends in a Fault if a link leads to memory that cannot be read, or runs in a circle.
 """
 
 import struct
@@ -35,7 +35,7 @@ class Structure:
 
 
 def follow(front, kind, link, what):
-    """The nodes of a list of that kind, from the front on."""
+    """The nodes of a list of that kind, from the front."""
     seen = set()
     address = front
     while address != 0:
@@ -74,14 +74,13 @@ class Bucket(Structure):
         return self.recs_base + max(self.size, layout.FIRST_OFFSET)
 
     def records(self):
-        """Its records with their bytes, which are read now."""
+        """Its records, with their bytes, which are read now."""
         return Records(self, memory.read(self.recs_base, self.size, "the records of a bucket"))
 
 
 class Records:
-    """The bytes of a bucket from recsBase on. A record is at each step from the first one that finds a
-    header, be it in an incomplete record at the end. A header outside of these bytes has an unknown
-    type and no link; its guard may be missing."""
+    """The bytes of a bucket from recsBase on. The last record may be incomplete if its header is whole;
+    only the guard may be missing. A header outside of these bytes has an unknown type and no link."""
 
     def __init__(self, bucket, data):
         self.bucket = bucket
@@ -105,18 +104,18 @@ class Records:
         return struct.unpack_from("<H", self.data, offset)[0] if self.has_header_at(offset) else 0
 
     def offsets(self):
-        """Of all records, in the order of memory. There is always a first."""
+        """The offsets of all records, in the order of memory. There is always at least one."""
         if self.rec_size == 0:
             return [layout.FIRST_OFFSET]
         return range(layout.FIRST_OFFSET, max(self.size, layout.FIRST_OFFSET + 1), self.rec_size)
 
     def count_used(self):
-        """The records whose type says so, without a look at each."""
+        """The number of records whose type is USED."""
         first_type = layout.FIRST_OFFSET + 2
         return self.data[first_type::self.rec_size or max(self.size, 1)].count(layout.TYPE_USED)
 
     def free_list(self):
-        """The offsets on the free list, up to and with the first that is no record's or comes again:
+        """The offsets on the free list. The last one may not be that of a record, or may be a repetition:
         the caller decides what that means."""
         seen = set()
         offset = self.bucket.freeHead
@@ -187,7 +186,7 @@ class Pool(Structure):
 
     @cached_property
     def groups(self):
-        if self.numGroups > layout.MAX_BUCKET_SIZE:  # No settings make as many.
+        if self.numGroups > layout.MAX_BUCKET_SIZE:  # No settings give so many.
             raise Fault(f"{self.numGroups} places for groups", self.address)
         addresses = struct.unpack(f"<{self.numGroups}Q", memory.read(
             self.row.groups, 8 * self.numGroups, "the table of groups"))
@@ -231,7 +230,7 @@ class Registry(Structure):
 
     @cached_property
     def sharers(self):
-        """The handles that were assigned to. Only they can have another pool than the one they made."""
+        """The handles that were assigned to. Only they can have a pool that they did not build."""
         size = self.row.sharersEnd - self.row.sharers
         if size % 8 != 0 or not 0 <= size < 2**32:
             raise Fault(f"the registry at {self.address:#018x}: its list of handles has no valid end",
@@ -241,7 +240,7 @@ class Registry(Structure):
 
 
 def all_pools():
-    """All pools that the registries lead to, and the Fault that ended the way, or None."""
+    """All pools in the registries, and the Fault that ended the walk, or None."""
     pools = []
     try:
         for registry in memory.registry_addresses():

@@ -32,7 +32,7 @@ class MgrPrinter:
 
 
 class BucketMgrPrinter:
-    """The same line, and the fields as the library's debug information has them."""
+    """The same line, and the fields from the library's debug information."""
 
     def __init__(self, value):
         self.value = value

@@ -1,5 +1,5 @@
-"""The text of a pool's report, exactly as the library writes it on a stream with default formatting,
-its oddities included. All arithmetic is in 32 bits.
+"""The text of a pool's report, exactly as the library writes it on a stream with default formatting.
+All arithmetic is in 32 bits.
 
 Every function yields pieces of the text in their order.
 """
@@ -82,7 +82,7 @@ def report(pool, detailed=False):
 
 
 class Figures:
-    """What a pool does not count itself."""
+    """The figures that a pool does not store."""
 
     def __init__(self, pool):
         self.num_buckets = u32(sum(group.numBuckets for group in pool.groups))
@@ -100,7 +100,7 @@ class Figures:
 
 
 def used_sizes(records):
-    """How many used records of each data size: one size or none."""
+    """The number of used records of each data size: one size or none."""
     count = records.count_used()
     return Counter({records.bucket.data_size: count} if count else {})
 

@@ -1,4 +1,4 @@
-"""What an address is: the pool, the bucket and the record that it lies in, and what is beside it.
+"""Describes an address: the pool, the bucket and the record that contain it, and their neighbours.
 
 A place is a range of memory that is known: a pool, its handle, its table, a group, a bucket or a heap
 record. Those of all pools are listed first, since the bytes before an address may be damaged.
@@ -19,7 +19,7 @@ def whois(address):
     faults = [str(fault)] if fault else []
     places = [place for pool in pools for place in places_of(pool, faults)]
 
-    # A host can keep a handle in a block of another pool: the smallest place comes first.
+    # A host can keep a handle in a block of another pool, so the smallest place comes first.
     inside = [place for place in places if place.start <= address < place.end]
     for place in sorted(inside, key=lambda place: place.end - place.start):
         before, after = neighbours(places, place.start, place.end)
@@ -48,7 +48,7 @@ def is_disabled(pool):
 
 
 def places_of(pool, faults):
-    """All places of a pool. A list is followed as long as its nodes are the pool's own."""
+    """All places of a pool. A list is followed as long as its nodes belong to the pool."""
     def place(start, end, name, thing=None):
         return Place(start, end, name, pool, thing)
 

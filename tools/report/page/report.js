@@ -1,10 +1,10 @@
-// Draws the page from the JSON in it. docs/report.md lists its keys. Names come from the trace, so
-// from anywhere: they become text, never markup.
+// Draws the page from the JSON in it. docs/report.md lists its keys. Names come from the trace and
+// cannot be trusted: they become text, never markup.
 "use strict";
 
 const data = JSON.parse(document.getElementById("data").textContent);
 
-// Numbers as in the text report: 1,234,567; three digits and a unit; a share in per cent.
+// Numbers as in the text report: 1,234,567; three digits and a unit; a share in percent.
 
 const count = (number) => number.toLocaleString("en-US");
 
@@ -20,7 +20,7 @@ function bytes(value) {
 
 const percent = (part, whole) => (whole === 0 ? "-" : (100 * part / whole).toFixed(1) + " %");
 
-// The same for an axis, without zeros at the end.
+// The same for an axis, without trailing zeros.
 const bytesTick = (value) => bytes(value).replace(/\.0+ |(\.\d*?)0+ /, "$1 ");
 const countTick = (value) =>
   value >= 1e9 ? value / 1e9 + " G" : value >= 1e6 ? value / 1e6 + " M" : count(value);
@@ -34,7 +34,7 @@ const sizeText = (row) =>
 const tracedPools = sum(data.groups.map((group) => group.pools));
 const colours = ["#4e79a7", "#f28e2b", "#59a14f", "#b07aa1", "#e15759", "#76b7b2", "#edc948", "#9c755f", "#ff9da7", "#9aa0a6"];
 
-// Without the arguments of templates, and if it is still too long, without its middle.
+// Removes template arguments and, if the name is still too long, its middle.
 function shortName(name, most) {
   for (let longer = ""; name.length > most && name !== longer;) {
     longer = name;
@@ -74,7 +74,7 @@ function tipFor(selection, text) {
     .on("mouseout", hideTip);
 }
 
-// An SVG as wide as its place, with a title and a description for those who do not see it.
+// An SVG as wide as its place, with a title and a description for screen readers.
 function chart(id, height, margin, title, description) {
   const place = byId(id);
   place.selectAll("*").remove();
@@ -103,7 +103,7 @@ function label(box, text, x, y, anchor) {
   box.plot.append("text").attr({x: x, y: y, "text-anchor": anchor || "start"}).text(text);
 }
 
-// The axis of time, in seconds if the trace has them and the reader wants them.
+// The axis of time, in seconds if the trace has them and the reader has chosen them.
 
 const hasSeconds = data.timeline.seconds.some((value) => value !== null);
 let unit = hasSeconds ? "seconds" : "event";
@@ -138,7 +138,7 @@ function legend(id, entries, draw) {
   });
 }
 
-// A table of plain text. A name may break.
+// A table of plain text. Long names may wrap.
 function table(id, heads, rows) {
   const place = byId(id);
   place.append("thead").append("tr").selectAll("th").data(heads).enter().append("th")
@@ -148,7 +148,7 @@ function table(id, heads, rows) {
   if (heads[0] === "Group") { breakable(place.selectAll("td:first-child").attr("class", "name")); }
 }
 
-// Says of a table that is wider than its place that it scrolls.
+// Marks a table that is wider than its place as scrollable.
 function markWide() {
   d3.selectAll(".scroll").classed("wide", function () { return this.scrollWidth > this.clientWidth; });
 }
@@ -199,12 +199,12 @@ function verdict() {
   };
   const heap = `the heap’s ${bytes(peak.heap_chunks)}`;
   const text = data.blocks === 0 ? "The trace has no block." :
-    `At the peak the program has asked for ${bytes(peak.asked)} in ${count(peak.blocks)} blocks${holders()}. ` +
+    `At the peak the program has requested ${bytes(peak.asked)} in ${count(peak.blocks)} blocks${holders()}. ` +
     (tracedPools > 1
       ? `A pool for each group would hold ${bytes(peak.pools)} for them, ${beside(peak.pools)} ${heap}; ` +
         `a single pool for all ${bytes(peak.one_pool)}, ${beside(peak.one_pool)} the heap.`
       : `Pools would hold ${bytes(peak.pools)} for them, ${beside(peak.pools)} ${heap}.`);
-  byId("verdict").text(text.replace(/(\d) /g, "$1\u00a0"));  // A number keeps its unit.
+  byId("verdict").text(text.replace(/(\d) /g, "$1\u00a0"));  // No line break before a unit.
 
   const tile = (name, path, show, note) => {
     const place = byId("tiles").append("div");
@@ -228,7 +228,7 @@ function verdict() {
     (data.settings.keep_empty_buckets ? "kept" : "released"));
 }
 
-// The groups at the peak, a bar each. Those that the chart of live bytes has too have its colours.
+// The groups at the peak, a bar each. Groups that are in the chart of live bytes have the same colour.
 
 function peakBars() {
   const shown = data.groups.filter((group, i) => i === 0 || group.at_peak.bytes >= 0.001 * data.peak.asked).slice(0, 12);
@@ -250,8 +250,8 @@ function peakBars() {
   byId("peak-note").text(shown.length < data.num_groups ? `The ${shown.length} largest of ${count(data.num_groups)}.` : "");
 }
 
-// Live bytes, the groups stacked, the largest at the bottom. Those that never hold a hundredth of the
-// peak are among the others.
+// Live bytes, the groups stacked, the largest at the bottom. Groups that never hold a hundredth of the
+// peak are part of the others.
 
 function growth() {
   const lines = data.growth;
@@ -283,7 +283,7 @@ function growth() {
   byId("growth-legend").selectAll("svg").attr("width", 12);
 }
 
-// A line at the point nearest to the pointer, with the figures of it.
+// A line at the point nearest to the pointer, with its figures.
 function pointer(box, at, lines) {
   const cursor = box.plot.append("line").attr({class: "cursor", y1: 0, y2: box.height}).style("display", "none");
   const move = function () {
@@ -296,10 +296,10 @@ function pointer(box, at, lines) {
     .on("mouseout", () => { cursor.style("display", "none"); hideTip(); });
 }
 
-// What is held. One pool for all is a line of its own if there are several pools.
+// The bytes held. If there are several pools, one pool for all has a line of its own.
 
 const series = [
-  {key: "asked", name: "Asked for", note: ", and in grey the range within each interval"},
+  {key: "asked", name: "Requested", note: ", and in grey the range within each interval"},
   {key: "heap_chunks", name: "Heap", note: ""},
   {key: "pools", name: tracedPools > 1 ? "Pools, one per group" : "Pools", note: ""},
   {key: "one_pool", name: "One pool for all", note: ""},
@@ -310,7 +310,7 @@ function timeline() {
   const highest = d3.max(series, (line) => d3.max(lines[line.key])) || 1;
   const box = chart("timeline", 320, {left: 62, right: 10, top: 22, bottom: 42},
     "What pools and the heap would hold",
-    `Asked for at the peak, event ${count(data.peak.event)}: ${bytes(data.peak.asked)}. ` +
+    `Requested at the peak, event ${count(data.peak.event)}: ${bytes(data.peak.asked)}. ` +
     `Pools hold ${bytes(data.peak.pools)} then, the heap ${bytes(data.peak.heap_chunks)}.`);
   const x = timeScale(box, unit);
   const y = d3.scale.linear().domain([0, highest]).nice().range([box.height, 0]);
@@ -334,7 +334,7 @@ function timeline() {
   box.plot.append("circle").attr({cx: px, cy: y(data.peak.asked), r: 4, fill: "var(--text)"});
   const top = y(d3.max(series, (line) => data.peak[line.key]));
   box.plot.append("text").attr({class: "mark", x: px + 8 * side, y: Math.max(top - 8, -8),
-    "text-anchor": side < 0 ? "end" : "start"}).text("peak: asked for " + bytes(data.peak.asked));
+    "text-anchor": side < 0 ? "end" : "start"}).text("peak: requested " + bytes(data.peak.asked));
 
   pointer(box, places, (i) => [`Event ${count(lines.event[i])}`].concat(series.map((line) =>
     `${line.name}: ${bytes(lines[line.key][i])}`), `Blocks: ${count(lines.blocks[i])}`));
@@ -443,8 +443,8 @@ function lifetimes() {
       (bin.kind === "never" ? "" : `\nuntil then ${percent(bin.within, data.blocks)}`));
 }
 
-// Fill of the size classes as a heat map, with the most that each held at its right. Classes that
-// never hold a hundredth of the bytes are left to the table.
+// Fill of the size classes as a heat map, with the maximum that each held on the right. Classes that
+// never hold a hundredth of the bytes are only in the table.
 
 function fillMap() {
   const columns = data.fill.event;
@@ -491,7 +491,7 @@ function fillMap() {
   place.append("span").text("· at the right: the most bytes in buckets");
 }
 
-// The groups, sorted by a column at a time.
+// The groups, sorted by one column.
 
 const groupColumns = [
   {name: "Group", value: (group) => group.name, text: (group) => group.name, isName: true},
@@ -546,7 +546,7 @@ function groupsTable() {
   place.append("thead").append("tr").selectAll("th").data(groupColumns).enter().append("th")
     .attr("scope", "col").append("button").attr("type", "button").text((column) => column.name)
     .on("click", (column, i) => {
-      // Names begin with A, figures with the largest.
+      // Names are sorted from A, figures from the largest.
       shown.ascending = shown.column === i ? !shown.ascending : Boolean(column.isName);
       shown.column = i;
       groups();
@@ -561,7 +561,7 @@ function groupsTable() {
 }
 
 function tables() {
-  const names = {asked: "Asked for", pools: "Pools, one per group", one_pool: "One pool for all", heap_chunks: "Heap", heap: "Heap, without its headers"};
+  const names = {asked: "Requested", pools: "Pools, one per group", one_pool: "One pool for all", heap_chunks: "Heap", heap: "Heap, without its headers"};
   table("held", ["", "At the peak", "Of the heap", "Most at any time"], Object.keys(names).map((key) =>
     [names[key], bytes(data.peak[key]), percent(data.peak[key], data.peak.heap_chunks), bytes(data.most[key])]));
   const rows = data.sizes.slice().sort((a, b) => b.blocks - a.blocks).slice(0, 40);
