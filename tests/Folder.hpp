@@ -1,4 +1,4 @@
-// A folder of a test run's own, which goes with it: two runs at once do not meet.
+// A temporary folder for one test run, so that two runs at once do not interfere.
 
 #ifndef OBR_TESTS_FOLDER_HPP
 #define OBR_TESTS_FOLDER_HPP

@@ -1,5 +1,5 @@
-// The measurements of a replay from within: on a clock of the test's own, which goes on by 1, 2, 3
-// and so on nanoseconds from one look to the next, and with a count of the heap.
+// The measurements of a replay, with a clock of the test's own, which advances by 1, 2, 3 and so on
+// nanoseconds per reading, and with the counters of the heap.
 
 #include "replay/Measure.hpp"
 

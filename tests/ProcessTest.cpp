@@ -79,7 +79,7 @@ TEST(Process, SettingsThatCannotMakeAPoolStop) {
         {4010, 4, 9, 9, crossed + "(12>8)"},
         {4010, 0, 7, 9, crossed + "(9>7)"},
         {3, 4, 0, 8, crossed + "(8>0)"},
-        {100, 4, 100, 200, tooLarge + "(100>96) [100]"},  // Both: the first test tells.
+        {100, 4, 100, 200, tooLarge + "(100>96) [100]"},  // Both: the first is reported.
     };
     for (const auto& row : rows) {
         const std::string line = "\nERROR:../s/MemPool: " + row.message + "\n";

@@ -1,7 +1,6 @@
-// WordPools as its users run it: commands in a folder of made texts, each with its
-// output, its standard error and its exit status, against expected/wordpools.txt. Times and memory
-// are no fixed figures: they are held against bounds. OBR_MEMPOOL_APPROVE makes the test write the
-// text anew.
+// WordPools as its users run it. Compares the output, the standard error and the exit status of
+// each command with expected/wordpools.txt, which OBR_MEMPOOL_APPROVE rewrites. Times and memory
+// vary and are compared with bounds.
 
 #include <sys/wait.h>
 #include <unistd.h>

@@ -1,6 +1,6 @@
 // `mempool advise` and `mempool replay --sweep` as their users run them, on a trace of a few
-// thousand blocks. Which settings win is the machine's affair; that the figures, what is said of
-// them and the lines to paste agree is not.
+// thousand blocks. Which settings win depends on the machine; the figures, the verdict and the
+// lines to paste must agree.
 
 #include <sys/wait.h>
 

@@ -1,4 +1,4 @@
-// Replays in child processes: their figures come back, and whatever they die of is told.
+// Replays in child processes: their figures are returned, or the reason why there are none.
 
 #include <sys/resource.h>
 #include <unistd.h>

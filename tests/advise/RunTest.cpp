@@ -1,5 +1,5 @@
-// `mempool run` on small programs of any machine: their output stays alone on the standard output,
-// their ends pass through, and the trace never has a name.
+// `mempool run` on small programs of any machine: standard output has only their output, their exit
+// statuses are kept, and the trace leaves no file.
 
 #include <sys/wait.h>
 
@@ -30,7 +30,7 @@ std::string Content(const std::string& path) {
     return {std::istreambuf_iterator<char>(file), {}};
 }
 
-// In a folder of its own for traces, which is empty behind the run as it was ahead of it.
+// With an empty folder for traces, which is empty again after the run.
 Ended Mempool(const std::string& arguments, const std::string& ahead = "") {
     const std::string folder = FolderPath() + "/traces";
     const std::string errors = FolderPath() + "/errors";

@@ -1,5 +1,5 @@
-// The search on a meter with costs that are made: it knows where the optimum lies, and time passes
-// by one unit a replay.
+// The search on a meter with made-up costs, which knows the optimum. Time advances by one unit per
+// replay.
 
 #include "advise/Search.hpp"
 
@@ -40,7 +40,7 @@ class MadeMeter final : public Advise::Meter {
 public:
     Outcome Time(const Side& side) override {
         const double noise = 1 + strays(random);
-        const double drift = ++numReplays > 100 ? 2 : 1;  // Halfway the machine gets slower.
+        const double drift = ++numReplays > 100 ? 2 : 1;  // The machine becomes slower halfway.
         return Answer(side, drift * noise * (side ? 10 + Distance(*side, fastest) : 14));
     }
     Outcome Held(const Side& side) override {
@@ -138,8 +138,8 @@ TEST(Search, GivesUpWhatFails) {
     EXPECT_THROW(Find(heapless, 1000), std::runtime_error);
 }
 
-// From the defaults to wherever steps lead: what makes no pool would stop the process. A minimum
-// that is not below the maximum stops one that has both from the environment.
+// All settings that can be reached from the defaults. Settings that no pool can have would end the
+// process, as would a minimum from the environment that is not below the maximum.
 TEST(Space, HasOnlySettingsThatCanBeSet) {
     std::set<decltype(Key({}))> known;
     std::vector<PoolSettings> open = Advise::CoarseGrid();

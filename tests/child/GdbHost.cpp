@@ -115,8 +115,8 @@ int main() {
     auto* const text = static_cast<char*>(overrun.Alloc(12));
     do { Ready(); } while (ReportIfAsked());
 
-    // The header of the next record goes, and with it the way to the free one behind. A library
-    // that checks its lists ends the process before it can crash: then the end is a crash.
+    // Damages the header of the next record, and with it the link to the free one after it. A
+    // library that checks its lists ends the process first, which is then turned into a crash.
     std::atexit(std::abort);
     for (int index = 0; index < 15; ++index) { text[index] = '\xFF'; }
     overrun.Alloc(12);

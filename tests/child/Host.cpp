@@ -1,5 +1,5 @@
-// A host that is linked to the library. It does not use the standard streams of C++, so that
-// nothing but the library makes them ready.
+// A host that is linked to the library. It does not use the standard streams of C++, so that only
+// the library initialises them.
 
 #include <MemPool>
 #include <cstdio>

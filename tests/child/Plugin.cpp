@@ -31,7 +31,7 @@ void Destroy(void* pool) {
     static_cast<Mgr*>(pool)->~Mgr();
 }
 
-// Shows the registry as each of its functions tells it.
+// Prints the registry through each of its functions.
 void ShowPools(const char* name) {
     std::vector<Mgr*> handles;
     OBR::vector<Mgr*> compact;

@@ -1,4 +1,4 @@
-// The account of pools and blocks, compared with what the library says of them.
+// Compares the accounts of pools and blocks with what the library reports.
 
 #include "Accounts.hpp"
 
@@ -136,8 +136,8 @@ void Accounts::CheckRegistry(const std::function<bool(const Mgr*)>& hasPool) con
 }
 
 Foreign MakeForeign(Bytes& bytes) {
-    // As far as a question may look for a header, past the tag of a Heap as well. All of it is 0
-    // but for the last 8 bytes ahead of the pointer.
+    // All bytes that a query may read as a header, including those before the tag of a Heap. They
+    // are 0 except for the last 8 bytes before the pointer.
     constexpr std::size_t farthest = 2 * 65600;
     constexpr std::size_t most = 8;
     static std::array<std::uint8_t, farthest + most> arena;
@@ -185,8 +185,8 @@ bool Sizes::CanMakePool() const {
 }
 
 std::uint8_t FillByte(Bytes& bytes) {
-    // Four of these two would look like a record's header, or a Heap's, to whoever asks about the
-    // middle of a block.
+    // Four bytes with either of these values would look like the header of a record or of a Heap's
+    // block in a query about the middle of a block.
     const std::uint8_t fill = bytes.Byte();
     return fill == 0x01 || fill == 0x5A ? std::uint8_t{0xF1} : fill;
 }

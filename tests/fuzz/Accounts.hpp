@@ -1,5 +1,5 @@
-// What must be so, told beside the library: which pools live, what they are called and whose they
-// are, and which blocks each has given out. Every block is filled with a byte of its own.
+// The expected state of the library: the living pools, their names and handles, and the blocks that
+// each has handed out. Every block is filled with a byte of its own.
 
 #ifndef OBR_TESTS_FUZZ_ACCOUNTS_HPP
 #define OBR_TESTS_FUZZ_ACCOUNTS_HPP
@@ -22,12 +22,12 @@ namespace Fuzz {
 using OBR::MemPool::Mgr;
 
 struct Block {
-    std::size_t size;       // As asked for.
+    std::size_t size;       // Requested.
     std::size_t alignment;  // Of a block of a Heap, else 1.
     std::size_t usable;     // As the pool says. All of these bytes are filled.
     std::uint8_t fill;
     std::size_t capacity;  // What Realloc leaves in place: `usable`, or more in a heap that is off.
-    std::size_t most;      // The pool may have been asked for this many bytes.
+    std::size_t most;      // The most bytes that the pool may have been asked for.
 };
 using Live = std::map<std::uint8_t*, Block>;
 
@@ -69,15 +69,15 @@ public:
     void WithBlockOfOther(Bytes& bytes, const Account* not_of,
                           const std::function<void(const Account&, std::uint8_t*)>& visit) const;
 
-    // The registry says what is told here. `hasPool` tells of a builder whether it has one.
+    // Checks that the registry agrees. `hasPool` says whether a builder has a pool.
     void CheckRegistry(const std::function<bool(const Mgr*)>& hasPool) const;
 
 private:
     std::vector<std::unique_ptr<Account>> all;
 };
 
-// A pointer that no pool handed out, to bytes that the input chooses. `isHeapRecord` tells whether
-// they look like the header of a heap record, of `length` bytes.
+// A pointer that no pool handed out, to bytes that the input chooses. `isHeapRecord` says whether
+// they look like the header of a heap record of `length` bytes.
 struct Foreign {
     std::uint8_t* data;
     bool looksLikeHeapRecord;
@@ -85,7 +85,7 @@ struct Foreign {
 };
 Foreign MakeForeign(Bytes& bytes);
 
-// Whether a header as of a heap record stands ahead of `data`.
+// Whether the bytes before `data` look like the header of a heap record.
 bool HasHeapRecordHeader(const std::uint8_t* data);
 
 // The settings that the process has, and whether they can make a pool. Otherwise Mgr would end the

@@ -1,4 +1,4 @@
-// The bytes of an input as a row of decisions. Behind its end all of them are 0.
+// The bytes of an input as a series of decisions. After its end all of them are 0.
 
 #ifndef OBR_TESTS_FUZZ_BYTES_HPP
 #define OBR_TESTS_FUZZ_BYTES_HPP

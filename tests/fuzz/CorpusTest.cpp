@@ -1,5 +1,5 @@
-// Runs a fuzz target on the inputs that are kept, and on some that a seeded generator makes: what
-// has found a fault once goes on being tried with any compiler.
+// Runs a fuzz target on the inputs that are kept, and on some that a seeded generator makes, so
+// that inputs that once found a fault are tried with every compiler.
 
 #include <cstddef>
 #include <cstdint>

@@ -1,5 +1,4 @@
-// What a target has beside its body where libFuzzer runs it: the first failure ends the process, so
-// that the input is kept.
+// Runs a target under libFuzzer: the first failure ends the process, so that the input is kept.
 
 #include <cstdlib>
 

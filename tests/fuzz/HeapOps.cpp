@@ -1,4 +1,5 @@
-// What a host does with a Heap and its blocks, by the calls of C, of C++ and of containers.
+// Operations of a host on a Heap and its blocks, through the calls for C, for C++ and for
+// containers.
 
 #include <MemPoolHeap>
 
@@ -17,7 +18,7 @@ using namespace OBR::MemPool;
 
 namespace {
 
-// What a pool is asked for at most for a block of a heap.
+// The most bytes that a heap requests from its pool for a block.
 std::size_t MostFor(std::size_t size, std::size_t alignment) {
     const std::size_t least = std::max<std::size_t>(size, 1);
     return alignment < 8 ? least : (least + 7) / 8 * 8 + alignment - 4;
@@ -29,7 +30,7 @@ std::size_t AlignmentAt(const void* address) {
     return bits & (0 - bits);
 }
 
-// In a heap that is off, what lies behind a block for the sake of its alignment counts as well.
+// In a disabled heap, the bytes after a block that its alignment leaves count too.
 std::size_t CapacityOf(const Heap& heap, const void* block) {
     return heap.GetMgr().IsEnabled() ? heap.UsableSize(block)
                                      : detail::PlainHeader::Of(block)->Capacity();
@@ -61,7 +62,7 @@ void World::StepOf(HeapPlace& place) {
     account.Check(false);
 }
 
-// With settings of its own or the process's. What cannot make a pool is refused.
+// With its own settings or those of the process. Settings that no pool can have are refused.
 void World::Build(HeapPlace& place) {
     const char* const name = Name();
     const std::uint8_t said = bytes.Byte();
@@ -303,7 +304,7 @@ void World::RefuseForeign(HeapPlace& place) {
     accounts.WithBlockOfOther(bytes, place.account, [&](const Account& other, std::uint8_t* data) {
         const std::size_t usable = other.live.at(data).usable;
         if (usable >= 4) { refuse(data + 4 + bytes.Byte() % (usable - 3), 0); }
-        // A heap record of another pool is not told from one of this.
+        // A heap record of another pool looks like one of this pool.
         const bool isHeapRecord = other.pool->enabled && HasHeapRecordHeader(other.RecordOf(data));
         if (!isHeapRecord) { refuse(data, 0); }
     });

@@ -1,4 +1,4 @@
-// What a host does with the blocks of a Mgr, and what it does wrong as far as that has an answer.
+// Operations of a host on the blocks of a Mgr, including errors that the library answers.
 
 #include <gtest/gtest.h>
 
@@ -37,7 +37,7 @@ void World::Alloc(Handle& handle) {
     constexpr std::uint32_t largestSize = 0x3FFFFFFF;
     std::uint32_t size = Size(account);
     void* data = nullptr;
-    if (bytes.Byte() == 0xFF) {  // More than there is.
+    if (bytes.Byte() == 0xFF) {  // More than the memory of the process.
         HeapSpy::refuseIn = 1;
         EXPECT_THROW(handle.mgr->Alloc(largestSize - size), std::bad_alloc);
         return;
@@ -72,8 +72,8 @@ void World::Free(Handle& handle) {
     }
 }
 
-// Null, pointers that nobody gave out, blocks of other pools and the middles of blocks. A disabled
-// pool frees whatever it is given.
+// Null, pointers that no pool handed out, blocks of other pools and the middles of blocks. A
+// disabled pool frees all of them.
 void World::AskAboutOthers(Handle& handle) {
     Mgr& mgr = *handle.mgr;
     const bool enabled = mgr.IsEnabled();
@@ -93,7 +93,7 @@ void World::AskAboutOthers(Handle& handle) {
         EXPECT_EQ(mgr.GetSize(data), size);
         if (enabled && !isHeapRecord) { EXPECT_FALSE(mgr.Free(data)); }
 
-        // Four bytes of the block itself lie ahead of these.
+        // Four bytes of the block itself lie before these.
         const std::size_t usable = other.live.at(data).usable;
         if (usable < 4) { return; }
         std::uint8_t* const inside = data + 4 + bytes.Byte() % (usable - 3);

@@ -1,5 +1,6 @@
-// The fuzz target of the library: a process with several pools and heaps over a heap that refuses
-// at times. After each step the pool touched is whole, and at the end nothing is left behind.
+// The fuzz target of the library: a process with several pools and heaps, whose memory comes from a
+// heap that sometimes refuses. After each step the touched pool is intact, and at the end nothing
+// is left.
 
 #include <cstddef>
 #include <cstdint>

@@ -1,6 +1,6 @@
-// The fuzz target of the readers and writers of traces. Any bytes are read to their end; in what
-// pieces they come, and whether they were compressed, makes no difference; what is written of a
-// trace reads as the trace; and the steps that are made of it fit together.
+// The fuzz target of the readers and writers of traces. Any bytes are read to their end. The result
+// does not depend on the pieces in which they come, nor on compression. A trace that is written
+// again reads the same. Its steps are consistent.
 
 #include <fcntl.h>
 #include <sys/mman.h>
@@ -56,7 +56,7 @@ std::unique_ptr<Trace::EventSource> Reader(std::string_view bytes, std::size_t p
     return Trace::MakeReader(std::move(input));
 }
 
-// An event that outlives the next one: its fields, as far as its kind has them, and its place.
+// An event that outlives the next one: the fields of its kind, and its place.
 struct Told {
     Kind kind;
     std::string line;  // As it is written.
@@ -197,7 +197,7 @@ std::string Compressed(std::string_view bytes) {
     return packed;
 }
 
-// A compressed trace gives the same events, and one that breaks off the first of them.
+// A compressed trace gives the same events, and one that is cut off gives the first of them.
 void ReadCompressed(std::string_view bytes, std::size_t numCut, const std::vector<Told>& events,
                     bool isSound) {
     std::string packed = Compressed(bytes);
@@ -223,8 +223,8 @@ std::string CompactOf(Trace::EventSource& source) {
     return file;
 }
 
-// The trace of these events in its compact form gives them again, and one that breaks off the first
-// of them, and says so.
+// The compact form of these events gives them again. If it is cut off, it gives the first of them,
+// and reports that.
 void ReadCompact(const std::string& compact, std::size_t numCut, const std::vector<Told>& events) {
     numCut %= compact.size();
     const std::string_view bytes(compact.data(), compact.size() - numCut);

@@ -25,7 +25,7 @@ public:
     World& operator=(const World&) = delete;
     ~World();
 
-    // One operation, and a look at what it touched.
+    // One operation, and a check of what it touched.
     void Step();
 
 private:
@@ -37,7 +37,7 @@ private:
         std::unique_ptr<obr_heap, decltype(&obr_heap_delete)> owner{nullptr, obr_heap_delete};
         OBR::MemPool::Heap* heap = nullptr;  // The owner's. It takes the calls of C and of C++.
         Account* account = nullptr;
-        std::size_t alignment = 8;  // Of blocks that ask for none.
+        std::size_t alignment = 8;  // Of blocks without a requested alignment.
     };
 
     // Settings, handles and names: WorldOps.cpp.

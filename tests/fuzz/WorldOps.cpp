@@ -1,5 +1,5 @@
-// The process: its settings, the pools that come and go, the handles that share them, their names
-// and their reports.
+// Operations on the process: settings, building and destroying pools, handles that share them,
+// names and reports.
 
 #include <algorithm>
 #include <iostream>
@@ -29,7 +29,7 @@ private:
     std::streambuf* const former;
 };
 
-// The number behind a label of a report.
+// The number after a label of a report.
 std::size_t Figure(const std::string& report, const std::string& label) {
     const std::size_t place = report.find(label);
     EXPECT_NE(place, std::string::npos) << label;
@@ -38,7 +38,7 @@ std::size_t Figure(const std::string& report, const std::string& label) {
 
 }  // namespace
 
-// Sizes that make a pool, so that short inputs get somewhere.
+// Sizes that a pool can have, so that short inputs reach more.
 World::World(Bytes& input) : bytes(input) {
     constexpr Sizes starts[] = {{4010, 4, 1000, 8}, {200, 4, 100, 8},  {103, 1, 50, 8},
                                 {300, 3, 90, 40},   {24, 4, 20, 20},   {4010, 16, 19, 4},
@@ -54,8 +54,8 @@ World::World(Bytes& input) : bytes(input) {
     Settings::off = (switches & 4) != 0;
 }
 
-// What is left at the end is walked whole. Pools that have lost all handles live until the process
-// ends; here they end by the steps that a handle would take.
+// The pools that are left at the end are walked completely. Pools that have lost all handles live
+// until the process ends; here they are destroyed by the steps that a handle would take.
 World::~World() {
     CheckRegistry();
     for (const auto& account : accounts.All()) {

@@ -1,5 +1,5 @@
-// A program to be recorded. Its argument says what it does; sizes from 70000 on tell its own blocks
-// from all others. It is linked to nothing of the project.
+// A program to be recorded. Its argument says what it does. Its own blocks have sizes from 70000
+// on. It links nothing of the project.
 
 #include <dlfcn.h>
 #include <malloc.h>
@@ -21,7 +21,7 @@
 
 namespace {
 
-// What lies here is used, whatever an optimiser thinks.
+// What is stored here counts as used for an optimiser.
 void* volatile sink = nullptr;
 volatile std::size_t tooMany = ~std::size_t{0};
 
@@ -174,7 +174,7 @@ void CountInterrupts() {
     std::printf("%d\n", static_cast<int>(number));
 }
 
-// Allocates now and then until it is killed.
+// Allocates from time to time until it is killed.
 void Run() {
     Use(70001);
     std::puts("ready");

@@ -1,5 +1,5 @@
-// `mempool record` on a program that does all that makes recording hard. What it did is told by the
-// trace as lines: "+70001" for a block allocated, "-70001" for it freed.
+// `mempool record` on a program that does everything that makes recording hard. The test reads the
+// trace as text: "+70001" for an allocated block, "-70001" for a freed one.
 
 #include <cstdlib>
 #include <map>
@@ -77,7 +77,7 @@ TEST(Record, TellsEachBlockOfOperatorNewOnce) {
               "+70016 -70016 ");
 }
 
-// With their order kept no block is allocated twice, and none is freed that is not there.
+// If the order is kept, no block is allocated twice, and none is freed that is not allocated.
 TEST(Record, KeepsTheOrderOfThreads) {
     const Recorded recorded = Record("threads", "--by thread");
     EXPECT_EQ(recorded.facts.at("threads"), "6");
@@ -93,7 +93,7 @@ TEST(Record, LeavesChildrenAlone) {
     EXPECT_EQ(Record("spawn").story, "+70000 +70001 -70001 ");
 }
 
-// What lived goes with the program, and callers are those of the new one.
+// The blocks of the old program are gone, and the callers are those of the new one.
 TEST(Record, FollowsAProgramThatBecomesAnother) {
     const Recorded exec = Record("exec", "--by caller");
     EXPECT_THAT(exec.story, testing::StartsWith("+70000 +70001 -70001 +70000 +70001 "));
@@ -122,7 +122,7 @@ TEST(Record, FollowsTheProgramToItsEnd) {
     EXPECT_EQ(ReadTrace("trace").story, "+70000 +70001 -70001 ");
 }
 
-// A signal that a user sends to mempool is the program's, and mempool ends like it.
+// A signal to mempool is forwarded to the program, and mempool ends in the same way.
 TEST(Record, DiesByTheSignalOfTheProgram) {
     Shell::Output("ln -sf " HOST " Host");
     EXPECT_EQ(Shell::Output(MEMPOOL " record -o trace ./Host run >out & "
@@ -152,7 +152,7 @@ TEST(Record, EstimatesTheShareOfTheAllocations) {
     const Recorded allocate = Record("allocate");
     const double share = std::stod(allocate.facts.at("allocation_share"));
     EXPECT_LT(std::stod(spin.at("allocation_share")), share / 3);
-    // A program that shares its core with another takes longer for all that it does beside.
+    // A program that shares its core with another one takes longer for its other work.
     EXPECT_GT(std::stod(spin.at("cpu_seconds")), 0.07);
     EXPECT_LT(std::stod(spin.at("cpu_seconds")), 0.2);
     // Half of the time is the recorder's, which does not count.
@@ -183,7 +183,7 @@ TEST(Record, PassesTheProgramOn) {
               "-o --by -- [x,y] \n");
 }
 
-// The program waits for room in a channel that is full, but not for a process that has gone.
+// The program waits for room in a full channel, but not for a process that has ended.
 TEST(Record, WaitsForRoom) {
     Shell::Output("ln -sf " HOST " Host; rm -f trace*");
     const std::string start = MEMPOOL " record -o trace ./Host stop >out & sleep 1; cat out; ";
@@ -203,7 +203,7 @@ TEST(Record, PassesAnInterruptOnOnce) {
                 HasSubstr("^C1\r\n"));
 }
 
-// What the recorder was killed with is a trace beside.
+// A killed recorder leaves a trace in the same folder.
 TEST(Record, LosesLittleWhenItIsKilled) {
     Shell::Output("ln -sf " HOST " Host; rm -f trace*");
     Shell::Output("exec 2>/dev/null; " MEMPOOL
@@ -215,7 +215,7 @@ TEST(Record, LosesLittleWhenItIsKilled) {
         "ls: cannot access 'trace': No such file or directory\n2\n");
 }
 
-// The file is written beside and then named, with the permissions of the one that was there.
+// A new file is written in the same folder and then renamed, with the permissions of the old one.
 TEST(Record, WritesTheTraceWholeOrNotAtAll) {
     Shell::Output("ln -sf " HOST
                   " Host; rm -f trace*; echo old >trace; chmod 640 trace; ln -s trace link");
@@ -267,7 +267,7 @@ TEST(Record, RefusesWhatCannotBeRecorded) {
     EXPECT_EQ(Shell::Output("PATH=. " MEMPOOL " record -o ./kept kept", 125),
               "mempool: ./kept: input and output are the same file\n");
     EXPECT_EQ(Shell::Output("cmp Host kept && ls kept*"), "kept\n");
-    // What fails on the way is told behind the program's end, which does not notice.
+    // A failure on the way is reported after the end of the program, which is not affected.
     EXPECT_THAT(refused("-o >(head -c 9 >/dev/null) sh -c 'sleep 0.2; echo on'", 125),
                 ContainsRegex("^on\nmempool: /dev/fd/[0-9]*: Broken pipe\n$"));
     if (geteuid() == 0) {

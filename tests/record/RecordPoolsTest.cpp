@@ -1,4 +1,4 @@
-// `mempool record --pools` beside the trace that the library itself writes of the same run.
+// `mempool record --pools`, compared with the trace that the library itself writes of the same run.
 
 #include <regex>
 #include <string>
@@ -17,7 +17,7 @@ TEST(RecordPools, TellsWhatTheLibraryTellsAndMore) {
     const std::string library =
         Shell::Output("NUV_OBR_MEMPOOL_TRACE=1 " MEMPOOL " record --pools -o trace " HOST, 3);
     const std::string lines = Shell::Output(MEMPOOL " text trace");
-    // The last release but one that the library's trace tells was refused.
+    // The last release but one in the library's trace was refused.
     const std::size_t refused = library.rfind("xmpt:f");
     ASSERT_NE(refused, std::string::npos);
     EXPECT_EQ(Without(lines, "xmpt:[nxit]:.*\n"),

@@ -1,4 +1,4 @@
-// Runs commands as users do, in a folder that goes with the test.
+// Runs commands as users do, in a temporary folder.
 
 #ifndef OBR_TESTS_RECORD_SHELL_HPP
 #define OBR_TESTS_RECORD_SHELL_HPP

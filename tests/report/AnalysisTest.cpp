@@ -1,5 +1,5 @@
-// The figures of a report compared with plain ones, each computed anew from the whole of a random
-// trace. What the model of the pools holds is compared with the pools themselves.
+// Compares the figures of a report with simple computations over whole random traces, and the model
+// of the pools with real pools.
 
 #include <algorithm>
 #include <array>
@@ -228,7 +228,7 @@ TEST(Analysis, AgreesWithPlainFigures) {
     EXPECT_EQ(equal.peak.event, 2U) << "The first of two equal peaks.";
 }
 
-// Runs are those of a traced pool, so the moves of each pool of a group are followed by themselves.
+// Runs are those of a traced pool, so the moves of each pool of a group are followed separately.
 TEST(Analysis, TellsWhatDiesTogether) {
     for (const unsigned int seed : {4U, 5U}) {
         const PlainTrace trace = MakeTrace(seed, 4000);
