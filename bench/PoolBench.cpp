@@ -3,7 +3,7 @@
 //     PoolBench --subject=NAME [Google Benchmark's options]
 //
 // pool, pool-keep (which keeps empty buckets) and pool-64k (buckets of 65535 bytes) are bare Mgrs,
-// layer is a Heap with such buckets. heap calls malloc and free or, with LD_PRELOAD, the allocator
+// layer is a Heap with its default settings. heap calls malloc and free or, with LD_PRELOAD, the allocator
 // that replaces them, so that every malloc is measured through the same two calls into a shared
 // library. boost, for blocks of one size, and pmr, the standard's pool for one thread, are headers.
 //
@@ -78,7 +78,7 @@ struct Pool {
 };
 
 struct Layer {
-    OBR::MemPool::Heap heap{nullptr, HeapSettings().On(true).BucketSize(65535)};
+    OBR::MemPool::Heap heap{nullptr, HeapSettings().On(true)};
     OBR::MemPool::Resource memory{heap};
     void* Alloc(unsigned size) { return heap.Allocate(size); }
     void Free(void* block, unsigned size) { heap.Deallocate(block, size); }

@@ -51,6 +51,7 @@ typedef struct obr_heap_settings {
     size_t min_record_size;  // Of the first size class. Includes 4 bytes of overhead.
     size_t data_alignment;   // Data sizes are rounded up to a multiple of it.
     size_t alignment;        // Of blocks: a power of two from 8 to 4096. Default: 8.
+    size_t limit;            // The maximum of bytes_held. Default: none.
 } obr_heap_settings;
 
 // What a heap holds at one moment. See HeapStats of <MemPoolHeap>.
@@ -64,6 +65,7 @@ typedef struct obr_heap_statistics {
     size_t heap_records;   // Blocks that come from operator new one by one.
     size_t bytes_held;     // Requested from operator new.
     size_t bytes_used;     // Of those, the bytes of blocks.
+    size_t bytes_peak;     // The maximum of bytes_held so far if there is a limit, else 0.
 } obr_heap_statistics;
 
 // Creates a heap. The text of `name` is copied; null gives it a name of its own. Null `settings`

@@ -94,7 +94,9 @@ TEST_F(HeapTest, KnowsTheMemoryOfAPool) {
     EXPECT_EQ(ReadAt<std::uint32_t>(&pool, format::poolMinRecord), pool.minRecordSize);
     EXPECT_EQ(ReadAt<bool>(&pool, format::poolKeepsEmpty), pool.keepEmptyBuckets);
     EXPECT_EQ(ReadAt<void*>(&pool, format::poolExtRecs), pool.extRecs);
-    static_assert(format::groupHead == offsetof(Group, head) &&
+    static_assert(format::bucketGroup == offsetof(Bucket, parent) &&
+                  format::groupHead == offsetof(Group, head) &&
+                  format::groupNumBuckets == offsetof(Group, numBuckets) &&
                   format::bucketNext == offsetof(Bucket, next1) &&
                   format::bucketSize == offsetof(Bucket, size) &&
                   format::bucketRecSize == offsetof(Bucket, recSize) &&
@@ -135,6 +137,31 @@ TEST_F(HeapTest, GoesOnInLargeBucketsWhereAClassIsLarge) {
     for (const auto& [block, size] : blocks) { ASSERT_TRUE(heap.Free(block)); }
     EXPECT_EQ(heap.GetStats().bytesHeld, 0);
     EXPECT_EQ(GetNumMgrs(), 3);
+}
+
+// What is given back makes room, and the peak is the most that was held at once.
+TEST_F(HeapTest, HoldsNoMoreThanItsLimit) {
+    constexpr std::size_t limit = 500000;
+    for (const bool on : {true, false}) {
+        Heap heap(nullptr, HeapSettings().On(on).Limit(limit));
+        const auto fill = [&](std::size_t size, std::size_t alignment) {
+            std::vector<void*> blocks;
+            while (void* const block = heap.Malloc(size, alignment)) { blocks.push_back(block); }
+            EXPECT_THROW(heap.Allocate(size, alignment), std::bad_alloc);
+            const HeapStats stats = heap.GetStats();
+            EXPECT_LE(stats.bytesHeld, limit);
+            EXPECT_GT(stats.bytesHeld, limit - 33000);
+            EXPECT_EQ(stats.bytesPeak, std::max(stats.bytesPeak, stats.bytesHeld));
+            return blocks;
+        };
+        for (void* const block : fill(5000, 8)) { heap.Free(block); }
+        EXPECT_EQ(heap.GetStats().bytesHeld, 0);
+        EXPECT_GT(heap.GetStats().bytesPeak, limit - 33000);
+        fill(3, 4);
+        heap.FreeAll();
+        fill(40, 16);
+        EXPECT_EQ(heap.Malloc(limit), nullptr);
+    }
 }
 
 TEST_F(HeapTest, RefusesWhatIsTooMuch) {

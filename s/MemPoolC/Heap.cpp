@@ -76,6 +76,7 @@ HeapSettings SettingsFrom(const obr_heap_settings* theirs) {
     Set(settings, &HeapSettings::MinRecordSize, known.min_record_size);
     Set(settings, &HeapSettings::DataAlignment, known.data_alignment);
     Set(settings, &HeapSettings::Alignment, known.alignment);
+    Set(settings, &HeapSettings::Limit, known.limit);
     return settings;
 }
 
@@ -174,7 +175,8 @@ bool obr_heap_stats(const obr_heap* heap, obr_heap_statistics* statistics) {
                                      stats.freeRecords,
                                      stats.heapRecords,
                                      stats.bytesHeld,
-                                     stats.bytesUsed};
+                                     stats.bytesUsed,
+                                     stats.bytesPeak};
     std::memcpy(statistics, &all, std::min(size, sizeof all));
     return true;
 }
