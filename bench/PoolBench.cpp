@@ -3,9 +3,10 @@
 //     PoolBench --subject=NAME [Google Benchmark's options]
 //
 // pool, pool-keep (which keeps empty buckets) and pool-64k (buckets of 65535 bytes) are bare Mgrs,
-// layer is a Heap with its default settings. heap calls malloc and free or, with LD_PRELOAD, the allocator
-// that replaces them, so that every malloc is measured through the same two calls into a shared
-// library. boost, for blocks of one size, and pmr, the standard's pool for one thread, are headers.
+// layer is a Heap with its default settings. heap calls malloc and free or, with LD_PRELOAD, the
+// allocator that replaces them, so that every malloc is measured through the same two calls into a
+// shared library. boost, for blocks of one size, and pmr, the standard's pool for one thread, are
+// headers.
 //
 // Each row is a function over a subject. Sizes, orders and traces are made before the clock starts.
 // The first byte of every block is written. The time is that of one operation: an Alloc, a Free, an
