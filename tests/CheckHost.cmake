@@ -1,7 +1,8 @@
-# Runs HOST on FILE, if any, with pools, with pools off and, where there is a STOCK program, with
-# --heap. All print the same, exit alike and, but for the figures, complain alike; and the STOCK
-# program, which reads FILE from its standard input, prints and exits so too. What comments of the
-# file say, "-- expect: TEXT" or "-- expect-error: TEXT", must be in the output or the errors.
+# Runs HOST on FILE, if any, with pools, with pools off and, if there is a STOCK program, with --heap.
+# The output, the exit status and, except for the figures, the errors must be the same. The STOCK
+# program, which reads FILE from its standard input, must have the same output and exit status. The
+# texts in comments of the file, "-- expect: TEXT" or "-- expect-error: TEXT", must be in the output or
+# the errors.
 
 cmake_minimum_required(VERSION 3.25)
 

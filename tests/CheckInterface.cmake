@@ -1,7 +1,7 @@
-# Compares what the shared library exports with the committed list of symbols, which the variable
-# OBR_MEMPOOL_APPROVE writes anew, and what it needs with the standard libraries. Takes NM, READELF,
-# LIBRARY, SONAME, EXPECTED, and ALLOWED: the names of further libraries that a build may need, each behind a
-# bar.
+# Compares the exports of the shared library with the committed list of symbols, which the variable
+# OBR_MEMPOOL_APPROVE rewrites, and the libraries that it needs with the standard libraries. Takes NM,
+# READELF, LIBRARY, SONAME, EXPECTED, and ALLOWED: the names of further libraries that a build may need,
+# each after a "|".
 
 cmake_minimum_required(VERSION 3.25)
 
@@ -10,7 +10,7 @@ execute_process(COMMAND ${NM} -D --defined-only ${LIBRARY}
 string(REGEX MATCHALL "[A-Za-z] [^ \n]+\n" symbols "${symbols}")
 list(TRANSFORM symbols STRIP)
 list(TRANSFORM symbols REPLACE "^V " "u ")  # clang++ does not make a static of an inline function unique.
-list(FILTER symbols EXCLUDE REGEX "^A ")  # The version by itself, which not every linker writes.
+list(FILTER symbols EXCLUDE REGEX "^A ")  # The version, which not every linker writes.
 list(JOIN symbols "\n" symbols)
 if(DEFINED ENV{OBR_MEMPOOL_APPROVE})
     file(WRITE ${EXPECTED} "${symbols}\n")

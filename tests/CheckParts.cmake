@@ -1,6 +1,6 @@
-# Configures the project as on a machine without the packages of its parts: each part is left out
-# with a status line, and stops with the same words where its option asks for it. Takes SOURCE,
-# BINARY, GENERATOR, MAKE and COMPILER.
+# Configures the project as on a machine without the packages of its parts. Each part must be left out
+# with a status line or, if its option is ON, stop with the same words. Takes SOURCE, BINARY, GENERATOR,
+# MAKE and COMPILER.
 
 cmake_minimum_required(VERSION 3.25)
 
@@ -9,7 +9,7 @@ foreach(package CLI11 ZLIB GTest benchmark Boost Lua SQLite3 LibXml2 Duktape Mru
 endforeach()
 set(options OBR_MEMPOOL_EXAMPLES OBR_MEMPOOL_TOOLS OBR_MEMPOOL_TESTS OBR_MEMPOOL_BENCH)
 
-# Configures with what `arguments` add and gives what is written, blanks made single, and the status.
+# Configures with `arguments`. Sets the output, with single blanks, and the status.
 function(configure arguments outputVariable)
     execute_process(
         COMMAND ${CMAKE_COMMAND} -S ${SOURCE} -B ${BINARY} -G ${GENERATOR} -DCMAKE_MAKE_PROGRAM=${MAKE}
@@ -28,7 +28,7 @@ endif()
 foreach(option ${options})
     set(line "-- ([^ ]+ cannot be built without the Debian packages: [a-z0-9 .-]+ \\(${option}\\))")
     if(NOT auto MATCHES "${line}")
-        message(SEND_ERROR "No line tells what ${option} lacks:\n${auto}")
+        message(SEND_ERROR "No line says what ${option} lacks:\n${auto}")
         continue()
     endif()
     set(words "${CMAKE_MATCH_1}")

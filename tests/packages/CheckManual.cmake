@@ -1,5 +1,5 @@
-# Holds the manual page PAGE of the program MEMPOOL against what the program says of itself: a part for
-# each subcommand and, there, an item for each option. Takes GZIP too.
+# Compares the manual page PAGE with the help of the program MEMPOOL: it must have a part for each
+# subcommand, with an item for each option. Takes GZIP too.
 
 cmake_minimum_required(VERSION 3.25)
 
@@ -14,7 +14,7 @@ function(words pattern text outputVariable)
     set(${outputVariable} "${found}" PARENT_SCOPE)
 endfunction()
 
-# What the program tells, as a string that is no list.
+# The output of the program, as a string that is not a list.
 function(help outputVariable)
     execute_process(COMMAND ${MEMPOOL} ${ARGN} --help
         OUTPUT_VARIABLE output COMMAND_ERROR_IS_FATAL ANY)
@@ -30,7 +30,7 @@ string(REGEX REPLACE ".*\nSubcommands:" "" all "${all}")
 words("\n  ([a-z-]+) " "${all}" subcommands)
 list(LENGTH subcommands number)
 if(number LESS 3)
-    message(SEND_ERROR "mempool tells only these subcommands: ${subcommands}")
+    message(SEND_ERROR "mempool lists only these subcommands: ${subcommands}")
 endif()
 foreach(subcommand IN LISTS subcommands)
     string(FIND "${page}" "\n.SS ${subcommand}\n" begin)

@@ -1,6 +1,6 @@
-# Runs PROGRAM (with its arguments, and INPUT as its standard input) by itself and on the preloaded
-# pools of LIBRARY: it prints, complains and exits alike, and has had blocks from the pool. REPORT is
-# the file where that is told.
+# Runs PROGRAM (with its arguments, and INPUT as its standard input) alone and on the preloaded pools of
+# LIBRARY. Output, errors and exit status must be the same, and the pool's report, in the file REPORT,
+# must count blocks.
 
 cmake_minimum_required(VERSION 3.25)
 
@@ -15,7 +15,7 @@ run(expected LC_ALL=C)
 if(expected STREQUAL "0: ")
     message(SEND_ERROR "${PROGRAM} prints nothing")
 endif()
-set(keep NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS=1)  # A report counts them when all blocks are back.
+set(keep NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS=1)  # So that the report counts them after all blocks are freed.
 foreach(settings NUV_OBR_MEMPOOL_BUCKET_SIZE=1004
         "NUV_OBR_MEMPOOL_BUCKET_SIZE=65535;NUV_OBR_MEMPOOL_MAX_RECORD_SIZE=4200")
     file(REMOVE ${REPORT})
