@@ -275,7 +275,7 @@ def main():
     text += ["## Single operations", "",
              "![Time per operation compared with glibc](performance.svg)", "",
              "pool is a bare `Mgr` with the default settings. pool-keep also keeps empty buckets, and",
-             "pool-64k has buckets of 65535 bytes. layer is a `Heap` with such buckets. All of them are called",
+             "pool-64k has buckets of 65535 bytes. layer is a `Heap` with its default settings. All are called",
              "through the dynamic linker, except boost and pmr, which are partly headers. boost serves only",
              "one size.", "",
              "Each row runs in a process of its own. Its heap is first made long, and a block at its end keeps",
