@@ -164,6 +164,19 @@ TEST_F(HeapTest, HoldsNoMoreThanItsLimit) {
     }
 }
 
+// If the heap gave memory back to the system, malloc's would end lower.
+TEST_F(HeapTest, KeepsMemoryForTheNextBlocks) {
+    Heap heap;
+    const void* end = nullptr;
+    for (int round = 0; round < 3; ++round) {
+        for (int i = 0; i < 100000; ++i) { heap.Malloc(40); }
+        if (round == 0) { end = sbrk(0); }
+        heap.FreeAll();
+        EXPECT_GE(sbrk(0), end);
+    }
+    EXPECT_LE(sbrk(0), static_cast<const char*>(end) + 500000);
+}
+
 TEST_F(HeapTest, RefusesWhatIsTooMuch) {
     constexpr std::size_t most = std::numeric_limits<std::size_t>::max();
     for (const bool off : {false, true}) {
