@@ -58,16 +58,16 @@ set(CPACK_DEBIAN_RUNTIME_PACKAGE_CONTROL_EXTRA
 # Empty, because each description starts with its own summary.
 set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "")
 string(JOIN "\n" about
-    "libObrMemPool gives C++ programs named pools for millions of small objects"
+    "libObrMemPool gives C++ and C programs named pools for millions of small objects"
     "that are dropped in groups. A block costs 4 to 8 bytes, is allocated and freed"
     "in constant time, and appears in reports of where the memory is."
     "" "")
 string(JOIN "\n" CPACK_DEBIAN_RUNTIME_DESCRIPTION
-    "named memory pools for C++ programs"
+    "named memory pools for C++ and C programs"
     "${about}This package contains the shared library, and the commands that gdb loads"
     "with it.")
 string(JOIN "\n" CPACK_DEBIAN_DEV_DESCRIPTION
-    "named memory pools for C++ programs - development files"
+    "named memory pools for C++ and C programs - development files"
     "${about}This package contains the headers, the static library, the files through"
     "which CMake and pkg-config find the library, and the documentation.")
 string(JOIN "\n" CPACK_DEBIAN_TOOLS_DESCRIPTION

@@ -30,7 +30,7 @@ HostFile ReadHostFile(const std::string& path) {
     HostFile host;
     host.isScript = elf_kind(elf.get()) != ELF_K_ELF;
     host.isSanitized = System::IsAddressSanitized(path);
-    host.namesLibrary = has("libObrMemPool.so");
+    host.namesLibrary = has("libObrMemPool.so") || has("libObrMemPoolC.so");
     // Every program that reads the settings itself contains the name of one.
     host.holdsLibrary = !host.namesLibrary && has("NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS");
     return host;
