@@ -18,7 +18,7 @@ namespace {
 Advise::Advice Advice(double bytes) {
     Advise::Advice advice;
     advice.program = {1000, 500, {}};
-    advice.findings = {{10, 0.1, 1000, 9}, {{{506, 128, 8, 16, true}, {5, 0.1, bytes, 9}}}, {}};
+    advice.findings = {{10, 0.1, 1000, 9}, {}, {{{506, 128, 8, 16, true}, {5, 0.1, bytes, 9}}}, {}};
     advice.verdict = Advise::Judge(advice.findings, advice.program);
     return advice;
 }
@@ -34,7 +34,7 @@ TEST(Advice, IsForOnePoolOrForThoseOfTheTrace) {
         Trace::StepReader reader(ReadLines(Lines("@c:P\n@a:P:X:24\n@c:Q\n@a:Q:Y:24\n")), "trace");
         const auto advice = Advise::TakeAdvice(reader, {Replay::Layer::Heap, mergesGroups, 0.1},
                                                [](const std::string&) {});
-        return advice.findings.settings.at(0).figures.bytesHeld;
+        return advice.findings.settings.at(0).figures.bytes;
     };
     EXPECT_NEAR(bytes(false), 2 * bytes(true), 300);
 }

@@ -54,13 +54,14 @@ TEST(Advise, TextFiguresVerdictAndEnvironmentAgree) {
 
     std::set<std::string> keys;
     for (const auto& [key, value] : advice.items()) { keys.insert(key); }
-    EXPECT_EQ(keys,
-              (std::set<std::string>{"layer", "events", "events_left_out", "heap", "settings",
-                                     "fastest", "smallest", "advised", "best", "verdict", "price",
-                                     "sentences", "environment", "allocation_share"}));
+    EXPECT_EQ(keys, (std::set<std::string>{"layer", "events", "events_left_out", "heap", "settings",
+                                           "fastest", "smallest", "advised", "best", "verdict",
+                                           "price", "sentences", "environment", "allocation_share",
+                                           "mimalloc", "stopped"}));
     EXPECT_EQ(advice["layer"], "heap");
     EXPECT_EQ(advice["events"], 6001);
     EXPECT_EQ(advice["events_left_out"], 0);
+    EXPECT_EQ(advice["stopped"], false);
     EXPECT_EQ(advice["allocation_share"], 0.25);
     const json& settings = advice["settings"];
     ASSERT_GE(settings.size(), 2U);
@@ -83,6 +84,14 @@ TEST(Advise, TextFiguresVerdictAndEnvironmentAgree) {
         EXPECT_EQ(std::to_string(advised["bucket_size"].get<unsigned int>()),
                   advice["environment"]["NUV_OBR_MEMPOOL_BUCKET_SIZE"]);
     }
+}
+
+TEST(Advise, PrintsWhatItHasWhenItIsStopped) {
+    const std::string path = TraceFile("long", Blocks(""));
+    const json advice = json::parse(
+        Command("timeout -s TERM 3 " MEMPOOL " advise --json --seconds 60 " + path, 124));
+    EXPECT_EQ(advice["stopped"], true);
+    EXPECT_GE(advice["settings"].size(), 1U);
 }
 
 TEST(Advise, SweepsSeveralTraces) {

@@ -13,6 +13,7 @@
 
 #include "advise/ForkedMeter.hpp"
 #include "advise/Space.hpp"
+#include "system/Interruption.hpp"
 
 using Advise::InChild;
 
@@ -47,6 +48,7 @@ TEST(InChild, TellsWhatTheChildDiedOf) {
         for (volatile int i = 0;;) { i = i + 1; }
     };
     EXPECT_EQ(ProblemOf(loop, 0.05), "too slow");
+    EXPECT_EQ(InChild(loop, 60, [] { return true; }).problem, "stopped");
     EXPECT_EQ(InChild([] { return usleep(200000) + 2.; }, 0.05).figure, std::optional(2.))
         << "To wait takes no time of the processor.";
 }
@@ -61,22 +63,26 @@ TEST(ForkedMeter, ReplaysWithTheSettingsAskedFor) {
     }
     recording.numBlocks = 1000;
     recording.peakSteps = recording.steps.size();
-    const Replay::PoolSettings before = Replay::PoolSettings::OfProcess();
+    const OBR::MemPool::PoolSettings before = OBR::MemPool::PoolSettings::OfProcess();
 
-    Advise::ForkedMeter meter(recording, Replay::Layer::Mgr);
-    EXPECT_NEAR(*meter.Held(std::nullopt).figure, 112000, 8000);
+    Advise::ForkedMeter meter(recording, Replay::Layer::Mgr, 60);
+    EXPECT_NEAR(*meter.Held(Advise::Malloc()).figure, 112000, 8000);
     const auto held = [&](unsigned int bucketSize, unsigned int alignment) {
-        return *meter.Held(Replay::PoolSettings{bucketSize, 500, 8, alignment, false}).figure;
+        return *meter.Held(OBR::MemPool::PoolSettings{bucketSize, 500, 8, alignment, false}).figure;
     };
     EXPECT_NEAR(held(506, 4), 250 * (4 * 104 + 56) + 1300, 2600);
     EXPECT_NEAR(held(65450, 4), 2 * 65500 + 1300, 1300);
     EXPECT_NEAR(held(65450, 64), 3 * 65500 + 500, 1500) << "128 bytes a block.";
-    for (const Advise::Side& side : {Advise::Side(), Advise::Side(Replay::PoolSettings())}) {
+    for (const Advise::Side& side : {Advise::Side(), Advise::Side(OBR::MemPool::PoolSettings())}) {
         const double ns = meter.Time(side).figure.value_or(0);
         EXPECT_TRUE(ns > 0.5 && ns < 1e5) << ns;
     }
     EXPECT_GT(meter.Elapsed(), 0);
-    EXPECT_EQ(Replay::PoolSettings::OfProcess().bucketSize, before.bucketSize);
+    EXPECT_FALSE(meter.IsStopped());
+    const System::Interruption interruption;
+    raise(SIGTERM);
+    EXPECT_TRUE(meter.IsStopped());
+    EXPECT_EQ(OBR::MemPool::PoolSettings::OfProcess().bucketSize, before.bucketSize);
     EXPECT_FALSE(OBR::MemPool::NUV_OBR_MEMPOOL_ON());
 }
 

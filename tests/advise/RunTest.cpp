@@ -54,7 +54,7 @@ TEST(Run, TellsBehindAProgramThatRunsAsEver) {
     EXPECT_EQ(sorted.status, 0);
     EXPECT_EQ(sorted.output, "b\na\n");
     for (const char* text : {"   program               sort -r\n", "by caller\n", "\n   SIZES",
-                             "BYTES HELD", "\n     heap ", " would "}) {
+                             "BYTES HELD", " heap  ", " would "}) {
         EXPECT_THAT(sorted.errors, HasSubstr(text));
     }
     if (HAS_PAGE) { EXPECT_THAT(Content(page), HasSubstr("</html>")); }

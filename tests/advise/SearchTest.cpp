@@ -19,7 +19,7 @@
 
 using Advise::Outcome;
 using Advise::Side;
-using Replay::PoolSettings;
+using OBR::MemPool::PoolSettings;
 
 namespace {
 
@@ -36,25 +36,39 @@ double Distance(const PoolSettings& a, const PoolSettings& b) {
            (a.keepEmptyBuckets != b.keepEmptyBuckets ? 1 : 0);
 }
 
+// Null for malloc and mimalloc.
+const PoolSettings* Pools(const Side& side) {
+    return std::get_if<PoolSettings>(&side);
+}
+
+double Cost(const Side& side, double malloc, double mimalloc, double best,
+            const PoolSettings& optimum) {
+    if (Pools(side) != nullptr) { return best + Distance(*Pools(side), optimum); }
+    return std::holds_alternative<Advise::Malloc>(side) ? malloc : mimalloc;
+}
+
 class MadeMeter final : public Advise::Meter {
 public:
     Outcome Time(const Side& side) override {
         const double noise = 1 + strays(random);
         const double drift = ++numReplays > 100 ? 2 : 1;  // The machine becomes slower halfway.
-        return Answer(side, drift * noise * (side ? 10 + Distance(*side, fastest) : 14));
+        return Answer(side, drift * noise * Cost(side, 14, 12, 10, fastest));
     }
     Outcome Held(const Side& side) override {
-        return Answer(side, side ? 1000 + 100 * Distance(*side, smallest) : 1300);
+        return Answer(side, 100 * Cost(side, 13, 12, 10, smallest));
     }
     double Elapsed() const override { return seconds; }
+    bool IsStopped() const override { return seconds >= mostSeconds; }
 
     std::function<bool(const Side&)> fails = [](const Side&) { return false; };
     double secondsPerReplay = 0.01;
+    double mostSeconds = 1e9;
     std::uniform_real_distribution<double> strays{-0.04, 0.04};
 
 private:
     Outcome Answer(const Side& side, double figure) {
         seconds += secondsPerReplay;
+        if (IsStopped()) { return {std::nullopt, "stopped"}; }
         return fails(side) ? Outcome{std::nullopt, "made to fail"} : Outcome{figure, ""};
     }
 
@@ -75,7 +89,7 @@ Advise::Findings Find(MadeMeter& meter, double seconds) {
     std::set<decltype(Key({}))> tried;
     for (const auto& each : findings.settings) {
         EXPECT_TRUE(tried.insert(Key(each.settings)).second) << "No setting comes twice.";
-        EXPECT_NEAR(each.figures.bytesHeld, 1000 + 100 * Distance(each.settings, smallest), 1e-6);
+        EXPECT_NEAR(each.figures.bytes, 1000 + 100 * Distance(each.settings, smallest), 1e-6);
     }
     return findings;
 }
@@ -90,14 +104,16 @@ TEST(Search, FindsTheOptimaWithoutTryingAll) {
     EXPECT_EQ(Key(findings.settings.front().settings), Key(PoolSettings()));
     EXPECT_LT(findings.settings.size(), 120U) << "Of thousands.";
     // The machine is twice as slow for most of the time, but for the settings as for the heap.
-    EXPECT_NEAR(findings.heap.nsPerEvent, 28, 1);
+    EXPECT_NEAR(findings.heap.time, 28, 1);
     for (const auto& each : findings.settings) {
-        EXPECT_NEAR(each.figures.nsPerEvent, 2 * (10 + Distance(each.settings, fastest)), 2.5);
+        EXPECT_NEAR(each.figures.time, 2 * (10 + Distance(each.settings, fastest)), 2.5);
         EXPECT_GE(each.figures.rounds, 3U);
-        EXPECT_TRUE(each.figures.nsSpread > 0 && each.figures.nsSpread < 3);
+        EXPECT_TRUE(each.figures.spread > 0 && each.figures.spread < 6);
     }
-    EXPECT_TRUE(findings.heap.nsSpread > 0 && findings.heap.nsSpread < 3);
+    EXPECT_TRUE(findings.heap.spread > 0 && findings.heap.spread < 3);
     EXPECT_GE(best.figures.rounds, 15U);
+    EXPECT_NEAR(findings.mimalloc.value().time, 24, 2);
+    EXPECT_EQ(findings.mimalloc->bytes, 1200);
 }
 
 TEST(Search, KeepsToItsTime) {
@@ -105,10 +121,13 @@ TEST(Search, KeepsToItsTime) {
         MadeMeter meter;
         meter.secondsPerReplay = 1;
         meter.strays = std::uniform_real_distribution<double>(0, 1e-9);
+        meter.mostSeconds = 1.4 * seconds;
         const Advise::Findings findings = Find(meter, seconds);
-        EXPECT_LT(meter.Elapsed(), seconds + 25);
+        EXPECT_LE(meter.Elapsed(), 1.4 * seconds + 5) << "What is begun when time is out.";
         EXPECT_GT(meter.Elapsed(), 0.9 * seconds);
+        EXPECT_TRUE(findings.givenUp.empty());
         const Advise::Verdict verdict = Advise::Judge(findings, {1000, 0, {}});
+        if (seconds < 30) { continue; }
         EXPECT_GE(findings.settings.at(*verdict.fastest).figures.rounds, 3U) << seconds;
         EXPECT_GE(findings.settings.at(*verdict.smallest).figures.rounds, 3U) << seconds;
     }
@@ -121,7 +140,7 @@ TEST(Search, TakesLongTracesWhole) {
 
 TEST(Search, GivesUpWhatFails) {
     MadeMeter meter;
-    meter.fails = [](const Side& side) { return side && side->keepEmptyBuckets; };
+    meter.fails = [](const Side& side) { return Pools(side) && Pools(side)->keepEmptyBuckets; };
     const Advise::Findings findings = Find(meter, 1000);
     EXPECT_FALSE(findings.givenUp.empty());
     for (const auto& each : findings.settings) { EXPECT_FALSE(each.settings.keepEmptyBuckets); }
@@ -130,11 +149,11 @@ TEST(Search, GivesUpWhatFails) {
     // The last one to lead fails in a later round, when all others have failed.
     MadeMeter late;
     unsigned int number = 0;
-    late.fails = [&](const Side& side) { return side && ++number > 40; };
+    late.fails = [&](const Side& side) { return Pools(side) && ++number > 40; };
     EXPECT_TRUE(Find(late, 1000).settings.empty());
 
     MadeMeter heapless;
-    heapless.fails = [](const Side& side) { return !side; };
+    heapless.fails = [](const Side& side) { return !Pools(side); };
     EXPECT_THROW(Find(heapless, 1000), std::runtime_error);
 }
 

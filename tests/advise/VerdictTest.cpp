@@ -19,12 +19,12 @@ struct Setting {
     double ns;
     double bytes;
     double spread = 0.1;
-    Replay::PoolSettings settings = {4010, 1000, 8, 4, true};
+    OBR::MemPool::PoolSettings settings = {4010, 1000, 8, 4, true};
 };
 
 Advise::Verdict Judge(const std::vector<Setting>& settings,
                       const Advise::Program& program = {1000, 0, {}}) {
-    Advise::Findings findings{{10, 1, 1000, 9}, {}, {}};
+    Advise::Findings findings{{10, 1, 1000, 9}, {}, {}, {}};
     for (const Setting& each : settings) {
         findings.settings.push_back({each.settings, {each.ns, each.spread, each.bytes, 9}});
     }
@@ -77,8 +77,8 @@ TEST(Verdict, APriceMustBeWorthIt) {
 }
 
 TEST(Verdict, TheFewestChangesWinAmongEquals) {
-    const Replay::PoolSettings defaults = {4010, 1000, 8, 4, false};
-    const Replay::PoolSettings far = {2010, 500, 16, 8, true};
+    const OBR::MemPool::PoolSettings defaults = {4010, 1000, 8, 4, false};
+    const OBR::MemPool::PoolSettings far = {2010, 500, 16, 8, true};
     Expect({{5, 1000, 0.5, far}, {5.4, 1000, 0.1, defaults}}, 1, 1, "faster");
     Expect({{5, 1000, 0.3, far}, {5.4, 1000, 0.1, defaults}}, 0, 0, "faster");
 }
@@ -97,7 +97,8 @@ TEST(Verdict, CountsWhatTheProgramWouldNotice) {
     expect({5, 1000}, 0.02, "faster", "Pools would help: they");
     expect({5, 1100}, 0.02, "faster", "Pools would help, at a price: they");
     expect({5, 1100}, 0.018, "none",
-           "The program would not notice: pools would save 0.9 % of its time.");
+           "Allocation calls take an estimated 1.8 % (+/- 0.5 %) of the program's time: it would "
+           "not notice that pools save 0.9 %, unless");
     expect({5, 900}, 0.018, "smaller",
            "Pools would help: they take 0.50 of the heap's time (which the program would not");
     expect({12, 800}, 0.018, "smaller", "Pools would help: they take 1.20");
@@ -108,20 +109,41 @@ TEST(Verdict, CountsWhatTheProgramWouldNotice) {
 }
 
 TEST(Verdict, SaysWhatTheFiguresMeanForTheProgram) {
-    EXPECT_EQ(Judge({{6, 1000}}, {1000, 0, 0.12}).sentences.at(1),
-              "Allocation calls take about 12 % of the program's time: with pools the program "
-              "would take about 95 %.");
     EXPECT_EQ(
-        Judge({}, {1000, 500, 0.05}).sentences,
+        Judge({{6, 1000}}, {1000, 0, 0.12}).sentences.at(1),
+        "Allocation calls take an estimated 12 % (+/- 3.6 %) of the program's time: with pools "
+        "the program would take about 95 %, not counting what the places of its blocks "
+        "change.");
+    EXPECT_EQ(
+        Judge({{10, 1000}}, {1000, 500, 0.05}).sentences,
         (std::vector<std::string>{
             "Pools would not help: no settings gain more than the spread of the runs and "
             "more than they cost.",
             "Only the first 1000 of 1500 events were replayed; a larger --seconds covers more.",
-            "Allocation calls take about 5.0 % of the program's time."}));
+            "Allocation calls take an estimated 5.0 % (+/- 1.5 %) of the program's time."}));
+    EXPECT_THAT(Judge({}).sentences.front(), StartsWith("Too few replays for a verdict"));
     EXPECT_EQ(Advise::ShareOf("0.125"), std::optional(0.125));
     for (const char* text : {"", "x", "-0.1", "1.1", "0.5 ", "nan"}) {
         EXPECT_EQ(Advise::ShareOf(text), std::nullopt) << text;
     }
+}
+
+TEST(Verdict, SaysWhenMimallocHelpsMore) {
+    const auto helps = [](const Advise::Figures& mimalloc,
+                          const std::vector<Advise::Measured>& pools) {
+        const auto verdict = Advise::Judge({{10, 1, 1000, 9}, mimalloc, pools, {}}, {1000, 0, 0.5});
+        const bool isSaid = verdict.sentences.back() ==
+                            "Preloaded mimalloc would help more: it takes 0.60 of the heap's time "
+                            "and 1.00 of its bytes.";
+        EXPECT_EQ(isSaid, verdict.isMimallocBetter);
+        return isSaid;
+    };
+    const std::vector<Advise::Measured> pools = {{{}, {8, 0.1, 1000, 9}}};
+    EXPECT_TRUE(helps({6, 0.1, 1000, 9}, pools));
+    EXPECT_TRUE(helps({6, 0.1, 1000, 9}, {}));
+    EXPECT_FALSE(helps({6, 0.1, 1000, 2}, pools)) << "Of two rounds.";
+    EXPECT_FALSE(helps({6, 0.1, 1100, 9}, pools)) << "At a price.";
+    EXPECT_FALSE(helps({6, 2.1, 1000, 9}, pools)) << "Within the spread.";
 }
 
 TEST(Quantile, LiesBetweenTheNearestTwo) {
@@ -131,7 +153,7 @@ TEST(Quantile, LiesBetweenTheNearestTwo) {
 }
 
 TEST(Verdict, SettingsArePastedAsEnvironmentAndAsCode) {
-    const Replay::PoolSettings settings = {2010, 500, 16, 8, true};
+    const OBR::MemPool::PoolSettings settings = {2010, 500, 16, 8, true};
     std::string variables;
     for (const auto& [name, value] : Advise::EnvironmentOf(settings)) {
         variables += name.substr(name.find("_ME")) + "=" + value + " ";
@@ -146,6 +168,9 @@ TEST(Verdict, SettingsArePastedAsEnvironmentAndAsCode) {
               "OBR::MemPool::HeapSettings()    .On(true)    .BucketSize(2010)    "
               ".MaxRecordSize(500)    .MinRecordSize(16)    .DataAlignment(8)    "
               ".KeepEmptyBuckets(true)");
+    EXPECT_EQ(Advise::CodeOf({4010, 1000, 8, 8, false}, Replay::Layer::Heap).back(),
+              "    .DataAlignment(8)")
+        << "The defaults are left out.";
     EXPECT_EQ(Advise::CodeOf(settings, Replay::Layer::Mgr).at(1),
               "OBR::MemPool::NUV_OBR_MEMPOOL_BUCKET_SIZE(2010);");
 }

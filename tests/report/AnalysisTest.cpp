@@ -31,7 +31,7 @@
 
 namespace {
 
-using Replay::PoolSettings;
+using OBR::MemPool::PoolSettings;
 
 constexpr PoolSettings usual = {4010, 1000, 8, 4, false};
 

@@ -8,6 +8,7 @@
 #include "advise/ForkedMeter.hpp"
 #include "advise/Search.hpp"
 #include "replay/Recording.hpp"
+#include "system/Interruption.hpp"
 
 namespace Advise {
 
@@ -27,11 +28,14 @@ Advice TakeAdvice(Trace::StepReader& reader, const Question& question,
     advice.program.numLeftOut = recording.numLeftOut;
     const auto share = reader.Facts().find("allocation_share");
     if (share != reader.Facts().end()) { advice.program.allocationShare = ShareOf(share->second); }
-    ForkedMeter meter(recording, question.layer);
+    const System::Interruption interruption;
+    constexpr double mostOfTime = 1.4;  // After that no measurement is waited for.
+    ForkedMeter meter(recording, question.layer, mostOfTime * question.seconds);
     advice.findings = Search(meter, question.seconds, [&](std::size_t numTried) {
         show(fmt::format("{} settings tried, {:.0f} s of about {}", numTried, meter.Elapsed(),
                          question.seconds));
     });
+    advice.isStopped = System::Interruption::Signal() != 0;
     advice.verdict = Judge(advice.findings, advice.program);
     return advice;
 }

@@ -18,6 +18,7 @@ struct Advice {
     Program program;
     Findings findings;
     Verdict verdict;
+    bool isStopped = false;  // By the user, before the search was done.
 };
 
 struct Question {
@@ -26,8 +27,8 @@ struct Question {
     double seconds = 30;        // The approximate time of the search.
 };
 
-// Reads the trace and searches. Calls `show` with a line of progress from time to time. Throws a
-// std::runtime_error if the trace has no allocation.
+// Reads the trace and searches; from then on, SIGINT and SIGTERM end the search. Calls `show` with
+// a line of progress from time to time. Throws a std::runtime_error if the trace has no allocation.
 Advice TakeAdvice(Trace::StepReader& reader, const Question& question,
                   const std::function<void(const std::string&)>& show);
 

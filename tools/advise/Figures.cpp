@@ -1,13 +1,14 @@
 #include "advise/Figures.hpp"
 
 #include <algorithm>
+#include <cmath>
 #include <cstddef>
 
 namespace Advise {
 
 double Cost(const Figures& figures, const Figures& heap, Aim aim) {
-    const double time = figures.nsPerEvent / heap.nsPerEvent;
-    const double bytes = figures.bytesHeld / heap.bytesHeld;
+    const double time = figures.time / heap.time;
+    const double bytes = figures.bytes / heap.bytes;
     switch (aim) {
         case Aim::Time:
             return time;
@@ -16,6 +17,11 @@ double Cost(const Figures& figures, const Figures& heap, Aim aim) {
         default:
             return time * bytes;
     }
+}
+
+bool DifferInTime(const Figures& a, const Figures& b) {
+    return std::min(a.rounds, b.rounds) >= leastRounds &&
+           std::abs(a.time - b.time) > std::max(a.spread, b.spread);
 }
 
 double Quantile(std::vector<double> values, double share) {

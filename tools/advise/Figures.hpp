@@ -4,34 +4,35 @@
 #define OBR_TOOLS_ADVISE_FIGURES_HPP
 
 #include <array>
-#include <cstdint>
+#include <optional>
 #include <string>
 #include <vector>
 
-#include "replay/PoolSettings.hpp"
+#include <MemPoolSettings>
 
 namespace Advise {
 
 struct Figures {
-    double nsPerEvent = 0;  // The median of the rounds.
-    double nsSpread = 0;    // Between the lower and the upper quartile; 0 for a single round.
-    double bytesHeld = 0;   // At the peak.
+    double time = 0;    // Nanoseconds per event, or seconds of a program: the median of the rounds.
+    double spread = 0;  // Of the time, between the lower and the upper quartile.
+    double bytes = 0;   // At the peak.
     unsigned int rounds = 0;
 };
 
 struct Measured {
-    Replay::PoolSettings settings;
+    OBR::MemPool::PoolSettings settings;
     Figures figures;
 };
 
 struct GivenUp {
-    Replay::PoolSettings settings;
+    OBR::MemPool::PoolSettings settings;
     std::string problem;
 };
 
 struct Findings {
     Figures heap;
-    std::vector<Measured> settings;  // The first are the defaults, unless they were given up.
+    std::optional<Figures> mimalloc;  // None if it is not installed.
+    std::vector<Measured> settings;   // The first are the defaults, unless they were given up.
     std::vector<GivenUp> givenUp;
 };
 
@@ -42,6 +43,12 @@ inline constexpr std::array<Aim, 3> aims = {Aim::Both, Aim::Time, Aim::Bytes};
 
 // The ratio to the heap: below 1 is better than the heap, and less is better.
 double Cost(const Figures& figures, const Figures& heap, Aim aim);
+
+// Fewer rounds show no difference.
+inline constexpr unsigned int leastRounds = 3;
+
+// Whether the times differ by more than the spread of either.
+bool DifferInTime(const Figures& a, const Figures& b);
 
 // The value below which the share `share` of the values lies, interpolated between the nearest two.
 // There must be at least one value.

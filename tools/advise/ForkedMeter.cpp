@@ -26,6 +26,7 @@
 #include <MemPool>
 
 #include "replay/Measure.hpp"
+#include "system/Interruption.hpp"
 
 namespace Advise {
 
@@ -68,14 +69,15 @@ double ProcessorSeconds(pid_t child) {
     return static_cast<double>(used.tv_sec) + 1e-9 * static_cast<double>(used.tv_nsec);
 }
 
-// Waits until the child writes its figure or ends. False if it uses more processor time than that,
-// which is checked from time to time. A timer in the child would be simpler, but makes Linux count
-// the time of the process in coarse ticks.
-bool EndsInTime(pid_t child, int result, double processorSeconds) {
+// Waits until the child writes its figure or ends. False if it is stopped or uses more processor
+// time than that, which is checked from time to time. A timer in the child would be simpler, but
+// makes Linux count the time of the process in coarse ticks.
+bool EndsInTime(pid_t child, int result, double processorSeconds,
+                const std::function<bool()>& isStopped) {
     constexpr int milliseconds = 20;
     pollfd pipe = {result, POLLIN, 0};
     while (poll(&pipe, 1, milliseconds) <= 0) {
-        if (ProcessorSeconds(child) > processorSeconds) { return false; }
+        if (ProcessorSeconds(child) > processorSeconds || isStopped()) { return false; }
     }
     return true;
 }
@@ -95,7 +97,8 @@ double Outcome::OrFail(const std::string& text) const {
     return *figure;
 }
 
-Outcome InChild(const std::function<double()>& work, double processorSeconds) {
+Outcome InChild(const std::function<double()>& work, double processorSeconds,
+                const std::function<bool()>& isStopped) {
     int ends[2];
     if (pipe2(ends, O_CLOEXEC) != 0) { throw std::system_error(errno, std::generic_category()); }
     const pid_t child = fork();
@@ -106,20 +109,22 @@ Outcome InChild(const std::function<double()>& work, double processorSeconds) {
         close(ends[0]);
         throw std::system_error(error, std::generic_category(), "no process for a replay");
     }
-    const bool isTooSlow = !EndsInTime(child, ends[0], processorSeconds);
-    if (isTooSlow) { kill(child, SIGKILL); }
+    const bool isCut = !EndsInTime(child, ends[0], processorSeconds, isStopped);
+    if (isCut) { kill(child, SIGKILL); }
     const std::optional<double> figure = ReadFigure(ends[0]);
     close(ends[0]);
     int status = 0;
     while (waitpid(child, &status, 0) < 0 && errno == EINTR) {}
     if (figure.has_value() && status == 0) { return {figure, ""}; }
-    if (isTooSlow) { return {std::nullopt, "too slow"}; }
+    if (isCut) { return {std::nullopt, isStopped() ? "stopped" : "too slow"}; }
     return {std::nullopt, ProblemOf(status)};
 }
 
-ForkedMeter::ForkedMeter(const Replay::Recording& replayed, Replay::Layer measured, double limit)
+ForkedMeter::ForkedMeter(const Replay::Recording& replayed, Replay::Layer measured, double seconds,
+                         double limit)
     : recording(replayed),
       layer(measured),
+      mostSeconds(seconds),
       mostOfHeapTime(limit),
       start(std::chrono::steady_clock::now()) {
 #ifdef __GLIBC__
@@ -127,7 +132,7 @@ ForkedMeter::ForkedMeter(const Replay::Recording& replayed, Replay::Layer measur
 #endif
     // The number is the same for all measurements, since the first replay in a process is slower
     // than the others.
-    const Outcome one = Time(std::nullopt);
+    const Outcome one = Time(Malloc());
     const double length = one.figure.value_or(0) * static_cast<double>(recording.steps.size());
     if (length > 0) {
         numReplays = static_cast<unsigned int>(std::ceil(leastNanoseconds / length));
@@ -135,20 +140,18 @@ ForkedMeter::ForkedMeter(const Replay::Recording& replayed, Replay::Layer measur
 }
 
 Outcome ForkedMeter::Time(const Side& side) {
-    return Run(side, [&] {
+    return Run(side, [&](Replay::Layer replayed) {
         double total = 0;
         for (unsigned int replay = 0; replay < numReplays; ++replay) {
-            total += side.has_value() ? Replay::PoolNanosecondsPerEvent(recording, layer)
-                                      : Replay::HeapNanosecondsPerEvent(recording);
+            total += Replay::NanosecondsPerEvent(recording, replayed);
         }
         return total / numReplays;
     });
 }
 
 Outcome ForkedMeter::Held(const Side& side) {
-    return Run(side, [&] {
-        return static_cast<double>(side.has_value() ? Replay::BytesHeldByPools(recording, layer)
-                                                    : Replay::BytesHeldByHeap(recording));
+    return Run(side, [&](Replay::Layer replayed) {
+        return static_cast<double>(Replay::BytesHeld(recording, replayed));
     });
 }
 
@@ -156,19 +159,25 @@ double ForkedMeter::Elapsed() const {
     return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
 }
 
-Outcome ForkedMeter::Run(const Side& side, const std::function<double()>& work) {
-    if (side.has_value()) {
-        return InChild(
-            [&] {
-                Replay::UsePools(*side);
-                return work();
-            },
-            std::max(leastLimit, mostOfHeapTime * heapSeconds));
-    }
-    const auto before = std::chrono::steady_clock::now();
-    Outcome outcome = InChild(work, limitOfHeap);
-    const std::chrono::duration<double> taken = std::chrono::steady_clock::now() - before;
-    heapSeconds = std::max(heapSeconds, taken.count());
+bool ForkedMeter::IsStopped() const {
+    return System::Interruption::Signal() != 0 || Elapsed() > mostSeconds;
+}
+
+Outcome ForkedMeter::Run(const Side& side, const std::function<double(Replay::Layer)>& work) {
+    const auto* const settings = std::get_if<OBR::MemPool::PoolSettings>(&side);
+    const bool isHeap = std::holds_alternative<Malloc>(side);
+    const Replay::Layer replayed = settings != nullptr ? layer
+                                   : isHeap            ? Replay::Layer::System
+                                                       : Replay::Layer::Mimalloc;
+    const double before = Elapsed();
+    Outcome outcome = InChild(
+        [&] {
+            if (settings != nullptr) { Replay::UsePools(*settings); }
+            return work(replayed);
+        },
+        isHeap ? limitOfHeap : std::max(leastLimit, mostOfHeapTime * heapSeconds),
+        [this] { return IsStopped(); });
+    if (isHeap) { heapSeconds = std::max(heapSeconds, Elapsed() - before); }
     return outcome;
 }
 

@@ -6,13 +6,16 @@
 
 #include <optional>
 #include <string>
+#include <variant>
 
-#include "replay/PoolSettings.hpp"
+#include <MemPoolSettings>
 
 namespace Advise {
 
-// The settings of the pools; none for the heap.
-using Side = std::optional<Replay::PoolSettings>;
+// What is replayed: the C library's malloc, mimalloc, or pools with these settings.
+struct Malloc {};
+struct Mimalloc {};
+using Side = std::variant<Malloc, Mimalloc, OBR::MemPool::PoolSettings>;
 
 // The figure of a replay, or why there is none.
 struct Outcome {
@@ -38,6 +41,9 @@ public:
 
     // Elapsed seconds since the meter was made.
     virtual double Elapsed() const = 0;
+
+    // Whether the search must end now. A replay then may have no figure.
+    virtual bool IsStopped() const = 0;
 };
 
 }  // namespace Advise

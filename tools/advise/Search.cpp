@@ -8,6 +8,7 @@
 #include <optional>
 #include <set>
 #include <utility>
+#include <variant>
 #include <vector>
 
 #include "advise/Space.hpp"
@@ -16,12 +17,11 @@ namespace Advise {
 
 namespace {
 
-using Replay::PoolSettings;
+using OBR::MemPool::PoolSettings;
 
 // The leaders have this many rounds at the end, unless time runs out.
 constexpr unsigned int enoughRounds = 15;
-// Settings with fewer rounds never lead: a lucky round would mislead the search.
-constexpr unsigned int trustedRounds = 3;
+constexpr unsigned int roundsOfMimalloc = 7;
 // The search steps to a neighbour only if its ratio is at most this.
 constexpr double worthAStep = 0.99;
 // Settings that are timed between two replays of the heap.
@@ -30,10 +30,12 @@ constexpr std::size_t batchSize = 4;
 constexpr double lookingShare = 0.4;
 constexpr double walkingShare = 0.7;
 
-// Settings during the search.
+constexpr const char* heapFailed = "the replay on the heap failed";
+
+// Settings, or mimalloc, during the search.
 struct Candidate {
-    PoolSettings settings;
-    double bytesHeld;
+    Side side;
+    double bytes;
     std::vector<double> ratios;  // Of its time to the heap's, one per round.
 };
 
@@ -50,46 +52,46 @@ class Searcher {
 public:
     Searcher(Meter& replays, double budget, const std::function<void(std::size_t)>& progress)
         : meter(replays), seconds(budget), atStep(progress) {
-        heapBytes = meter.Held(std::nullopt).OrFail("the replay on the heap failed");
-        TimeHeap();
+        heapBytes = meter.Held(Malloc()).OrFail(heapFailed);
+        heapTimes.push_back(meter.Time(Malloc()).OrFail(heapFailed));
     }
 
     Findings Run() {
         const std::vector<PoolSettings> grid = CoarseGrid();
-        for (std::size_t i = 0; i < grid.size() && (i == 0 || HasTime(lookingShare));
-             i += batchSize) {
+        Look({grid.front()});  // The defaults have a figure however short the time is.
+        for (std::size_t i = 1; i < grid.size() && HasTime(lookingShare); i += batchSize) {
             const std::size_t end = std::min(i + batchSize, grid.size());
             Look({grid.begin() + static_cast<std::ptrdiff_t>(i),
                   grid.begin() + static_cast<std::ptrdiff_t>(end)});
         }
         for (const Aim aim : aims) { Walk(aim); }
+        TryMimalloc();
         // The number of the most promising, and the rounds that they get.
         constexpr std::pair<std::size_t, unsigned int> halvings[] = {{8, 3}, {4, 6}, {2, 10}};
         for (const auto& [numBest, rounds] : halvings) {
             for (const Aim aim : aims) { AddRounds(Best(aim, numBest), rounds); }
         }
         for (const Aim aim : aims) { Confirm(aim, enoughRounds, 1); }
-        AddRounds(Alive(), trustedRounds);
+        AddRounds(Alive(), leastRounds);
         for (const Aim aim : aims) { Confirm(aim, enoughRounds, 1); }
         // Without a time limit: the figure of a single round is worthless.
-        for (const Aim aim : aims) { Confirm(aim, trustedRounds, 1e9); }
+        for (const Aim aim : aims) { Confirm(aim, leastRounds, 1e9); }
         return Finish();
     }
 
 private:
-    bool HasTime(double share) const { return meter.Elapsed() < share * seconds; }
-
-    void TimeHeap() {
-        heapTimes.push_back(meter.Time(std::nullopt).OrFail("the replay on the heap failed"));
+    bool HasTime(double share) const {
+        return !meter.IsStopped() && meter.Elapsed() < share * seconds;
     }
 
     // Tries those that were not tried yet, one round each.
     void Look(const std::vector<PoolSettings>& settings) {
         std::vector<std::size_t> added;
         for (const PoolSettings& each : settings) {
-            if (!HasTime(1) && !candidates.empty()) { break; }
+            if (!HasTime(1)) { break; }
             if (!tried.insert(each).second) { continue; }
             const Outcome held = meter.Held(each);
+            if (meter.IsStopped()) { break; }
             if (held.figure.has_value()) {
                 added.push_back(candidates.size());
                 candidates.push_back({each, *held.figure, {}});
@@ -106,10 +108,12 @@ private:
             const std::size_t end = std::min(i + batchSize, indices.size());
             std::vector<Outcome> outcomes;
             for (std::size_t j = i; j < end; ++j) {
-                outcomes.push_back(meter.Time(candidates[indices[j]].settings));
+                outcomes.push_back(meter.Time(candidates[indices[j]].side));
             }
+            const Outcome heap = meter.Time(Malloc());
+            if (meter.IsStopped()) { return; }
             const double before = heapTimes.back();
-            TimeHeap();
+            heapTimes.push_back(heap.OrFail(heapFailed));
             const double beside = (before + heapTimes.back()) / 2;
             for (std::size_t j = i; j < end; ++j) { Add(indices[j], outcomes[j - i], beside); }
             atStep(tried.size());
@@ -121,17 +125,30 @@ private:
         if (outcome.figure.has_value()) {
             candidate.ratios.push_back(*outcome.figure / heapTime);
         } else {
-            givenUp.push_back({candidate.settings, outcome.problem});
+            if (index != mimalloc) { givenUp.push_back({SettingsOf(index), outcome.problem}); }
             dead.insert(index);
         }
     }
 
+    // Measures mimalloc, if it is installed.
+    void TryMimalloc() {
+        const Outcome held = meter.Held(Mimalloc());
+        if (!held.figure.has_value()) { return; }
+        mimalloc = candidates.size();
+        candidates.push_back({Mimalloc(), *held.figure, {}});
+        AddRounds({*mimalloc}, roundsOfMimalloc);
+    }
+
+    const PoolSettings& SettingsOf(std::size_t index) const {
+        return std::get<PoolSettings>(candidates[index].side);
+    }
+
     // Steps to the best neighbour as long as it is better.
     void Walk(Aim aim) {
-        auto center = Confirm(aim, trustedRounds, walkingShare);
+        auto center = Confirm(aim, leastRounds, walkingShare);
         while (center.has_value() && HasTime(walkingShare)) {
-            Look(Neighbours(candidates[*center].settings));
-            const auto next = Confirm(aim, trustedRounds, walkingShare);
+            Look(Neighbours(SettingsOf(*center)));
+            const auto next = Confirm(aim, leastRounds, walkingShare);
             if (!next.has_value() || CostOf(*next, aim) >= worthAStep * CostOf(*center, aim)) {
                 return;
             }
@@ -164,10 +181,12 @@ private:
         }
     }
 
+    // The settings that were timed and not given up.
     std::vector<std::size_t> Alive() const {
         std::vector<std::size_t> alive;
         for (std::size_t i = 0; i < candidates.size(); ++i) {
-            if (dead.count(i) == 0) { alive.push_back(i); }
+            const bool isTimed = !candidates[i].ratios.empty() && dead.count(i) == 0;
+            if (isTimed && i != mimalloc) { alive.push_back(i); }
         }
         return alive;
     }
@@ -186,14 +205,14 @@ private:
 
     double CostOf(std::size_t index, Aim aim) const {
         const Candidate& candidate = candidates[index];
-        return Cost({Quantile(candidate.ratios, 0.5), 0, candidate.bytesHeld, 0},
-                    {1, 0, heapBytes, 0}, aim);
+        return Cost({Quantile(candidate.ratios, 0.5), 0, candidate.bytes, 0}, {1, 0, heapBytes, 0},
+                    aim);
     }
 
-    Figures FiguresOf(const std::vector<double>& ratios, double bytesHeld) const {
+    Figures FiguresOf(const std::vector<double>& ratios, double bytes) const {
         const double heapTime = Quantile(heapTimes, 0.5);
         return {heapTime * Quantile(ratios, 0.5),
-                heapTime * (Quantile(ratios, 0.75) - Quantile(ratios, 0.25)), bytesHeld,
+                heapTime * (Quantile(ratios, 0.75) - Quantile(ratios, 0.25)), bytes,
                 static_cast<unsigned int>(ratios.size())};
     }
 
@@ -204,16 +223,20 @@ private:
             ratios.push_back(2 * heapTimes[i - 1] / (heapTimes[i - 2] + heapTimes[i]));
         }
         Figures figures = FiguresOf(ratios, heapBytes);
-        figures.nsPerEvent = Quantile(heapTimes, 0.5);
+        figures.time = Quantile(heapTimes, 0.5);
         figures.rounds = static_cast<unsigned int>(heapTimes.size());
         return figures;
     }
 
     Findings Finish() const {
-        Findings findings{FiguresOfHeap(), {}, givenUp};
+        Findings findings{FiguresOfHeap(), {}, {}, givenUp};
         for (const std::size_t i : Alive()) {
             const Candidate& each = candidates[i];
-            findings.settings.push_back({each.settings, FiguresOf(each.ratios, each.bytesHeld)});
+            findings.settings.push_back({SettingsOf(i), FiguresOf(each.ratios, each.bytes)});
+        }
+        if (mimalloc.has_value() && !candidates[*mimalloc].ratios.empty()) {
+            const Candidate& other = candidates[*mimalloc];
+            findings.mimalloc = FiguresOf(other.ratios, other.bytes);
         }
         return findings;
     }
@@ -225,7 +248,8 @@ private:
     std::vector<double> heapTimes;
     std::set<PoolSettings, Less> tried;
     std::vector<Candidate> candidates;
-    std::set<std::size_t> dead;  // Candidates that were given up.
+    std::set<std::size_t> dead;           // Candidates that were given up.
+    std::optional<std::size_t> mimalloc;  // Its candidate.
     std::vector<GivenUp> givenUp;
 };
 

@@ -12,7 +12,7 @@ namespace Advise {
 
 namespace {
 
-using Replay::PoolSettings;
+using OBR::MemPool::PoolSettings;
 using Values = std::vector<unsigned int>;
 
 const Values bucketSizes = {506, 1010, 2010, 4010, 8106, 16298, 32682, 65450};

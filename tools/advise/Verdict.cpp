@@ -18,6 +18,8 @@ namespace {
 constexpr double leastBytes = 0.01;
 // The smallest difference in the time of the whole program that is noticed.
 constexpr double leastTime = 0.01;
+// How far off the estimated share can be: two recordings of one program differ by up to as much.
+constexpr double errorOfShare = 0.3;
 // With fewer events there is nothing to gain.
 constexpr std::uint64_t leastEvents = 1000;
 
@@ -48,10 +50,10 @@ public:
         const auto any = [](const Figures&) { return true; };
         Verdict verdict;
         verdict.fastest = Least(findings.settings, any, [](const Measured& each) {
-            return std::tuple(each.figures.nsPerEvent, each.figures.bytesHeld);
+            return std::tuple(each.figures.time, each.figures.bytes);
         });
         verdict.smallest = Least(findings.settings, any, [](const Measured& each) {
-            return std::tuple(each.figures.bytesHeld, each.figures.nsPerEvent);
+            return std::tuple(each.figures.bytes, each.figures.time);
         });
         const auto isFree = [&](const Figures& figures) {
             return TimeEffect(figures) != Effect::Price && BytesEffect(figures) != Effect::Price;
@@ -63,14 +65,19 @@ public:
             Simplest([&](const Figures& figures) { return isFree(figures) && gains(figures); });
         if (!verdict.best.has_value()) {
             verdict.best = Simplest(isFree);
-            verdict.advised = Simplest([&](const Figures& figures) {
-                return gains(figures) && Cost(figures, findings.heap, Aim::Both) < 1;
-            });
+            verdict.advised = Simplest(
+                [&](const Figures& figures) { return gains(figures) && BothRatio(figures) < 1; });
         }
         if (verdict.advised.has_value()) {
             const Figures& advised = findings.settings[*verdict.advised].figures;
             verdict.time = TimeEffect(advised);
             verdict.bytes = BytesEffect(advised);
+        }
+        if (findings.mimalloc.has_value()) {
+            const Figures& other = *findings.mimalloc;
+            const double pools = verdict.advised.has_value() ? BothRatio(Of(*verdict.advised)) : 1;
+            verdict.isMimallocBetter = isFree(other) && gains(other) &&
+                                       (1 + other.spread / other.time) * BothRatio(other) < pools;
         }
         verdict.sentences = SentencesOf(verdict);
         return verdict;
@@ -83,6 +90,9 @@ private:
     double BytesRatio(const Figures& figures) const {
         return Cost(figures, findings.heap, Aim::Bytes);
     }
+    double BothRatio(const Figures& figures) const {
+        return Cost(figures, findings.heap, Aim::Both);
+    }
 
     bool HasFewEvents() const { return program.numEvents < leastEvents; }
 
@@ -91,15 +101,11 @@ private:
         return program.allocationShare.value_or(1) * (1 - TimeRatio(figures));
     }
 
-    // Whether the difference is greater than the spread of either.
-    bool TimeDiffers(const Figures& figures) const {
-        const double spread = std::max(figures.nsSpread, findings.heap.nsSpread);
-        return std::abs(figures.nsPerEvent - findings.heap.nsPerEvent) > spread;
-    }
-
     Effect TimeEffect(const Figures& figures) const {
         const bool isNoticed = std::abs(Saved(figures)) >= leastTime;
-        if (HasFewEvents() || !TimeDiffers(figures) || !isNoticed) { return Effect::None; }
+        if (HasFewEvents() || !DifferInTime(figures, findings.heap) || !isNoticed) {
+            return Effect::None;
+        }
         return Saved(figures) > 0 ? Effect::Gain : Effect::Price;
     }
 
@@ -113,20 +119,17 @@ private:
     // The settings with the least cost in time and bytes, or ones with fewer changes that are as
     // good within the spread.
     Index Simplest(const std::function<bool(const Figures&)>& passes) const {
-        const auto cost = [&](const Figures& figures) {
-            return Cost(figures, findings.heap, Aim::Both);
-        };
         const Index least = Least(findings.settings, passes,
-                                  [&](const Measured& each) { return cost(each.figures); });
+                                  [&](const Measured& each) { return BothRatio(each.figures); });
         if (!least.has_value()) { return least; }
         const Figures& best = findings.settings[*least].figures;
-        const double most = (1 + best.nsSpread / best.nsPerEvent) * cost(best);
+        const double most = (1 + best.spread / best.time) * BothRatio(best);
         return Least(
             findings.settings,
-            [&](const Figures& figures) { return passes(figures) && cost(figures) <= most; },
+            [&](const Figures& figures) { return passes(figures) && BothRatio(figures) <= most; },
             [&](const Measured& each) {
-                return std::tuple(NumDifferences(each.settings, Replay::PoolSettings()),
-                                  cost(each.figures));
+                return std::tuple(NumDifferences(each.settings, OBR::MemPool::PoolSettings()),
+                                  BothRatio(each.figures));
             });
     }
 
@@ -143,16 +146,28 @@ private:
             sentences.emplace_back(
                 "The trace does not say which share of the program's time its allocation calls "
                 "take.");
-        } else if (!verdict.advised.has_value()) {
-            sentences.push_back(fmt::format("Allocation calls take about {} of the program's time.",
-                                            Percent(*program.allocationShare)));
-        } else {
+        } else if (verdict.advised.has_value()) {
             sentences.push_back(fmt::format(
-                "Allocation calls take about {} of the program's time: with pools the program "
-                "would take about {}.",
-                Percent(*program.allocationShare), Percent(1 - Saved(Of(*verdict.advised)))));
+                "{}: with pools the program would take about {}, not counting what the places of "
+                "its blocks change.",
+                Share(), Percent(1 - Saved(Of(*verdict.advised)))));
+        } else if (sentences.front().find(Share()) != 0) {
+            sentences.push_back(Share() + ".");
+        }
+        if (verdict.isMimallocBetter) {
+            sentences.push_back(fmt::format(
+                "Preloaded mimalloc would help more: it takes {:.2f} of the heap's time and {:.2f} "
+                "of its bytes.",
+                TimeRatio(*findings.mimalloc), BytesRatio(*findings.mimalloc)));
         }
         return sentences;
+    }
+
+    // What the allocation calls take, which is known.
+    std::string Share() const {
+        const double share = *program.allocationShare;
+        return fmt::format("Allocation calls take an estimated {} (+/- {}) of the program's time",
+                           Percent(share), Percent(share * errorOfShare));
     }
 
     const Figures& Of(std::size_t index) const { return findings.settings[index].figures; }
@@ -160,7 +175,7 @@ private:
     std::string Gain(const Verdict& verdict, const Figures& pools) const {
         const bool isPaid = verdict.time == Effect::Price || verdict.bytes == Effect::Price;
         const char* const time = verdict.time != Effect::None ? ""
-                                 : TimeDiffers(pools)
+                                 : DifferInTime(pools, findings.heap)
                                      ? " (which the program would not notice)"
                                      : " (the same, within the spread of the runs)";
         return fmt::format(
@@ -174,11 +189,21 @@ private:
             return fmt::format("The program would not notice: it has only {} events.",
                                program.numEvents);
         }
-        const bool isAnyFaster = verdict.fastest.has_value() && TimeDiffers(Of(*verdict.fastest)) &&
-                                 Saved(Of(*verdict.fastest)) > 0;
-        if (isAnyFaster && TimeEffect(Of(*verdict.fastest)) == Effect::None) {
-            return fmt::format("The program would not notice: pools would save {} of its time.",
-                               Percent(Saved(Of(*verdict.fastest))));
+        const bool isMeasured =
+            std::any_of(findings.settings.begin(), findings.settings.end(),
+                        [](const Measured& each) { return each.figures.rounds >= leastRounds; });
+        if (!isMeasured) {
+            return "Too few replays for a verdict: more --seconds allow more of them.";
+        }
+        if (verdict.fastest.has_value() && program.allocationShare.has_value()) {
+            const Figures& fastest = Of(*verdict.fastest);
+            const bool isFaster = DifferInTime(fastest, findings.heap) && Saved(fastest) > 0;
+            if (isFaster && TimeEffect(fastest) == Effect::None) {
+                return fmt::format(
+                    "{}: it would not notice that pools save {}, unless its blocks lie better "
+                    "there.",
+                    Share(), Percent(Saved(fastest)));
+            }
         }
         return "Pools would not help: no settings gain more than the spread of the runs and more "
                "than they cost.";
@@ -212,7 +237,7 @@ std::optional<double> ShareOf(const std::string& text) {
 }
 
 std::vector<std::pair<std::string, std::string>> EnvironmentOf(
-    const Replay::PoolSettings& settings) {
+    const OBR::MemPool::PoolSettings& settings) {
     std::vector<std::pair<std::string, std::string>> variables = {{"NUV_OBR_MEMPOOL_ON", "1"}};
     for (const auto& row : OBR::MemPool::SettingTable::all) {
         variables.emplace_back(row.variable, std::to_string(row.In(settings)));
@@ -220,14 +245,14 @@ std::vector<std::pair<std::string, std::string>> EnvironmentOf(
     return variables;
 }
 
-std::vector<std::string> CodeOf(const Replay::PoolSettings& settings, Replay::Layer layer) {
+std::vector<std::string> CodeOf(const OBR::MemPool::PoolSettings& settings, Replay::Layer layer) {
     const bool isForHeap = layer == Replay::Layer::Heap;
     if (layer == Replay::Layer::Malloc) { return {}; }
     std::vector<std::string> lines = {"OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);"};
     if (isForHeap) { lines = {"OBR::MemPool::HeapSettings()", "    .On(true)"}; }
     for (const auto& row : OBR::MemPool::SettingTable::all) {
-        if (isForHeap && !Replay::IsSetInHeap(row, settings)) { continue; }
         const unsigned int value = row.In(settings);
+        if (value == row.In(OBR::MemPool::PoolSettings())) { continue; }
         const std::string argument = !row.IsFlag() ? std::to_string(value)
                                      : value != 0  ? "true"
                                                    : "false";

@@ -38,6 +38,7 @@ struct Verdict {
     std::optional<std::size_t> advised;
     Effect time = Effect::None;  // Of the advised settings.
     Effect bytes = Effect::None;
+    bool isMimallocBetter = false;  // It gains more than the advised settings, without a price.
 
     // The verdict in words: whether pools would help comes first, then what the figures mean for
     // the whole program.
@@ -53,10 +54,10 @@ Verdict Judge(const Findings& findings, const Program& program);
 std::optional<double> ShareOf(const std::string& text);
 
 // The settings to paste: the environment variables, in the order in which they are read, and lines
-// of C++, empty for a layer that needs none.
+// of C++ for those that are not the default, empty for a layer that needs none.
 std::vector<std::pair<std::string, std::string>> EnvironmentOf(
-    const Replay::PoolSettings& settings);
-std::vector<std::string> CodeOf(const Replay::PoolSettings& settings, Replay::Layer layer);
+    const OBR::MemPool::PoolSettings& settings);
+std::vector<std::string> CodeOf(const OBR::MemPool::PoolSettings& settings, Replay::Layer layer);
 
 }  // namespace Advise
 

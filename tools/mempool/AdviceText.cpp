@@ -32,8 +32,8 @@ std::string NamesOf(const Advice& advice, std::size_t index) {
     if (verdict.smallest == index) { names += ", smallest"; }
     if (verdict.best == index) { names += ", best"; }
     if (verdict.advised == index) { names += ", advised"; }
-    if (Advise::NumDifferences(advice.findings.settings[index].settings, Replay::PoolSettings()) ==
-        0) {
+    if (Advise::NumDifferences(advice.findings.settings[index].settings,
+                               OBR::MemPool::PoolSettings()) == 0) {
         names += ", default";
     }
     return names.empty() ? "" : names.substr(2);
@@ -41,10 +41,10 @@ std::string NamesOf(const Advice& advice, std::size_t index) {
 
 void AddRow(Table& table, const Advice& advice, std::vector<std::string> cells,
             const Figures& figures, const std::string& names) {
-    cells.push_back(fmt::format("{:.1f}", figures.nsPerEvent));
-    cells.push_back(figures.rounds > 1 ? fmt::format("{:.1f}", figures.nsSpread) : "-");
+    cells.push_back(fmt::format("{:.1f}", figures.time));
+    cells.push_back(figures.rounds > 1 ? fmt::format("{:.1f}", figures.spread) : "-");
     cells.push_back(fmt::format("{:.2f}", Cost(figures, advice.findings.heap, Aim::Time)));
-    cells.push_back(fmt::format("{:.0f}", figures.bytesHeld));
+    cells.push_back(fmt::format("{:.0f}", figures.bytes));
     cells.push_back(fmt::format("{:.2f}", Cost(figures, advice.findings.heap, Aim::Bytes)));
     cells.push_back(names);
     table.AddCells(std::move(cells));
@@ -107,6 +107,9 @@ void PrintTable(std::ostream& out, const Advice& advice, bool all) {
                  {"of\nheap"},
                  {"", 0, Align::Left}});
     AddRow(table, advice, {"heap", "", "", "", ""}, advice.findings.heap, "");
+    if (advice.findings.mimalloc.has_value()) {
+        AddRow(table, advice, {"mimalloc", "", "", "", ""}, *advice.findings.mimalloc, "");
+    }
     std::size_t numHidden = 0;
     for (std::size_t place = 0; place < order.size(); ++place) {
         if (all || place < numShown || !NamesOf(advice, order[place]).empty()) {
@@ -118,6 +121,7 @@ void PrintTable(std::ostream& out, const Advice& advice, bool all) {
     table.Write(out);
     if (numHidden != 0) { fmt::print(out, "   and {} more settings that were tried\n", numHidden); }
     PrintGivenUp(out, advice);
+    if (advice.isStopped) { out << "   The search was stopped; these are its results so far.\n"; }
 }
 
 void PrintVerdict(std::ostream& out, const Advice& advice) {
@@ -133,7 +137,7 @@ void PrintVerdict(std::ostream& out, const Advice& advice) {
     for (const std::string& line : code) { fmt::print(out, "    {}\n", line); }
 }
 
-std::string TryCommand(const Replay::PoolSettings& settings,
+std::string TryCommand(const OBR::MemPool::PoolSettings& settings,
                        const std::vector<std::string>& command) {
     std::string line = "mempool try";
     for (const auto& row : OBR::MemPool::SettingTable::all) {

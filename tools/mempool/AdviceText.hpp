@@ -19,7 +19,7 @@ void PrintTable(std::ostream& out, const Advise::Advice& advice, bool all);
 void PrintVerdict(std::ostream& out, const Advise::Advice& advice);
 
 // The command line of `mempool try` with these settings, for a shell.
-std::string TryCommand(const Replay::PoolSettings& settings,
+std::string TryCommand(const OBR::MemPool::PoolSettings& settings,
                        const std::vector<std::string>& command);
 
 }  // namespace Tool

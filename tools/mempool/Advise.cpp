@@ -41,8 +41,12 @@ at a price    No settings gain without a price, but some gain more than they cos
               is less than that of the heap.
 advised       The settings that the verdict is about, with lines to paste: the best, if they gain
               anything; else settings at a price, chosen in the same way.
-the program   'mempool record' estimates the share of the program's time that allocation calls take.
-              A change of less than 1 % of the program's time is neither a gain nor a price.
+the program   'mempool record' estimates which share of its time its allocation calls take; recordings
+              of one program differ by up to 30 % of it. What changes less than 1 % of the program's
+              time is neither a gain nor a price.
+mimalloc      Replayed too where it is installed. The verdict says so if it gains more than the pools.
+--seconds     Replays end at 1.4 times this at the latest. Ctrl-C or SIGTERM ends the search at once,
+              and what was measured is printed.
 
 A replay does not write to blocks, so it does not show that blocks which lie closer together can be
 faster to use. docs/advisor.md describes the keys of --json.
@@ -61,16 +65,18 @@ nlohmann::ordered_json OrNull(const std::optional<Value>& value) {
 }
 
 void AddFigures(nlohmann::ordered_json& object, const Advise::Figures& figures) {
-    object["ns_per_event"] = figures.nsPerEvent;
-    object["ns_spread"] = figures.nsSpread;
-    object["bytes_held"] = static_cast<std::int64_t>(figures.bytesHeld);
+    object["ns_per_event"] = figures.time;
+    object["ns_spread"] = figures.spread;
+    object["bytes_held"] = static_cast<std::int64_t>(figures.bytes);
 }
 
 nlohmann::ordered_json JsonOf(const Advise::Advice& advice) {
     using nlohmann::ordered_json;
-    const auto& [layer, program, findings, verdict] = advice;
+    const auto& [layer, program, findings, verdict, isStopped] = advice;
     ordered_json heap;
     AddFigures(heap, findings.heap);
+    ordered_json mimalloc;
+    if (findings.mimalloc.has_value()) { AddFigures(mimalloc, *findings.mimalloc); }
     ordered_json settings = ordered_json::array();
     for (const Advise::Measured& each : findings.settings) {
         ordered_json& row = settings.emplace_back();
@@ -90,7 +96,9 @@ nlohmann::ordered_json JsonOf(const Advise::Advice& advice) {
     return {{"layer", NameOf(layer)},
             {"events", program.numEvents},
             {"events_left_out", program.numLeftOut},
+            {"stopped", isStopped},
             {"heap", heap},
+            {"mimalloc", mimalloc},
             {"settings", settings},
             {"fastest", OrNull(verdict.fastest)},
             {"smallest", OrNull(verdict.smallest)},

@@ -5,7 +5,6 @@
 #include <iostream>
 #include <map>
 #include <memory>
-#include <sstream>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -22,8 +21,6 @@
 namespace Tool {
 
 namespace {
-
-namespace fs = std::filesystem;
 
 constexpr const char* description = "Run a program with pools that report its memory errors";
 
@@ -69,17 +66,6 @@ void Say(const std::string& what) {
     std::cerr << "mempool: " << what << '\n';
 }
 
-// The checked library, as installed or as built.
-fs::path CheckedLibrary() {
-    const fs::path here = fs::read_symlink("/proc/self/exe").parent_path();
-    std::istringstream places(CHECKED_PLACES);
-    for (std::string place; std::getline(places, place, ':');) {
-        fs::path library = (here / place / "libObrMemPool.so.1").lexically_normal();
-        if (fs::exists(library)) { return library; }
-    }
-    throw std::runtime_error("the checked library is not installed with " + here.string());
-}
-
 With Choose(const Options& options, const HostFile& host, const std::string& program) {
     const bool hasValgrind = System::FindProgram("valgrind") != "valgrind";
     const With fitting = host.isSanitized ? With::asan
@@ -107,7 +93,8 @@ void Prepend(const char* variable, const std::string& value, char separator = ':
 }
 
 void SetEnvironment(const Options& options) {
-    const fs::path library = CheckedLibrary();
+    const std::filesystem::path library =
+        System::FindBesideTool(CHECKED_PLACES, "libObrMemPool.so.1");
     setenv("NUV_OBR_MEMPOOL_ON", "1", 1);
     setenv("MEMPOOL_CHECK_ALIGNMENT", std::to_string(options.alignment).c_str(), 1);
     setenv("MEMPOOL_CHECK_STATUS", "99", 0);

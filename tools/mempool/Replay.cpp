@@ -7,12 +7,12 @@
 #include <limits>
 #include <memory>
 #include <new>
-#include <optional>
 #include <stdexcept>
 #include <string>
 #include <vector>
 
 #include <MemPool>
+#include <MemPoolSettings>
 
 #include "advise/Advice.hpp"
 #include "advise/ForkedMeter.hpp"
@@ -24,7 +24,6 @@
 #include "mempool/Settings.hpp"
 #include "mempool/Table.hpp"
 #include "replay/Measure.hpp"
-#include "replay/PoolSettings.hpp"
 #include "replay/Recording.hpp"
 #include "trace/StepReader.hpp"
 
@@ -65,7 +64,7 @@ struct Options {
     bool sweep = false;
     unsigned int seconds = 30;
     Replay::Layer layer = Replay::Layer::Heap;
-    Replay::PoolSettings settings;
+    OBR::MemPool::PoolSettings settings;
     std::vector<std::string> paths;
     unsigned int rounds = 11;
     bool dbg = false;
@@ -89,22 +88,23 @@ int Compare(const std::string& path, const Options& options) {
         reader, [&](auto position) { progress.Show(fmt::format("line {}", position)); });
     if (recording.steps.empty()) { throw std::runtime_error(reader.Name() + ": no event"); }
 
-    Advise::ForkedMeter meter(recording, options.layer, std::numeric_limits<double>::infinity());
+    constexpr double unlimited = std::numeric_limits<double>::infinity();
+    Advise::ForkedMeter meter(recording, options.layer, unlimited, unlimited);
     const double poolBytes = meter.Held(options.settings).OrFail(reader.Name());
-    const double heapBytes = meter.Held(std::nullopt).OrFail(reader.Name());
+    const double heapBytes = meter.Held(Advise::Malloc()).OrFail(reader.Name());
     std::vector<double> pool;
     std::vector<double> heap;
     for (unsigned int round = 1; round <= options.rounds; ++round) {
         progress.Show(fmt::format("round {} of {}", round, options.rounds));
         pool.push_back(meter.Time(options.settings).OrFail(reader.Name()));
-        heap.push_back(meter.Time(std::nullopt).OrFail(reader.Name()));
+        heap.push_back(meter.Time(Advise::Malloc()).OrFail(reader.Name()));
     }
     progress.Clear();
 
     std::cout << reader.Name() << '\n';
     PrintBadLines(std::cout, reader.Name(), reader.Bad());
     if (options.dbg) {
-        Replay::BytesHeldByPools(recording, options.layer, [] { OBR::MemPool::Dbg(); });
+        Replay::BytesHeld(recording, options.layer, [] { OBR::MemPool::Dbg(); });
     }
     Table table({{"", 0, Align::Left}, {"pool", 10}, {"heap", 10}, {"pool/heap", 10}});
     const auto addSame = [&](const char* label, std::uint64_t value) {

@@ -45,7 +45,8 @@ do not change. If recording fails or the page cannot be written, the status is 1
 The report is by caller by default. The advice is for one pool for all groups, by default on the
 library that 'mempool try' preloads, and ends with the command line that tries it.
 
-Ctrl-C ends the program, and mempool reports on what was recorded. A second Ctrl-C ends mempool.
+Ctrl-C ends the program, and mempool reports on what was recorded. During the search for settings it
+ends the search, and mempool prints what was measured.
 )";
 
 struct Options {

@@ -49,29 +49,27 @@ struct Options {
     bool json = false;
 };
 
-nlohmann::ordered_json JsonOf(const Preload::Trial& trial, const Preload::Conclusion& conclusion) {
+nlohmann::ordered_json JsonOf(unsigned int rounds, const Preload::Conclusion& conclusion) {
     nlohmann::ordered_json sides = nlohmann::ordered_json::array();
-    for (std::size_t i = 0; i < trial.sides.size(); ++i) {
-        const Advise::Figures& figures = conclusion.figures[i];
-        const Advise::Figures& before = conclusion.figures.front();
-        sides.push_back({{"name", trial.sides[i].name},
-                         {"cpu_seconds", figures.nsPerEvent},
-                         {"cpu_spread", figures.nsSpread},
-                         {"cpu_ratio", Cost(figures, before, Advise::Aim::Time)},
-                         {"wall_seconds", Advise::Quantile(trial.sides[i].wallSeconds, 0.5)},
-                         {"peak_bytes", static_cast<std::int64_t>(figures.bytesHeld)},
-                         {"peak_ratio", Cost(figures, before, Advise::Aim::Bytes)}});
+    for (const Preload::Result& each : conclusion.results) {
+        sides.push_back({{"name", each.name},
+                         {"cpu_seconds", each.figures.time},
+                         {"cpu_spread", each.figures.spread},
+                         {"cpu_ratio", each.timeRatio},
+                         {"wall_seconds", each.wallSeconds},
+                         {"peak_bytes", static_cast<std::int64_t>(each.figures.bytes)},
+                         {"peak_ratio", each.bytesRatio}});
     }
     nlohmann::ordered_json same;
     if (conclusion.sameOutput.has_value()) { same = *conclusion.sameOutput; }
-    return {{"rounds", trial.rounds},
+    return {{"rounds", rounds},
             {"sides", sides},
             {"same_output", same},
             {"verdict", conclusion.verdict},
             {"sentences", conclusion.sentences}};
 }
 
-void Print(const Preload::Trial& trial, const Preload::Conclusion& conclusion) {
+void Print(unsigned int rounds, const Preload::Conclusion& conclusion) {
     Table table({{"", 0, Align::Left},
                  {"cpu s"},
                  {"spread"},
@@ -79,17 +77,14 @@ void Print(const Preload::Trial& trial, const Preload::Conclusion& conclusion) {
                  {"wall s"},
                  {"peak MB"},
                  {"of malloc"}});
-    for (std::size_t i = 0; i < trial.sides.size(); ++i) {
-        const Advise::Figures& figures = conclusion.figures[i];
-        const Advise::Figures& before = conclusion.figures.front();
-        table.AddRow(trial.sides[i].name, fmt::format("{:.3f}", figures.nsPerEvent),
-                     fmt::format("{:.3f}", figures.nsSpread),
-                     fmt::format("{:.2f}", Cost(figures, before, Advise::Aim::Time)),
-                     fmt::format("{:.3f}", Advise::Quantile(trial.sides[i].wallSeconds, 0.5)),
-                     fmt::format("{:.1f}", figures.bytesHeld / 1e6),
-                     fmt::format("{:.2f}", Cost(figures, before, Advise::Aim::Bytes)));
+    for (const Preload::Result& each : conclusion.results) {
+        table.AddRow(each.name, fmt::format("{:.3f}", each.figures.time),
+                     fmt::format("{:.3f}", each.figures.spread),
+                     fmt::format("{:.2f}", each.timeRatio), fmt::format("{:.3f}", each.wallSeconds),
+                     fmt::format("{:.1f}", each.figures.bytes / 1e6),
+                     fmt::format("{:.2f}", each.bytesRatio));
     }
-    fmt::print(std::cerr, "\n   Rounds: {}\n", trial.rounds);
+    fmt::print(std::cerr, "\n   Rounds: {}\n", rounds);
     table.Write(std::cerr);
     std::cerr << '\n';
     for (const std::string& sentence : conclusion.sentences) { std::cerr << sentence << '\n'; }
@@ -112,9 +107,9 @@ int Try(const Options& options) {
     }
     const Preload::Conclusion conclusion = Preload::Conclude(trial);
     if (options.json) {
-        std::cout << JsonOf(trial, conclusion).dump(2) << std::endl;
+        std::cout << JsonOf(trial.rounds, conclusion).dump(2) << std::endl;
     } else {
-        Print(trial, conclusion);
+        Print(trial.rounds, conclusion);
     }
     return System::EndLike(trial.waitStatus);
 }

@@ -134,7 +134,7 @@ __attribute__((constructor)) void StartUp() {
     if (std::getenv("NUV_OBR_MEMPOOL_ON") != nullptr && !NUV_OBR_MEMPOOL_ON()) { return; }
     NUV_OBR_MEMPOOL_TRACE(false);  // Writing a line may allocate, which would be traced again.
     try {
-        heap = new Heap("malloc", Replay::HeapSettingsOf(Replay::PoolSettings::OfProcess()));
+        heap = new Heap("malloc", Replay::HeapSettingsOf(OBR::MemPool::PoolSettings::OfProcess()));
     } catch (const std::exception& error) {
         std::fprintf(stderr, "MallocOnPools: %s\n", error.what());
         std::_Exit(1);

@@ -14,10 +14,7 @@
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
-#include <filesystem>
 #include <memory>
-#include <sstream>
-#include <stdexcept>
 #include <string_view>
 #include <utility>
 
@@ -27,23 +24,12 @@
 #include "system/Child.hpp"
 #include "system/Descriptor.hpp"
 #include "system/ExitStatus.hpp"
+#include "system/Interruption.hpp"
+#include "system/ProgramFile.hpp"
 
 namespace Preload {
 
 namespace {
-
-namespace fs = std::filesystem;
-
-// The preloaded library of the pools, as installed or as built.
-std::string PoolsLibrary() {
-    const fs::path here = fs::read_symlink("/proc/self/exe").parent_path();
-    std::istringstream places(PRELOAD_PLACES);
-    for (std::string place; std::getline(places, place, ':');) {
-        const fs::path library = (here / place / PRELOAD_NAME).lexically_normal();
-        if (fs::exists(library)) { return library; }
-    }
-    throw std::runtime_error(PRELOAD_NAME " is not installed beside " + here.string());
-}
 
 // Whether the loader finds the library. Loads it in a child, since it may change the process.
 bool IsInstalled(const char* library) {
@@ -112,7 +98,6 @@ double Seconds(const timeval& time) {
 
 // Runs in the child, before the program.
 void Prepare(const Order& order, const Side& side, int input, const Run& run) {
-    std::signal(SIGINT, SIG_DFL);
     dup2(input, STDIN_FILENO);
     dup2(run.output.Descriptor(), STDOUT_FILENO);
     dup2(run.errors.Descriptor(), STDERR_FILENO);
@@ -134,29 +119,15 @@ std::unique_ptr<Run> RunOnce(const Order& order, const Side& side) {
     const pid_t child =
         System::Start(order.command, [&] { Prepare(order, side, input.Number(), *run); });
     rusage used = {};
-    while (wait4(child, &run->status, 0, &used) < 0 && errno == EINTR) {}
+    while (wait4(child, &run->status, 0, &used) < 0 && errno == EINTR) {
+        kill(child, System::Interruption::Signal());
+    }
     const std::chrono::duration<double> taken = std::chrono::steady_clock::now() - start;
     run->wallSeconds = taken.count();
     run->cpuSeconds = Seconds(used.ru_utime) + Seconds(used.ru_stime);
     run->peakBytes = 1024 * static_cast<double>(used.ru_maxrss);
     return run;
 }
-
-// While this lives, SIGINT ends only the program that runs, not this process.
-class Interruption {
-public:
-    Interruption() : before(std::signal(SIGINT, [](int) { isAsked = 1; })) { isAsked = 0; }
-    Interruption(const Interruption&) = delete;
-    Interruption& operator=(const Interruption&) = delete;
-    ~Interruption() { std::signal(SIGINT, before); }
-
-    static bool IsAsked() { return isAsked != 0; }
-
-private:
-    static volatile std::sig_atomic_t isAsked;
-    void (*const before)(int);
-};
-volatile std::sig_atomic_t Interruption::isAsked = 0;
 
 Advise::Figures FiguresOf(const Side& side, unsigned int rounds) {
     const std::vector<double>& times = side.cpuSeconds;
@@ -165,14 +136,13 @@ Advise::Figures FiguresOf(const Side& side, unsigned int rounds) {
             Advise::Quantile(side.peakBytes, 0.5), rounds};
 }
 
-std::string Compared(const std::string& who, const Advise::Figures& figures,
-                     const Advise::Figures& before) {
-    const bool differs = std::abs(figures.nsPerEvent - before.nsPerEvent) >
-                         std::max(figures.nsSpread, before.nsSpread);
+std::string Compared(const std::string& who, const Result& result, const Result& malloc) {
     return fmt::format("{} the program takes {:.2f} of malloc's time{} and {:.2f} of its memory.",
-                       who, Cost(figures, before, Advise::Aim::Time),
-                       differs ? "" : " (the same, within the spread of the runs)",
-                       Cost(figures, before, Advise::Aim::Bytes));
+                       who, result.timeRatio,
+                       DifferInTime(result.figures, malloc.figures)
+                           ? ""
+                           : " (the same, within the spread of the runs)",
+                       result.bytesRatio);
 }
 
 }  // namespace
@@ -186,10 +156,10 @@ Trial TryProgram(const Order& order,
         trial.sides.back().library = library;
     };
     add("malloc", "");
-    add("pools", PoolsLibrary());
+    add("pools", System::FindBesideTool(PRELOAD_PLACES, PRELOAD_NAME));
     if (IsInstalled("libmimalloc.so.2")) { add("mimalloc", "libmimalloc.so.2"); }
 
-    const Interruption interruption;
+    const System::Interruption interruption;
     atRun(0, "malloc");
     const std::unique_ptr<Run> first = RunOnce(order, trial.sides.front());
     trial.waitStatus = first->status;
@@ -199,11 +169,11 @@ Trial TryProgram(const Order& order,
         std::vector<std::unique_ptr<Run>> runs(trial.sides.size());
         for (std::size_t i = 0; i < runs.size(); ++i) {
             const std::size_t place = (i + round) % runs.size();  // Each is first in turn.
-            if (Interruption::IsAsked()) { return trial; }
+            if (System::Interruption::Signal() != 0) { return trial; }
             atRun(round, trial.sides[place].name);
             runs[place] = RunOnce(order, trial.sides[place]);
         }
-        if (Interruption::IsAsked()) { return trial; }
+        if (System::Interruption::Signal() != 0) { return trial; }
         for (std::size_t i = 0; i < runs.size(); ++i) {
             Side& side = trial.sides[i];
             side.cpuSeconds.push_back(runs[i]->cpuSeconds);
@@ -221,25 +191,27 @@ Trial TryProgram(const Order& order,
 
 Conclusion Conclude(const Trial& trial) {
     Conclusion conclusion;
+    const Advise::Figures malloc = FiguresOf(trial.sides.at(0), trial.rounds);
     for (const Side& side : trial.sides) {
-        conclusion.figures.push_back(FiguresOf(side, trial.rounds));
+        const Advise::Figures figures = FiguresOf(side, trial.rounds);
+        conclusion.results.push_back({side.name, figures, Advise::Quantile(side.wallSeconds, 0.5),
+                                      Cost(figures, malloc, Advise::Aim::Time),
+                                      Cost(figures, malloc, Advise::Aim::Bytes)});
     }
-    const Advise::Figures& before = conclusion.figures.at(0);
-    const Advise::Figures& pools = conclusion.figures.at(1);
     // The whole program was measured, so the share is 1, and the number of events does not matter.
-    const Advise::Program whole = {1000000, 0, 1};
-    const auto judge = [&](const Advise::Figures& figures) {
-        return Advise::Judge({before, {{{}, figures}}, {}}, whole);
+    Advise::Findings findings{malloc, {}, {{{}, conclusion.results.at(1).figures}}, {}};
+    const bool hasMimalloc = conclusion.results.size() > 2;
+    if (hasMimalloc) { findings.mimalloc = conclusion.results[2].figures; }
+    const Advise::Verdict verdict = Advise::Judge(findings, {1000000, 0, 1});
+    conclusion.verdict = verdict.Name();
+    const auto add = [&](const char* who, std::size_t side) {
+        conclusion.sentences.push_back(
+            Compared(who, conclusion.results[side], conclusion.results[0]));
     };
-    conclusion.verdict = judge(pools).Name();
-    conclusion.sentences.push_back(Compared("On pools", pools, before));
-    if (conclusion.figures.size() > 2) {
-        const Advise::Figures& other = conclusion.figures[2];
-        const bool wins =
-            judge(other).advised.has_value() &&
-            Cost(other, before, Advise::Aim::Both) < Cost(pools, before, Advise::Aim::Both);
-        conclusion.sentences.push_back(Compared(
-            wins ? "Preloaded mimalloc gains more: with it" : "With mimalloc", other, before));
+    add("On pools", 1);
+    if (hasMimalloc) {
+        add(verdict.isMimallocBetter ? "Preloaded mimalloc gains more: with it" : "With mimalloc",
+            2);
     }
     if (!trial.sides.at(0).isSame) {
         conclusion.sentences.emplace_back(

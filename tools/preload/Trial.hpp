@@ -8,15 +8,15 @@
 #include <string>
 #include <vector>
 
+#include <MemPoolSettings>
 #include "advise/Figures.hpp"
-#include "replay/PoolSettings.hpp"
 
 namespace Preload {
 
 struct Order {
     std::vector<std::string> command;  // The program and its arguments.
     std::string input;                 // The file for its standard input; empty for none.
-    Replay::PoolSettings settings;
+    OBR::MemPool::PoolSettings settings;
     unsigned int rounds = 9;
     bool showsOnErrors = false;  // Shows all output of the program on standard error.
 };
@@ -38,17 +38,26 @@ struct Trial {
 };
 
 // Runs the program. The first run is not measured: its output is shown, and the other runs are
-// compared with it. Calls `atRun` before each run. SIGINT ends the program and the trial, which
-// then has the complete rounds. Throws a std::exception if the program cannot be run or a library
-// is not installed.
+// compared with it. Calls `atRun` before each run. SIGINT or SIGTERM ends the program and the
+// trial, which then has the complete rounds. Throws a std::exception if the program cannot be run
+// or a library is not installed.
 Trial TryProgram(const Order& order,
                  const std::function<void(unsigned int round, const std::string& side)>& atRun);
 
+// The medians of a side, and their ratios to malloc.
+struct Result {
+    std::string name;
+    Advise::Figures figures;  // The time is seconds of the processor.
+    double wallSeconds;
+    double timeRatio;
+    double bytesRatio;
+};
+
 // The result of a trial.
 struct Conclusion {
-    std::vector<Advise::Figures> figures;  // Of each side; the time is seconds of the processor.
-    std::optional<bool> sameOutput;        // None if malloc's own runs differ.
-    std::string verdict;                   // "faster", "smaller", "both", "none" or "differs".
+    std::vector<Result> results;     // Of each side.
+    std::optional<bool> sameOutput;  // None if malloc's own runs differ.
+    std::string verdict;             // "faster", "smaller", "both", "none" or "differs".
     std::vector<std::string> sentences;
 };
 

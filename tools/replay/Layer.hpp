@@ -8,8 +8,7 @@
 #include <cstdint>
 
 #include <MemPoolHeap>
-
-#include "replay/PoolSettings.hpp"
+#include <MemPoolSettings>
 
 namespace Replay {
 
@@ -17,6 +16,9 @@ enum class Layer : std::uint8_t {
     Heap,    // OBR::MemPool::Heap, with blocks aligned to 8.
     Malloc,  // The preloaded library of `mempool try`, with blocks aligned to 16.
     Mgr,     // OBR::MemPool::Mgr, with blocks aligned to 4 or less.
+    // Without pools:
+    System,    // The operators new and delete.
+    Mimalloc,  // mimalloc, where it is installed.
 };
 
 constexpr std::size_t alignmentOfMalloc = 16;
@@ -30,23 +32,25 @@ constexpr std::size_t MallocLimit(std::size_t maxRecordSize) {
 }
 
 // The settings as a layer uses them: a Heap rounds the data alignment up to a multiple of 4.
-inline PoolSettings InLayer(PoolSettings settings, Layer layer) {
+inline OBR::MemPool::PoolSettings InLayer(OBR::MemPool::PoolSettings settings, Layer layer) {
     if (layer != Layer::Mgr) {
         settings.dataAlignment = OBR::MemPool::RoundUp(settings.dataAlignment, 4);
     }
     return settings;
 }
 
-// Whether a Heap gets this setting. A default bucket size is not set, so that large size classes
-// continue in larger buckets.
-inline bool IsSetInHeap(const OBR::MemPool::Setting& row, const PoolSettings& settings) {
-    return row.size != &PoolSettings::bucketSize || row.In(settings) != row.In(PoolSettings());
+// All pools built from now on have these settings, are enabled and write no trace.
+inline void UsePools(const OBR::MemPool::PoolSettings& settings) {
+    settings.Apply();
+    OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);
+    OBR::MemPool::NUV_OBR_MEMPOOL_TRACE(false);
 }
 
-// The settings of a Heap.
-inline OBR::MemPool::HeapSettings HeapSettingsOf(const PoolSettings& settings) {
+// The settings of a Heap. A default bucket size is not set, so that large size classes continue in
+// larger buckets.
+inline OBR::MemPool::HeapSettings HeapSettingsOf(const OBR::MemPool::PoolSettings& settings) {
     OBR::MemPool::HeapSettings heapSettings;
-    if (IsSetInHeap(OBR::MemPool::SettingTable::bucketSize, settings)) {
+    if (settings.bucketSize != OBR::MemPool::PoolSettings().bucketSize) {
         heapSettings.BucketSize(settings.bucketSize);
     }
     return heapSettings.On(true)

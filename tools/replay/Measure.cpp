@@ -10,7 +10,8 @@ namespace Replay {
 
 namespace {
 
-using HeapSide = FreeingSide<SystemHeap>;
+// The resident pages of the preloaded library itself.
+constexpr std::int64_t bytesOfPreload = 360 * 1024;
 
 // Calls `measure` with the side of that layer.
 template <typename Measure>
@@ -24,6 +25,15 @@ auto WithSide(const Recording& recording, Layer layer, const Measure& measure) {
             FreeingSide<MallocPool> side(recording);
             return measure(side);
         }
+        case Layer::System: {
+            FreeingSide<SystemHeap> side(recording);
+            return measure(side);
+        }
+        case Layer::Mimalloc: {
+            Mimalloc::Get();  // Loading it is not part of an event.
+            FreeingSide<MimallocHeap> side(recording);
+            return measure(side);
+        }
         case Layer::Mgr:
             break;
     }
@@ -31,44 +41,27 @@ auto WithSide(const Recording& recording, Layer layer, const Measure& measure) {
     return measure(side);
 }
 
-template <typename Side>
-std::int64_t HeldAtPeak(Side& side, const Recording& recording) {
-    HeapCount::Start();
-    Run(side, recording, recording.peakSteps);
-    return HeapCount::Stop();
-}
-
-template <typename Side>
-double TimePerEvent(Side& side, const Recording& recording) {
-    const double start = ProcessorNanoseconds();
-    Run(side, recording, recording.steps.size());
-    const double time = ProcessorNanoseconds() - start - side.untimed;
-    return time / static_cast<double>(recording.steps.size());
-}
-
 }  // namespace
 
-std::int64_t BytesHeldByPools(const Recording& recording, Layer layer,
-                              const std::function<void()>& atPeak) {
+std::int64_t BytesHeld(const Recording& recording, Layer layer,
+                       const std::function<void()>& atPeak) {
     return WithSide(recording, layer, [&](auto& side) {
-        const std::int64_t held = HeldAtPeak(side, recording);
+        HeapCount::Start();
+        Run(side, recording, recording.peakSteps);
+        const std::int64_t held = HeapCount::Stop();
         atPeak();
-        return held;
+        if (layer == Layer::Mimalloc) { return Mimalloc::BytesHeld(); }
+        return layer == Layer::Malloc ? held + bytesOfPreload : held;
     });
 }
 
-std::int64_t BytesHeldByHeap(const Recording& recording) {
-    HeapSide side(recording);
-    return HeldAtPeak(side, recording);
-}
-
-double PoolNanosecondsPerEvent(const Recording& recording, Layer layer) {
-    return WithSide(recording, layer, [&](auto& side) { return TimePerEvent(side, recording); });
-}
-
-double HeapNanosecondsPerEvent(const Recording& recording) {
-    HeapSide side(recording);
-    return TimePerEvent(side, recording);
+double NanosecondsPerEvent(const Recording& recording, Layer layer) {
+    return WithSide(recording, layer, [&](auto& side) {
+        const double start = ProcessorNanoseconds();
+        Run(side, recording, recording.steps.size());
+        const double time = ProcessorNanoseconds() - start - side.untimed;
+        return time / static_cast<double>(recording.steps.size());
+    });
 }
 
 }  // namespace Replay

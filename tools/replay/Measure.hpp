@@ -12,16 +12,15 @@
 
 namespace Replay {
 
-// Replays one side and returns the bytes that it holds from the heap at the peak. Calls `atPeak`
-// while the pools are at the peak.
-std::int64_t BytesHeldByPools(
+// Replays once and returns the bytes that the layer holds at the peak: from the system's heap, and
+// mimalloc from the system. The preloaded library counts with its own pages. Calls `atPeak` while
+// the pools are at the peak.
+std::int64_t BytesHeld(
     const Recording& recording, Layer layer, const std::function<void()>& atPeak = [] {});
-std::int64_t BytesHeldByHeap(const Recording& recording);
 
-// Replays one side and returns the processor time per event in nanoseconds, including page faults.
+// Replays once and returns the processor time per event in nanoseconds, including page faults.
 // There must be an event.
-double PoolNanosecondsPerEvent(const Recording& recording, Layer layer);
-double HeapNanosecondsPerEvent(const Recording& recording);
+double NanosecondsPerEvent(const Recording& recording, Layer layer);
 
 }  // namespace Replay
 

@@ -16,6 +16,7 @@
 
 #include "replay/Clock.hpp"
 #include "replay/Layer.hpp"
+#include "replay/Mimalloc.hpp"
 #include "replay/Recording.hpp"
 
 namespace Replay {
@@ -24,7 +25,8 @@ namespace Replay {
 
 class HeapPool {
 public:
-    explicit HeapPool(const char* name) : heap(name, HeapSettingsOf(PoolSettings::OfProcess())) {}
+    explicit HeapPool(const char* name)
+        : heap(name, HeapSettingsOf(OBR::MemPool::PoolSettings::OfProcess())) {}
 
     void* Allocate(std::size_t size) { return heap.Allocate(size); }
     void Free(void* block) { heap.Free(block); }
@@ -56,14 +58,23 @@ public:
     }
 
 private:
-    OBR::MemPool::Heap heap{"malloc", HeapSettingsOf(PoolSettings::OfProcess())};
-    const std::size_t limit = MallocLimit(PoolSettings::OfProcess().maxRecordSize);
+    OBR::MemPool::Heap heap{"malloc", HeapSettingsOf(OBR::MemPool::PoolSettings::OfProcess())};
+    const std::size_t limit = MallocLimit(OBR::MemPool::NUV_OBR_MEMPOOL_MAX_RECORD_SIZE());
 };
 
 class SystemHeap {
 public:
     void* Allocate(std::size_t size) { return ::operator new[](size); }
     void Free(void* block) { ::operator delete[](block); }
+};
+
+class MimallocHeap {
+public:
+    void* Allocate(std::size_t size) { return mimalloc.allocate(size); }
+    void Free(void* block) { mimalloc.free(block); }
+
+private:
+    const Mimalloc mimalloc = Mimalloc::Get();
 };
 
 // Has a pool for each one in the recording.

@@ -25,7 +25,8 @@ const std::string& NameOf(const Trace::Pool& pool) {
 
 class Analyst {
 public:
-    explicit Analyst(const Replay::PoolSettings& settings) : pools(settings), onePool(settings) {
+    explicit Analyst(const OBR::MemPool::PoolSettings& settings)
+        : pools(settings), onePool(settings) {
         result.settings = settings;
         onePool.Create(0);
     }
@@ -246,7 +247,7 @@ private:
 
 }  // namespace
 
-Analysis Analyse(Trace::StepReader& reader, const Replay::PoolSettings& settings,
+Analysis Analyse(Trace::StepReader& reader, const OBR::MemPool::PoolSettings& settings,
                  const std::function<void(std::uint64_t position)>& atEvent) {
     constexpr std::uint64_t interval = 100000;
     Analyst analyst(settings);

@@ -18,7 +18,8 @@
 #include <string>
 #include <vector>
 
-#include "replay/PoolSettings.hpp"
+#include <MemPoolSettings>
+
 #include "report/FillMap.hpp"
 #include "report/PoolModel.hpp"
 #include "report/Runs.hpp"
@@ -50,7 +51,7 @@ struct Analysis {
     std::map<std::string, std::string> facts;  // What the trace says about itself.
     Trace::BadLines badLines;
     std::string warning;  // If the trace is incomplete.
-    Replay::PoolSettings settings;
+    OBR::MemPool::PoolSettings settings;
 
     std::uint64_t events = 0;
     std::uint64_t frees = 0;
@@ -70,7 +71,7 @@ struct Analysis {
 
 // Reads the trace to its end, and calls `atEvent` with the position from time to time. The settings
 // must be valid for a pool.
-Analysis Analyse(Trace::StepReader& reader, const Replay::PoolSettings& settings,
+Analysis Analyse(Trace::StepReader& reader, const OBR::MemPool::PoolSettings& settings,
                  const std::function<void(std::uint64_t position)>& atEvent);
 
 }  // namespace Report

@@ -19,7 +19,7 @@ constexpr std::uint64_t groupBytes = MallocBytes(48);
 
 }  // namespace
 
-PoolModel::PoolModel(const Replay::PoolSettings& settings)
+PoolModel::PoolModel(const OBR::MemPool::PoolSettings& settings)
     : sizes(settings), keepEmptyBuckets(settings.keepEmptyBuckets), buckets(1) {
     const std::uint32_t alignment = sizes.dataAlignment;
     classes.resize((sizes.maxRecordSize - sizes.minRecordSize) / alignment + 1);

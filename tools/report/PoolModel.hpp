@@ -13,7 +13,7 @@
 #include <cstdint>
 #include <vector>
 
-#include "replay/PoolSettings.hpp"
+#include <MemPoolSettings>
 
 namespace Report {
 
@@ -31,7 +31,7 @@ struct SizeClass {
 class PoolModel {
 public:
     // The settings must be valid for a pool.
-    explicit PoolModel(const Replay::PoolSettings& settings);
+    explicit PoolModel(const OBR::MemPool::PoolSettings& settings);
 
     // The caller numbers the pools, with small numbers, and creates each once.
     void Create(std::uint32_t pool);

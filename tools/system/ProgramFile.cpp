@@ -12,9 +12,11 @@
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
+#include <filesystem>
 #include <fstream>
 #include <memory>
 #include <sstream>
+#include <stdexcept>
 
 #include "system/Descriptor.hpp"
 #include "system/ExitStatus.hpp"
@@ -152,6 +154,17 @@ bool IsAddressSanitized(const std::string& path) {
         }
     }
     return false;
+}
+
+std::string FindBesideTool(const std::string& folders, const std::string& name) {
+    const std::filesystem::path here =
+        std::filesystem::read_symlink("/proc/self/exe").parent_path();
+    std::istringstream places(folders);
+    for (std::string place; std::getline(places, place, ':');) {
+        const std::filesystem::path path = (here / place / name).lexically_normal();
+        if (exists(path)) { return path; }
+    }
+    throw std::runtime_error(name + " is not installed with " + here.string());
 }
 
 }  // namespace System

@@ -17,6 +17,10 @@ std::string CheckPreload(const std::string& name, const std::string& done);
 // Whether the ELF file is built with AddressSanitizer.
 bool IsAddressSanitized(const std::string& path);
 
+// A file of an install, or of a build: in the first of the folders that has it. These are separated
+// by ':' and relative to that of this tool. Throws a std::runtime_error if none has it.
+std::string FindBesideTool(const std::string& folders, const std::string& name);
+
 }  // namespace System
 
 #endif
