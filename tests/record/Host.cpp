@@ -56,7 +56,7 @@ void Family() {
         std::abort();
     }
     std::free(Keep(aligned));
-    if (posix_memalign(&aligned, 3, 70008) == 0) { std::abort(); }
+    if (posix_memalign(&aligned, 3, 70008) == 0 || aligned == nullptr) { std::abort(); }
     std::free(Keep(valloc(70009)));
     std::free(Keep(pvalloc(70010)));
     std::free(early.block);
@@ -115,7 +115,7 @@ void Fork() {
 void VFork() {
     const pid_t child = vfork();
     if (child == 0) {
-        execl("/bin/sh", "sh", "-c", "exit 0", nullptr);
+        execlp("sh", "sh", "-c", "exit 0", nullptr);
         _exit(1);
     }
     Wait(child);
@@ -201,12 +201,12 @@ __attribute__((noinline)) void SecondCaller() {
 }
 
 // A function that passes memory on.
-extern "C" __attribute__((noinline)) void* pass_alloc(std::size_t size) {
+extern "C" __attribute__((noinline)) void* pass_Alloc(std::size_t size) {
     return Keep(std::malloc(size));
 }
 template <typename>
 __attribute__((noinline)) void ThirdCaller() {
-    Keep(pass_alloc(70001));
+    Keep(pass_Alloc(70001));
 }
 
 int main(int argc, char** argv) {

@@ -69,6 +69,7 @@ TEST(Record, TellsTheMallocFamily) {
     EXPECT_EQ(recorded.facts.at("by"), "all");
     EXPECT_EQ(recorded.facts.at("threads"), "1");
     EXPECT_EQ(recorded.facts.at("foreign_frees"), "0");
+    EXPECT_EQ(recorded.facts.count("allocation_share"), 0U) << "Of few calls it would be a guess.";
 }
 
 TEST(Record, TellsEachBlockOfOperatorNewOnce) {
@@ -105,7 +106,8 @@ TEST(Record, FollowsAProgramThatBecomesAnother) {
     const std::string story = "+70000 +70001 -70001 ";
     EXPECT_EQ(record("env X=1 ./Host exit", 7), story);
     EXPECT_EQ(record("sh -c 'exec ./lost; exit 1' 2>/dev/null", 127), "");
-    EXPECT_EQ(record("bash -c 'LD_PRELOAD=libz.so.1 exec ./Host exit'", 7), story);
+    EXPECT_EQ(record("env LD_PRELOAD=libz.so.1 sh -c 'echo $LD_PRELOAD; exec ./Host exit'", 7),
+              "libz.so.1\n" + story);
     EXPECT_EQ(record("env " STATIC_HOST, 0),
               "mempool: env has become a program that cannot be recorded: it is statically linked, "
               "or runs with other rights\n");
@@ -125,11 +127,14 @@ TEST(Record, FollowsTheProgramToItsEnd) {
 // A signal to mempool is forwarded to the program, and mempool ends in the same way.
 TEST(Record, DiesByTheSignalOfTheProgram) {
     Shell::Output("ln -sf " HOST " Host");
-    EXPECT_EQ(Shell::Output(MEMPOOL " record -o trace ./Host run >out & "
-                                    "until grep -qs ready out; do sleep 0.01; done; "
-                                    "kill -TERM $!; wait $! 2>/dev/null; kill -l $?"),
-              "TERM\n");
-    EXPECT_EQ(ReadTrace("trace").story, "+70000 +70001 -70001 ");
+    for (const std::string signal : {"TERM", "HUP", "USR1", "USR2"}) {
+        EXPECT_EQ(Shell::Output(MEMPOOL " record -o trace ./Host run >out & "
+                                        "until grep -qs ready out; do sleep 0.01; done; "
+                                        "kill -" +
+                                signal + " $!; wait $! 2>/dev/null; kill -l $?; rm out"),
+                  signal + "\n");
+        EXPECT_EQ(ReadTrace("trace").story, "+70000 +70001 -70001 ");
+    }
 }
 
 TEST(Record, CallsTheGroups) {
@@ -226,6 +231,14 @@ TEST(Record, WritesTheTraceWholeOrNotAtAll) {
     EXPECT_EQ(Shell::Output("cat trace; rm trace.*; " + record + "./Host exit", 7), "old\n");
     EXPECT_EQ(Shell::Output("find trace* -printf '%f %m\n'"), "trace 640\n");
     EXPECT_EQ(ReadTrace("link").story, "+70000 +70001 -70001 ");
+    EXPECT_EQ(Shell::Output("umask 027; " MEMPOOL " record -o new true; stat -c %a new"), "640\n");
+    // What was written before a write fails is kept. The program lowers the limit on files.
+    EXPECT_THAT(Shell::Output(MEMPOOL " record -o cut sh -c 'prlimit --fsize=4000 --pid $PPID; "
+                                      "sleep 0.6; exec ./Host threads'",
+                              125),
+                ContainsRegex("^mempool: cut: File too large; what was written before that is in "
+                              "[^ ]*cut[.]......\n$"));
+    EXPECT_EQ(Shell::Output(MEMPOOL " text cut.* 2>/dev/null | sed -n 2p"), "xmpt:i:by:all\n");
     EXPECT_EQ(Shell::Output(MEMPOOL " record -o - sh -c 'echo out' 2>err | " MEMPOOL
                                     " text - | head -1; cat err"),
               "xmpt:i:program:sh -c echo out\nout\n");
@@ -248,7 +261,10 @@ TEST(Record, RefusesWhatCannotBeRecorded) {
               "mempool: ./script: /lost/sh: No such file or directory\n");
     EXPECT_EQ(refused("-o lost/trace ./Host", 125),
               "mempool: lost/trace: No such file or directory\n");
-    EXPECT_EQ(refused("-o /dev/full ./Host", 125), "mempool: /dev/full: No space left on device\n");
+    EXPECT_EQ(refused("-o /dev/full echo on", 125),
+              "mempool: /dev/full: No space left on device\n");
+    EXPECT_EQ(refused("-o trace --skip $(printf %1024d 1 | tr ' ' x) ./Host", 125),
+              "mempool: --skip: the patterns are too long\n");
     EXPECT_EQ(refused("-o /dev/full", 125),
               "mempool: PROGRAM is required\nSee 'mempool record --help'.\n");
     EXPECT_EQ(refused("--by size ./Host", 125),
@@ -256,7 +272,11 @@ TEST(Record, RefusesWhatCannotBeRecorded) {
               "See 'mempool record --help'.\n");
     EXPECT_EQ(refused("-o trace " STATIC_HOST, 126),
               "mempool: " STATIC_HOST ": is statically linked: cannot be recorded\n");
-    Shell::Output("head -c 3000 Host >cut; chmod +x cut; cp Host kept; chmod 750 kept");
+    Shell::Output(
+        "head -c 3000 Host >cut; chmod +x cut; cp Host kept; chmod 750 kept; "
+        "(head -c 18 Host; printf '\\3\\0'; tail -c +21 Host) >other; chmod +x other");
+    EXPECT_EQ(refused("-o trace ./other", 126),
+              "mempool: ./other: is a program for another kind of machine: cannot be recorded\n");
     EXPECT_EQ(refused("-o trace ./cut", 126),
               "mempool: ./cut: is damaged or cut short: cannot be recorded\n");
     // The trace is in none of the files that are read.

@@ -226,6 +226,11 @@ TEST(Analysis, AgreesWithPlainFigures) {
     EXPECT_NE(&ranges.Row(1152), next);
     const Report::Analysis equal = Analyse(Lines("@c:P\n@a:P:X:8\n@f:P:X:\n@a:P:X:8\n"));
     EXPECT_EQ(equal.peak.event, 2U) << "The first of two equal peaks.";
+    EXPECT_EQ(Analyse(Lines("@c:P\n@a:P:X:8\n@a:P:Y:0\n")).peak.blocks, 2U);
+    const auto groups =
+        Analyse(Lines("@c:Q\n@c:P\n@d:P\n@c:P\n@a:P:X:8\n@f:P:X:\n@a:P:X:8\n@a:Q:Y:8\n")).groups;
+    EXPECT_EQ(groups[0].tally.all.blocks, 2U) << "Of two as large the one with more blocks.";
+    EXPECT_EQ(groups[0].numPools, 2U);
 }
 
 // Runs are those of a traced pool, so the moves of each pool of a group are followed separately.
@@ -293,6 +298,8 @@ TEST(Analysis, KeepsTheCourseOfALongTrace) {
         });
         EXPECT_EQ(point.most.heap, heap);
         EXPECT_EQ(point.most.chunks, heap + 8 * point.most.blocks);
+        EXPECT_LE(point.most.pools, analysis.most.pools);
+        EXPECT_LE(point.most.blocks, analysis.most.blocks);
     }
     for (const Report::GrowthPoint& point : analysis.growth) {
         for (std::size_t i = 0; i < analysis.groups.size(); ++i) {

@@ -53,6 +53,8 @@ constexpr std::size_t numSlots = std::size_t{1} << 19;
 constexpr std::uint64_t Lap(std::uint64_t index) {
     return (1 + index / numSlots % 15) << lapShift;
 }
+static_assert(Lap(14 * numSlots) >> lapShift == 15 && Lap(15 * numSlots) == Lap(0),
+              "The number of a lap has its bits to itself.");
 
 // A place that code calls from, by its return address. Those in the run-time libraries of C and C++
 // are passed over: for them the table keeps how far away on the stack the next return address is.
