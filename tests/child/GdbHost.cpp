@@ -48,7 +48,7 @@ int main() {
 
     // All sorts of settings: bounds that share a group, alignments of all kinds.
     std::list<Mgr> sorts;
-    for (const unsigned int alignment : {1U, 2U, 3U, 4U, 8U, 100U}) {
+    for (const unsigned int alignment : {1U, 2U, 3U, 4U, 8U, 100U, 512U}) {
         for (const unsigned int minimum : {1U, 8U, 30U}) {
             NUV_OBR_MEMPOOL_DATA_ALIGNMENT(alignment);
             NUV_OBR_MEMPOOL_MIN_RECORD_SIZE(minimum);
@@ -65,6 +65,8 @@ int main() {
     NUV_OBR_MEMPOOL_MIN_RECORD_SIZE(0xFFFFFFFF);  // Rounded up, it wraps to 0.
     sorts.emplace_back();
     NUV_OBR_MEMPOOL_MIN_RECORD_SIZE(8);
+    NUV_OBR_MEMPOOL_MAX_RECORD_SIZE(8);
+    sorts.emplace_back();
 
     // Two full buckets and one with a free record between two used ones, of three records each; one
     // of another group; three heap records. The name just fits into its string.
@@ -95,6 +97,7 @@ int main() {
     const Mgr withBackslash("a\\b  \"c");
     NUV_OBR_MEMPOOL_ON(false);
     const Mgr off("off");
+    const Mgr alsoOff("also off");
     OBR::vector<int> numbers;
     for (const int number : {1, 2, 3}) { numbers.push_back(number); }
 
