@@ -48,7 +48,7 @@ struct Layered {
     }
 };
 
-// Destroys a pool after the library has reported what is in use.
+// Destroys a pool after main, before the library reports what is in use.
 void (*destroyLate)() = nullptr;
 __attribute__((destructor)) void DestroyLate() {
     if (destroyLate != nullptr) { destroyLate(); }
@@ -59,7 +59,7 @@ bool Make(const std::string& fault) {
     Pool nodes("nodes");
     Pool others("others");
     const bool isLarge = fault.find(", large") != std::string::npos;
-    const unsigned int size = isLarge ? 2001 : 13;
+    const unsigned int size = isLarge ? 2001 : fault == "overrun 1" ? 1 : 13;
     volatile char* const block = nodes.Take(size);  // taken here
     const auto is = [&](const char* name) { return fault.find(name) == 0; };
     if (is("none")) {
@@ -128,7 +128,7 @@ bool Make(const std::string& fault) {
         const bool refused = !others.Give(block);  // at: wrong pool
         return nodes.Give(block) && refused;
     } else if (is("inner")) {
-        const bool refused = !nodes.Give(block + 8);  // at: inner
+        const bool refused = !nodes.Give(block + size) && !nodes.Give(block + 8);  // at: inner
         return nodes.Give(block) && refused;
     } else if (is("overrun 100")) {
         block[size + 99] = 1;  // at: overrun 100
@@ -146,8 +146,9 @@ bool Make(const std::string& fault) {
         block[-100] = 1;  // at: underrun 100
         return nodes.Give(block);
     } else if (is("underrun 40")) {
-        block[-40] = 1;            // at: underrun 40
-        return nodes.Give(block);  // found: underrun 40
+        block[-40] = 1;                         // at: underrun 40
+        const bool known = nodes.Knows(block);  // found: underrun 40
+        return nodes.Give(block) && known;
     } else if (is("underrun 1")) {
         block[-1] = 1;      // at: underrun 1
         nodes.Give(block);  // found: underrun 1
@@ -163,7 +164,9 @@ bool Make(const std::string& fault) {
         return nodes.Give(block) && nodes.Give(third);
     } else if (is("leak at exit")) {
         static auto* const kept = new Pool("kept");
-        kept->Take(size);  // at: exit, taken here
+        static Pool* const alive[] = {new Pool("alive"), new Pool("also")};
+        for (Pool* const pool : alive) { pool->Take(size); }
+        kept->Take(992);  // at: exit, taken here
         destroyLate = [] { delete kept; };
         return nodes.Give(block);
     } else if (is("leak")) {
