@@ -1,6 +1,7 @@
 // A program to be recorded. Its argument says what it does. Its own blocks have sizes from 70000
 // on. It links nothing of the project.
 
+#include <alloca.h>
 #include <dlfcn.h>
 #include <malloc.h>
 #include <pthread.h>
@@ -209,6 +210,11 @@ __attribute__((noinline)) void ThirdCaller() {
     Keep(pass_Alloc(70001));
 }
 
+__attribute__((noinline)) void FourthCaller(std::size_t size) {
+    Keep(alloca(size));
+    FirstCaller();
+}
+
 int main(int argc, char** argv) {
     const std::string what = argc > 1 ? argv[1] : "";
     if (what == "family") { Family(); }
@@ -230,6 +236,9 @@ int main(int argc, char** argv) {
         FirstCaller();
         SecondCaller();
         ThirdCaller<std::vector<int>>();
+    }
+    if (what == "alloca") {
+        for (const std::size_t size : {100, 3000}) { FourthCaller(size); }
     }
     if (what == "exit") {
         Use(70001);

@@ -141,8 +141,8 @@ TEST(Record, CallsTheGroups) {
     const auto byCaller = Record("callers", "--by caller").numBlocks;
     ASSERT_EQ(byCaller.size(), 5U);
     for (const char* name :
-         {"^FirstCaller\\(\\)\\+0x[0-9a-f]+ \\(RecordHost\\)$",
-          "^SecondCaller\\(\\)\\+0x[0-9a-f]+ \\(RecordHost\\)$", "^void ThirdCaller\\(\\)\\+0x"}) {
+         {"^FirstCaller\\(\\)\\+0x[0-9a-f]+ \\(RecordHost[,)]",
+          "^SecondCaller\\(\\)\\+0x[0-9a-f]+ \\(RecordHost[,)]", "^void ThirdCaller\\(\\)\\+0x"}) {
         EXPECT_THAT(byCaller, testing::Contains(testing::Key(ContainsRegex(name))));
     }
     EXPECT_EQ(Record("callers", "--by module").numBlocks,
@@ -150,6 +150,19 @@ TEST(Record, CallsTheGroups) {
     const auto skipped = Record("callers", "--by caller --skip no --skip '*Caller*'").numBlocks;
     EXPECT_THAT(skipped, testing::Contains(testing::Key(ContainsRegex("^main\\+0x"))));
     EXPECT_THAT(skipped, testing::Not(testing::Contains(testing::Key(HasSubstr("Caller()")))));
+}
+
+TEST(Record, KeepsStacks) {
+    const auto isStack = [](const std::string& pattern) {
+        return testing::Contains(testing::Key(ContainsRegex(pattern)));
+    };
+    const std::string third = ";main\\+[^;]*;void ThirdCaller\\(\\)\\+[^;]*;pass_alloc\\+[^;]*$";
+    EXPECT_THAT(Record("callers", "--stacks").numBlocks, isStack("^_start\\+.*" + third));
+    const auto cut = Record("exec", "--stacks=2").numBlocks;
+    EXPECT_THAT(cut, isStack("^main\\+[^;]*;FirstCaller\\(\\)\\+[^;]*$"));
+    EXPECT_THAT(cut, isStack("^void ThirdCaller\\(\\)\\+[^;]*;pass_alloc\\+[^;]*$"));
+    EXPECT_THAT(Record("alloca", "--stacks").numBlocks,
+                isStack("^FourthCaller\\([^;]*;FirstCaller\\(\\)\\+[^;]*$"));
 }
 
 TEST(Record, EstimatesTheShareOfTheAllocations) {

@@ -37,6 +37,8 @@ itself is not recorded.
               malloc, calloc, realloc, memalign, strdup or strndup, ends in alloc, or belongs to
               the C++ library. --skip names more such functions, for example --skip 'new*'. A
               function whose stack frame varies in size (alloca) is shown instead of its callers.
+--stacks      A group is a call stack: the innermost 32 frames, or DEPTH frames, at most 64. A stack
+              ends at a function whose stack frame varies in size.
 --by module   The program's file and each of its shared libraries are a group.
 --pools       Records the pools of libObrMemPool instead of the heap, whether they are on or off,
               including Mgr::Clear. The program must use the shared library.
@@ -74,16 +76,25 @@ void AddRecordOptions(CLI::App& subcommand, Recorder::Order& order) {
         ->default_str(std::find_if(names.begin(), names.end(), [&](const auto& each) {
                           return each.second == order.by;
                       })->first);
-    subcommand
-        .add_option("--skip", order.skipped,
-                    "Functions whose symbols match PATTERN are not callers; may be repeated")
-        ->type_name("PATTERN")
-        ->allow_extra_args(false)
-        ->check([](const std::string& pattern) {
-            return std::string(pattern.empty() ? "the pattern is empty" : "");
-        });
+    CLI::Option* const skip = subcommand.add_option(
+        "--skip", order.skipped,
+        "Functions whose symbols match PATTERN are not callers; may be repeated");
+    skip->type_name("PATTERN")->allow_extra_args(false)->check([](const std::string& pattern) {
+        return std::string(pattern.empty() ? "the pattern is empty" : "");
+    });
+    CLI::Option* const stacks = subcommand.add_option_function<std::string>(
+        "--stacks",
+        [&order](const std::string& depth) {
+            order.by = Recorder::By::Stack;
+            if (!depth.empty()) {
+                order.depth = ParseNumber("--stacks", depth, 1, Recorder::maxDepth);
+            }
+        },
+        "Make a group of each call stack, of its innermost DEPTH frames");
+    stacks->type_name("[=DEPTH]")->expected(0, 1)->excludes(by)->excludes(skip);
     subcommand.add_flag("--pools", order.pools, "Record the pools of libObrMemPool, not the heap")
-        ->excludes(by);
+        ->excludes(by)
+        ->excludes(stacks);
 }
 
 Recorder::Outcome RecordAsOrdered(const Recorder::Order& order) {

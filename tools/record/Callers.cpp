@@ -1,6 +1,7 @@
 // Unwinding a stack takes thousands of cycles, far more than an allocation. So each return address
 // is unwound once: its distance to the next one on the stack is the same at every call. Only a
-// function that takes a variable part of the stack is an exception; it counts as the caller itself.
+// function that takes a variable part of the stack is an exception; it counts as the caller itself,
+// and ends a whole stack.
 
 #include "record/Callers.hpp"
 
@@ -27,18 +28,19 @@ const char* Pointer(std::uint64_t address) {
     return pointer;
 }
 
-constexpr std::size_t maxFrames = 48;
+constexpr std::size_t maxFrames = maxDepth + 8;  // The recorder's own among them.
+
+constexpr std::size_t longestSearch = 64;  // In a table.
 
 // The place of the address in the table, or that where it belongs; the last one if it is full.
 Caller& Find(Channel& channel, std::uint64_t address) {
-    constexpr std::size_t longestSearch = 64;
     std::size_t place = address * 0x9E3779B97F4A7C15U >> 48;
     for (std::size_t step = 0; step != longestSearch; ++step, ++place) {
-        Caller& caller = channel.callers[place % maxGroup];
+        Caller& caller = channel.callers[place % maxCaller];
         const std::uint64_t found = caller.address.load(std::memory_order_acquire);
         if (found == address || found == 0) { return caller; }
     }
-    return channel.callers[maxGroup];
+    return channel.callers[maxCaller];
 }
 
 // The active calls, the innermost first. `stack` is the stack pointer after the return.
@@ -53,7 +55,8 @@ struct Frames {
 
 _Unwind_Reason_Code AddFrame(_Unwind_Context* context, void* toFrames) {
     auto& frames = *static_cast<Frames*>(toFrames);
-    if (frames.number == maxFrames) { return _URC_END_OF_STACK; }
+    const bool isEnd = frames.number == maxFrames || _Unwind_GetIP(context) == 0;
+    if (isEnd) { return _URC_END_OF_STACK; }
     frames.frames[frames.number++] = {_Unwind_GetIP(context), _Unwind_GetCFA(context)};
     return _URC_NO_REASON;
 }
@@ -126,57 +129,109 @@ std::uint32_t FindModule(Channel& channel, const Dl_info& info) {
     return index < numModules ? index : 0;
 }
 
-// Fills the table's place for the address. Returns whether the address is passed over.
-bool Enter(Channel& channel, Caller& caller, const Frame& frame, std::uint64_t frameSize) {
-    std::uint64_t none = 0;
-    if (!caller.address.compare_exchange_strong(none, frame.address)) {
-        const std::uint32_t state = caller.state.load(std::memory_order_acquire);
-        if (state == Caller::Passed && caller.frameSize != frameSize) {
-            caller.state.store(Caller::Variable, std::memory_order_release);
-            return false;
-        }
-        return state == Caller::Passed;
+// Enters the address, unless the table is full. Returns whether it is passed on the way.
+bool Enter(Channel& channel, const Frame& frame, std::uint64_t frameSize) {
+    Caller* place = nullptr;
+    for (std::uint64_t found = 0; found != frame.address;) {
+        place = &Find(channel, frame.address);
+        if (place == &channel.callers[maxCaller]) { return false; }
+        found = 0;
+        if (place->address.compare_exchange_strong(found, frame.address)) { break; }
     }
+    Caller& caller = *place;
+    const std::uint32_t state = caller.state.load(std::memory_order_acquire);
+    if (state == Caller::Passed && caller.frameSize != frameSize) {
+        caller.state.store(Caller::Variable, std::memory_order_release);
+        return false;
+    }
+    if (state != Caller::Unknown) { return state == Caller::Passed; }
     Dl_info info = {};
     const bool isKnown = dladdr(Pointer(frame.address - 1), &info) != 0;
     caller.module = isKnown ? FindModule(channel, info) : 0;
     const bool isWrapper =
         channel.by == By::Caller && info.dli_sname != nullptr && IsWrapper(channel, info.dli_sname);
-    const bool isPassed = isKnown && frameSize != 0 && (isWrapper || IsRuntime(info.dli_fname));
+    const bool isPassed = frameSize != 0 && (channel.by == By::Stack ||
+                                             (isKnown && (isWrapper || IsRuntime(info.dli_fname))));
     caller.frameSize = frameSize;
     caller.state.store(isPassed ? Caller::Passed : Caller::Final, std::memory_order_release);
     return isPassed;
 }
 
-std::uint64_t IndexOf(const Channel& channel, const Caller& caller) {
-    return static_cast<std::uint64_t>(&caller - channel.callers);
-}
+// The callers on the way, the innermost first.
+struct Trail {
+    void Add(std::size_t caller) {
+        callers[number++] = static_cast<std::uint16_t>(caller);
+        hash = (hash ^ caller) * 0x9E3779B97F4A7C15U;
+        hash ^= hash >> 32;
+    }
 
-// Unwinds the stack, enters what the table lacks and returns the index of the caller.
-__attribute__((noinline)) std::uint64_t Unwind(Channel& channel, std::uint64_t address,
-                                               std::uint64_t stack) {
+    std::uint16_t callers[maxDepth];
+    std::size_t number = 0;
+    std::uint64_t hash = 0;
+};
+
+// Unwinds the stack and enters what the table lacks.
+__attribute__((noinline)) void Unwind(Channel& channel, std::uint64_t address,
+                                      std::uint64_t stack) {
     const int oldErrno = errno;
     Frames found;
     found.number = 0;
     _Unwind_Backtrace(AddFrame, &found);
     std::size_t index = 0;
     while (index != found.number && found.frames[index].stack != stack) { ++index; }
-    const Caller* caller = nullptr;
     if (index == found.number) {  // Code without tables to unwind it by.
-        Caller& only = Find(channel, address);
-        Enter(channel, only, {address, stack}, 0);
-        caller = &only;
+        Enter(channel, {address, stack}, 0);
     }
-    for (bool isPassed = true; isPassed && index != found.number; ++index) {
+    // How far it is from the last frame that there was room for is not known.
+    const std::size_t end = found.number - (found.number == maxFrames ? 1 : 0);
+    for (bool isPassed = true; isPassed && index < end; ++index) {
         const Frame& frame = found.frames[index];
         const std::uint64_t frameSize =
-            index + 1 < found.number ? found.frames[index + 1].stack - frame.stack : 0;
-        Caller& place = Find(channel, frame.address);
-        caller = &place;
-        isPassed = IndexOf(channel, place) != maxGroup && Enter(channel, place, frame, frameSize);
+            index + 1 != found.number ? found.frames[index + 1].stack - frame.stack : 0;
+        isPassed = Enter(channel, frame, frameSize);
     }
     errno = oldErrno;
-    return IndexOf(channel, *caller);
+}
+
+// Goes from one caller to the next as far as the table leads. False if it lacks one.
+bool Follow(Channel& channel, std::uint64_t address, std::uint64_t stack, Trail& trail) {
+    trail.number = 0;
+    trail.hash = 0;
+    while (trail.number != channel.depth) {
+        const Caller& caller = Find(channel, address);
+        const auto index = static_cast<std::size_t>(&caller - channel.callers);
+        const bool isEntered = caller.address.load(std::memory_order_acquire) == address;
+        const std::uint32_t state = caller.state.load(std::memory_order_acquire);
+        if (index != maxCaller && (!isEntered || state == Caller::Unknown)) { return false; }
+        trail.Add(index);
+        if (state != Caller::Passed) { return true; }
+        stack += caller.frameSize;
+        std::memcpy(&address, Pointer(stack) - sizeof(address), sizeof(address));
+    }
+    return true;
+}
+
+// The index of the stack in the table.
+std::uint64_t Intern(Channel& channel, const Trail& trail) {
+    const std::uint64_t hash = trail.hash | 1;
+    std::size_t place = hash >> 44;
+    for (std::size_t step = 0; step != longestSearch; ++step, ++place) {
+        Stack& stack = channel.stacks[place % maxGroup];
+        std::uint64_t found = stack.hash.load(std::memory_order_acquire);
+        if (found == 0 && stack.hash.compare_exchange_strong(found, hash)) { found = hash; }
+        if (found != hash) { continue; }
+        // Whoever finds it empty fills it: who entered it may not run for long.
+        if (stack.number.load(std::memory_order_acquire) == 0) {
+            const auto number = static_cast<std::uint32_t>(trail.number);
+            const std::uint32_t first = channel.framesUsed.fetch_add(number);
+            if (first > numFrames - number) { break; }
+            std::memcpy(channel.frames + first, trail.callers, number * sizeof(*trail.callers));
+            stack.first.store(first, std::memory_order_release);
+            stack.number.store(number, std::memory_order_release);
+        }
+        return place % maxGroup;
+    }
+    return maxGroup;
 }
 
 // Of this thread. Asking for it takes a system call, which is little beside unwinding.
@@ -189,26 +244,18 @@ std::uint64_t ProcessorNanoseconds() {
 
 }  // namespace
 
-std::uint64_t FindCaller(Channel& channel, const void* returnAddress, const void* frame) {
-    const auto first = reinterpret_cast<std::uint64_t>(returnAddress);
-    std::uint64_t address = first;
-    auto stack = reinterpret_cast<std::uint64_t>(frame);
-    for (std::size_t depth = 0; depth != maxFrames; ++depth) {
-        const Caller& caller = Find(channel, address);
-        if (caller.address.load(std::memory_order_relaxed) != address) {
-            if (IndexOf(channel, caller) == maxGroup) { return maxGroup; }
-            break;
-        }
-        if (caller.state.load(std::memory_order_acquire) != Caller::Passed) {
-            return IndexOf(channel, caller);
-        }
-        stack += caller.frameSize;
-        std::memcpy(&address, Pointer(stack) - sizeof(address), sizeof(address));
+std::uint64_t FindGroup(Channel& channel, const void* returnAddress, const void* frame) {
+    const auto address = reinterpret_cast<std::uint64_t>(returnAddress);
+    const auto stack = reinterpret_cast<std::uint64_t>(frame);
+    Trail trail;
+    if (!Follow(channel, address, stack, trail)) {
+        const std::uint64_t start = ProcessorNanoseconds();
+        Unwind(channel, address, stack);
+        channel.unwindNanoseconds.fetch_add(ProcessorNanoseconds() - start,
+                                            std::memory_order_relaxed);
+        if (!Follow(channel, address, stack, trail)) { trail.Add(maxCaller); }
     }
-    const std::uint64_t start = ProcessorNanoseconds();
-    const std::uint64_t index = Unwind(channel, first, reinterpret_cast<std::uint64_t>(frame));
-    channel.unwindNanoseconds.fetch_add(ProcessorNanoseconds() - start, std::memory_order_relaxed);
-    return index;
+    return channel.by == By::Stack ? Intern(channel, trail) : trail.callers[trail.number - 1];
 }
 
 }  // namespace Recorder

@@ -1,4 +1,5 @@
-// Whose call it is: the first return address outside of the run-time libraries of C and C++.
+// Whose call it is: the first return address outside of the run-time libraries of C and C++, or the
+// whole stack.
 
 #ifndef OBR_TOOLS_RECORD_CALLERS_HPP
 #define OBR_TOOLS_RECORD_CALLERS_HPP
@@ -9,9 +10,9 @@
 
 namespace Recorder {
 
-// The index into the channel's callers. The function that is called was entered from
+// The index into the channel's callers or stacks. The function that is called was entered from
 // `returnAddress`, with `frame` as its canonical frame address.
-std::uint64_t FindCaller(Channel& channel, const void* returnAddress, const void* frame);
+std::uint64_t FindGroup(Channel& channel, const void* returnAddress, const void* frame);
 
 }  // namespace Recorder
 

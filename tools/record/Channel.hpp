@@ -16,7 +16,8 @@ namespace Recorder {
 // Holds the descriptor of the channel, for the recorder in the program.
 constexpr const char* channelVariable = "MEMPOOL_RECORD_CHANNEL";
 
-enum class By : std::uint32_t { All, Caller, Module, Thread };
+// From Caller on, a block's group is found on the stack.
+enum class By : std::uint32_t { All, Thread, Caller, Module, Stack };
 
 enum class Op : std::uint8_t {
     Allocated,  // Block, size, group.
@@ -43,7 +44,7 @@ constexpr unsigned int sizeBits = 36;
 constexpr std::uint64_t maxSize =
     (std::uint64_t{1} << sizeBits) - 1;  // Stands for larger ones too.
 constexpr unsigned int groupShift = sizeBits;
-constexpr std::uint64_t maxGroup = 0xFFFF;
+constexpr std::uint64_t maxGroup = 0xFFFFF;
 constexpr unsigned int opShift = 56;
 constexpr unsigned int lapShift = 60;
 
@@ -56,8 +57,9 @@ constexpr std::uint64_t Lap(std::uint64_t index) {
 static_assert(Lap(14 * numSlots) >> lapShift == 15 && Lap(15 * numSlots) == Lap(0),
               "The number of a lap has its bits to itself.");
 
-// A place that code calls from, by its return address. Those in the run-time libraries of C and C++
-// are passed over: for them the table keeps how far away on the stack the next return address is.
+// A place that code calls from, by its return address. One that is passed on the way to the caller
+// keeps how far away on the stack the next return address is: those in the run-time libraries of C
+// and C++, and for whole stacks all but the outermost.
 struct Caller {
     enum State : std::uint32_t { Unknown, Final, Passed, Variable };
 
@@ -66,7 +68,18 @@ struct Caller {
     std::uint32_t module;                // Index into the modules.
     std::uint64_t frameSize;             // Of Passed.
 };
-constexpr std::size_t numCallers = maxGroup + 1;  // The last stands for all others.
+constexpr std::size_t numCallers = 1U << 16;
+constexpr std::size_t maxCaller = numCallers - 1;  // The last stands for all others.
+
+// The callers of a block, the innermost first. Stacks of one hash are taken for the same.
+struct Stack {
+    std::atomic<std::uint64_t> hash;    // 0 while the place in the table is free.
+    std::atomic<std::uint32_t> first;   // Index into the frames.
+    std::atomic<std::uint32_t> number;  // Of its frames. Stored last.
+};
+constexpr std::size_t numStacks = maxGroup + 1;  // The last stands for all others.
+constexpr std::size_t maxDepth = 64;
+constexpr std::size_t numFrames = std::size_t{1} << 24;
 
 struct Module {
     std::uint64_t base;
@@ -86,6 +99,7 @@ struct Channel {
     alignas(64) std::uint64_t magic;
     std::atomic<std::uint64_t> tail;  // Slots drained.
     By by;
+    std::uint32_t depth;                     // The most frames of a stack, up to maxDepth.
     std::int32_t pid;                        // Of the program, and of no child of it.
     std::int32_t parentPid;                  // Of the process that drains the channel.
     std::int32_t descriptor;                 // Of the channel, in that process.
@@ -95,6 +109,7 @@ struct Channel {
     std::atomic<std::uint32_t> numWaiting;   // Threads that wait.
     std::atomic<std::uint32_t> modulesUsed;  // The index of the last one.
     std::atomic<std::uint32_t> modulesLock;
+    std::atomic<std::uint32_t> framesUsed;
 
     // Written at every event.
     alignas(64) std::atomic<std::uint64_t> head;  // Slots taken.
@@ -116,6 +131,8 @@ struct Channel {
     alignas(64) Slot slots[numSlots];
     Caller callers[numCallers];
     Module modules[numModules];
+    Stack stacks[numStacks];
+    std::uint16_t frames[numFrames];  // Indices of callers.
 };
 constexpr std::uint64_t channelMagic = 0x3131'4C4E'4843'504D;
 

@@ -11,6 +11,8 @@
 #include <climits>
 #include <cstring>
 
+#include "trace/CutText.hpp"
+
 namespace Recorder {
 
 namespace {
@@ -30,7 +32,7 @@ std::uint64_t AddressOf(std::uint64_t where) {
 }  // namespace
 
 Collector::Collector(Channel& fromChannel, Trace::CompactWriter& toWriter, bool ofPools)
-    : channel(fromChannel), writer(toWriter), isOfPools(ofPools), knownPools(numCallers + 1) {
+    : channel(fromChannel), writer(toWriter), isOfPools(ofPools), knownPools(numStacks + 1) {
     if (!isOfPools) { writer.WriteOwned(); }
 }
 
@@ -130,6 +132,7 @@ void Collector::EndPools() {
     }
     pools.clear();
     symbols = {};
+    callerNames.clear();
     if (!isOfPools) { writer.WriteOwned(); }
 }
 
@@ -140,6 +143,7 @@ const Slot& Collector::NextData(std::uint64_t& index) const {
 std::uint64_t Collector::NumberOfPool(std::uint64_t group, std::uint64_t thread) const {
     switch (channel.by) {
         case By::Caller:
+        case By::Stack:
             return group + 1;
         case By::Module:
             return channel.callers[group].module + 1;
@@ -163,15 +167,37 @@ std::uint64_t Collector::PoolOf(std::uint64_t group, std::uint64_t thread) {
     return pool;
 }
 
+const std::string& Collector::NameOfCaller(std::uint64_t number) {
+    const auto [place, isNew] = callerNames.try_emplace(number, "other callers");
+    if (isNew && number != maxCaller) {
+        constexpr std::size_t longest = 1000;  // So that the names of a stack fit into a text.
+        const Caller& caller = channel.callers[number];
+        std::string& name = place->second;
+        name =
+            Trace::CutText(symbols.Name(channel.modules[caller.module], caller.address), longest);
+        std::replace(name.begin(), name.end(), ';', ',');
+    }
+    return place->second;
+}
+
 std::string Collector::NameOfPool(std::uint64_t group, std::uint64_t pool) {
-    const Caller& caller = channel.callers[group];
-    const Module& module = channel.modules[caller.module];
     switch (channel.by) {
         case By::Caller:
-            return group == maxGroup ? "other callers"
-                                     : symbols.Name(module, caller.address.load());
-        case By::Module:
-            return caller.module == 0 ? "no module" : NameOf(module);
+            return NameOfCaller(group);
+        case By::Module: {
+            const std::uint32_t module = channel.callers[group].module;
+            return module == 0 ? "no module" : NameOf(channel.modules[module]);
+        }
+        case By::Stack: {
+            // The outermost first, as tools that draw stacks take them.
+            const Stack& stack = channel.stacks[group];
+            std::string name = group == maxGroup ? "other stacks" : "";
+            for (std::uint32_t index = stack.number.load(); index-- != 0;) {
+                name += (name.empty() ? "" : ";") +
+                        NameOfCaller(channel.frames[stack.first.load() + index]);
+            }
+            return name;
+        }
         case By::Thread:
             return "thread " + std::to_string(pool);
         case By::All:

@@ -7,6 +7,7 @@
 #include <cstdint>
 #include <set>
 #include <string>
+#include <unordered_map>
 #include <vector>
 
 #include "record/Channel.hpp"
@@ -34,11 +35,13 @@ private:
     std::uint64_t PoolOf(std::uint64_t group, std::uint64_t thread);
     std::uint64_t NumberOfPool(std::uint64_t group, std::uint64_t thread) const;
     void EndPools();
+    const std::string& NameOfCaller(std::uint64_t number);
     std::string NameOfPool(std::uint64_t group, std::uint64_t pool);
 
     Channel& channel;
     Trace::CompactWriter& writer;
     Symbols symbols;
+    std::unordered_map<std::uint64_t, std::string> callerNames;
     const bool isOfPools;
     std::vector<bool> knownPools;   // Groups of the heap that have a pool.
     std::set<std::uint64_t> pools;  // Live pools of the library.

@@ -113,9 +113,8 @@ struct CallSite {
 inline void RecordAllocated(Channel& channel, const void* block, std::size_t size,
                             const CallSite& site) {
     if (block == nullptr) { return; }
-    const bool isByCaller = channel.by == By::Caller || channel.by == By::Module;
     const std::uint64_t group =
-        isByCaller ? FindCaller(channel, site.returnAddress, site.frame) : 0;
+        channel.by >= By::Caller ? FindGroup(channel, site.returnAddress, site.frame) : 0;
     Put(channel, Op::Allocated, block, size, group);
 }
 

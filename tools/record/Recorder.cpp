@@ -130,6 +130,13 @@ void TakeOver(Channel& channel) {
         caller.address.store(0);
         caller.state.store(Caller::Unknown);
     }
+    if (channel.by == By::Stack) {
+        for (Stack& stack : channel.stacks) {
+            stack.number.store(0);
+            stack.hash.store(0);
+        }
+        channel.framesUsed.store(0);
+    }
     channel.modulesUsed.store(0);
     channel.modulesLock.store(0);
 }

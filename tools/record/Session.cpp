@@ -185,7 +185,7 @@ void WriteStart(Trace::CompactWriter& writer, const Order& order) {
     for (const std::string& word : order.command) {
         commandLine += (commandLine.empty() ? "" : " ") + word;
     }
-    constexpr const char* names[] = {"all", "caller", "module", "thread"};
+    constexpr const char* names[] = {"all", "thread", "caller", "module", "stack"};
     WriteInfo(writer, "program", commandLine);
     WriteInfo(writer, "by", order.pools ? "pools" : names[static_cast<std::size_t>(order.by)]);
 }
@@ -284,6 +284,7 @@ Outcome RecordProgram(const Order& order) {
 
     const SharedChannel channel;
     channel->by = order.by;
+    channel->depth = order.by == By::Stack ? order.depth : maxDepth;
     Skip(*channel, order.skipped);
     Collector collector(*channel, writer, order.pools);
     const TickRate rate;

@@ -15,6 +15,7 @@ struct Order {
     std::vector<std::string> command;  // The program and its arguments.
     std::string tracePath;             // "-" is the standard output.
     By by = By::All;
+    unsigned int depth = 32;           // The most frames of a stack.
     std::vector<std::string> skipped;  // Patterns of functions that are not callers.
     bool pools = false;                // Records the calls of Mgr instead of the heap's.
 };

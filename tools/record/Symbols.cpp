@@ -44,6 +44,18 @@ std::string Demangled(const char* symbol) {
     return status == 0 ? Shortened(name.get()) : symbol;
 }
 
+// ", file.c:12" if there is debug information.
+std::string Line(Dwfl_Module& module, std::uint64_t address) {
+    int number = 0;
+    Dwfl_Line* const line = dwfl_module_getsrc(&module, address);
+    const char* const path = line == nullptr
+                                 ? nullptr
+                                 : dwfl_lineinfo(line, nullptr, &number, nullptr, nullptr, nullptr);
+    if (path == nullptr) { return ""; }
+    const std::string file = path;
+    return ", " + file.substr(file.rfind('/') + 1) + ":" + std::to_string(number);
+}
+
 void Close(Dwfl* file) {
     if (file != nullptr) { dwfl_end(file); }
 }
@@ -66,7 +78,8 @@ std::string Symbols::Name(const Module& module, std::uint64_t address) {
             const char* const name = dwfl_module_addrinfo(found, address - 1, &offset, &symbol,
                                                           nullptr, nullptr, nullptr);
             if (name != nullptr) {
-                return Demangled(name) + "+" + Hex(offset + 1) + " (" + file + ")";
+                return Demangled(name) + "+" + Hex(offset + 1) + " (" + file +
+                       Line(*found, address - 1) + ")";
             }
         }
     }

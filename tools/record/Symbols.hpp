@@ -19,7 +19,8 @@ std::string NameOf(const Module& module);
 
 class Symbols {
 public:
-    // "function+0x1f (file)" for a return address, or "file+0x1234" where the function has no name.
+    // "function+0x1f (file)" for a return address, "function+0x1f (file, source.c:12)" where there
+    // is debug information, or "file+0x1234" where the function has no name.
     std::string Name(const Module& module, std::uint64_t address);
 
 private:
