@@ -370,6 +370,67 @@ TEST(Analysis, SetsOnePoolBesideThoseOfTheGroups) {
     EXPECT_LT(one.timeline.back().most.pools, 3000U);
 }
 
+// A caller's stacks are one pool, as if the recording had been by caller.
+TEST(Analysis, JoinsTheStacksOfACaller) {
+    const std::vector<std::pair<std::string, std::string>> stacks = {
+        {"main+0x1 (p);parse+0x2 (p);void std::list::add(int)+0x3 (p)", "parse+0x2 (p)"},
+        {"main+0x1 (p);parse+0x2 (p);xmalloc+0x8 (p);p+0x44 (libc.so.6)", "parse+0x2 (p)"},
+        {"main+0x1 (p);parse+0x9 (p, p.c:3);operator new(unsigned long)+0x3 (q)",
+         "parse+0x9 (p, p.c:3)"},
+        {"main+0x1 (p)", "main+0x1 (p)"}};
+    std::map<std::string, std::string> pools;
+    std::string byStack = "xmpt:i:by:stack\n";
+    std::string byCaller = "xmpt:i:by:caller\n";
+    for (std::size_t i = 0; i < stacks.size(); ++i) {
+        const auto [place, isNew] = pools.try_emplace(stacks[i].second, 1, '0' + i);
+        const auto lines = [&](const std::string& pool, const std::string& name, bool creates) {
+            const std::string at = ":000000000000000" + pool;
+            const std::string block = at + ":00000000000000" + std::to_string(10 + i) + ":";
+            return (creates ? "xmpt:c" + at + "\nxmpt:n" + at + ":" + name + "\n" : "") + "xmpt:a" +
+                   block + std::to_string(100 * i + 8) + (i == 1 ? "\nxmpt:f" + block : "") + "\n";
+        };
+        byStack += lines(std::to_string(i), stacks[i].first, true);
+        byCaller += lines(place->second, stacks[i].second, isNew);
+    }
+    const Report::Analysis analysis = Analyse(byStack + "xmpt:d:0000000000000000\n");
+    const auto json = nlohmann::json::parse(Report::ToJson(analysis));
+    const auto plain = nlohmann::json::parse(Report::ToJson(Analyse(byCaller)));
+    ASSERT_EQ(json["groups"].size(), 3U);
+    for (std::size_t i = 0; i < 3; ++i) {
+        EXPECT_EQ(json["groups"][i]["name"], plain["groups"][i]["name"]);
+        EXPECT_EQ(json["groups"][i]["at_peak"], plain["groups"][i]["at_peak"]);
+    }
+    for (const char* held : {"asked", "pools", "heap"}) {
+        EXPECT_EQ(json["most"][held], plain["most"][held]) << held;
+    }
+    EXPECT_EQ(json["groups"][2]["stack"],
+              (std::vector<std::string>{"main+0x1 (p)", "parse+0x2 (p)",
+                                        "void std::list::add(int)+0x3 (p)"}));
+    EXPECT_EQ(json["stacks"][0]["frames"], std::vector<std::string>{"main+0x1 (p)"});
+    EXPECT_EQ(json["stacks"][3]["bytes"], 108);
+    EXPECT_EQ(json["stacks"][3]["at_peak"]["bytes"], 0);
+    EXPECT_TRUE(analysis.passingOn.empty());
+}
+
+TEST(Stack, FindsWhatPassesMemoryOn) {
+    std::vector<Report::StackRow> stacks;
+    for (const char* caller : {"a", "b", "c"}) {
+        stacks.push_back(
+            {{"main+0x1 (p)", std::string(caller) + "+0x1 (p)",
+              "make(int)+0x" + std::to_string(stacks.size()) + " (p)", "xmalloc+0x1 (p)"},
+             {30, 30},
+             {}});
+    }
+    EXPECT_EQ(Report::FindPassingOn(stacks, {}), Report::Skipped{"make"});
+    EXPECT_EQ(Report::FindPassingOn(stacks, {"ma*"}), Report::Skipped{});
+    stacks.push_back({{"main+0x1 (p)", "rest+0x1 (p)"}, {10, 10}, {}});
+    EXPECT_EQ(Report::FindPassingOn(stacks, {}), Report::Skipped{"make"});
+    stacks.back().all.blocks = 11;
+    EXPECT_EQ(Report::FindPassingOn(stacks, {}), Report::Skipped{}) << "Less than 90 %.";
+    stacks.resize(2);
+    EXPECT_EQ(Report::FindPassingOn(stacks, {}), Report::Skipped{}) << "Too few callers.";
+}
+
 TEST(Json, CutsNamesBetweenCharacters) {
     const Report::Analysis analysis =
         Analyse(Lines("@c:P\n@n:P:a\u00fc\u00fc\u00fc\u00fc\u00fcb\n@a:P:X:8\n@c:Q\n"));

@@ -24,11 +24,13 @@ def write_trace(path):
     """Groups of several sizes and lifetimes, one with a name that HTML could take for markup."""
     chance = random.Random(3)
     names = [HOSTILE, "parse_tree(Node const&)"] + [f"caller_{i}" for i in range(40)]
+    stacks = names[:1] + [f"main+0x9 (demo);{'loop+0x5 (demo);' if i % 2 else ''}{name};xmalloc+0x1 (demo)"
+                          for i, name in enumerate(names[1:])]
     with open(path, "w", encoding="utf-8") as out:
-        for key, value in (("program", "demo <i>"), ("by", "caller"), ("threads", "2"),
+        for key, value in (("program", "demo <i>"), ("by", "stack"), ("threads", "2"),
                            ("cpu_seconds", "1.5"), ("allocation_share", "0.25")):
             out.write(f"xmpt:i:{key}:{value}\n")
-        for pool, name in enumerate(names):
+        for pool, name in enumerate(stacks):
             out.write(f"xmpt:c:{pool:016x}\nxmpt:n:{pool:016x}:{name}\n")
         live = [[] for _ in names]
         for step in range(20000):
@@ -227,6 +229,32 @@ class PageTest(unittest.TestCase):
         for top, total in zip(tops[-1], sums):
             self.assertAlmostEqual(236 - top, total * scale, delta=0.01)
 
+    def test_stacks_are_as_wide_as_their_bytes(self):
+        drawn = self.frames()
+        depths = {}
+        for stack in self.json["stacks"]:
+            for depth, frame in enumerate(stack["frames"], 1):
+                key = (frame.replace("+0x9", "").replace("+0x5", "").replace("+0x1", ""), depth)
+                depths[key] = depths.get(key, 0) + stack["at_peak"]["bytes"]
+        scale = drawn["all stacks", 0] / self.json["peak"]["asked"]
+        for (name, depth), size in depths.items():
+            if name.startswith("xmalloc") or size * scale < 2:
+                continue
+            self.assertAlmostEqual(drawn[name, depth], size * scale, delta=0.02 * size * scale, msg=name)
+        self.browser.execute_script(
+            "d3.selectAll('#stacks rect.frame').filter(frame => frame.name === 'loop (demo)').each("
+            "function (frame) { d3.select(this).on('click')(frame); })")
+        widened = self.frames()
+        self.assertAlmostEqual(widened["loop (demo)", 2], drawn["all stacks", 0], delta=0.1)
+        self.assertAlmostEqual(widened["main (demo)", 1], drawn["all stacks", 0], delta=0.1)
+        self.assertNotIn((HOSTILE, 1), widened)
+
+    def frames(self):
+        return {(name, round(top / 22)): width for name, top, width in self.browser.execute_script(
+            "return Array.from(document.querySelectorAll('#stacks rect.frame'), one => ["
+            "d3.select(one).datum().name, d3.transform(one.parentNode.getAttribute('transform'))"
+            ".translate[1], Number(one.getAttribute('width'))])")}
+
     def test_groups_sort_and_filter(self):
         groups = self.json["groups"]
         names = "#groups tbody td.name"
@@ -257,7 +285,7 @@ class PageTest(unittest.TestCase):
             self.assertEqual(self.browser.execute_script(
                 "return getComputedStyle(document.getElementById('together').parentNode, '::before')"
                 ".content") != "none", width == 390)
-            for chart in ("peak", "growth", "timeline", "sizes", "lifetimes", "fill"):
+            for chart in ("peak", "stacks", "growth", "timeline", "sizes", "lifetimes", "fill"):
                 element = self.browser.find_element(By.CSS_SELECTOR, f"#{chart} > svg")
                 picture = Image.open(io.BytesIO(element.screenshot_as_png)).convert("L")
                 histogram = picture.histogram()

@@ -18,6 +18,7 @@
 #include "report/Analysis.hpp"
 #include "report/Json.hpp"
 #include "report/Page.hpp"
+#include "trace/OpenTrace.hpp"
 #include "trace/StepReader.hpp"
 
 namespace Tool {
@@ -32,7 +33,11 @@ constexpr const char* notes =
 the rules of the library and of the C library's malloc.
 
 event         An allocation, a release, a Clear, or the creation or the destruction of a pool.
-group         What the recording traced as one pool. Pools with the same name are one group.
+group         What the recording traced as one pool. Pools with the same name are one group, and so are
+              the call stacks of one caller: the innermost frame whose function does more than pass
+              memory on. A function only passes memory on by its name (see 'mempool record --help'),
+              by --skip, or if at least three functions ask it for at least 90 % of the blocks that
+              its file asks for.
 the peak      The first moment with the most requested bytes.
 bytes held    By pools: buckets, heap records and tables. By the heap: blocks as malloc rounds them,
               with its header of 8 bytes per block; the last line is without headers. Unused memory
@@ -54,27 +59,30 @@ command line come from their environment variables, such as NUV_OBR_MEMPOOL_BUCK
 
 struct Options {
     std::string path;
+    Report::Skipped skipped;  // Patterns of functions that are not callers.
     OBR::MemPool::PoolSettings settings;
     bool all = false;
     bool json = false;  // Instead of the text.
-    std::string html;   // The file of the page; "-" writes only the page, to standard output. Empty
-                        // for no page.
+    bool folded = false;
+    std::string html;  // The file of the page; "-" writes only the page, to standard output. Empty
+                       // for no page.
 };
 
 // Returns the exit status.
 int WriteReport(Trace::StepReader& reader, const Options& options, System::OutputFile* page) {
     CheckSettings(options.settings);
-    const Progress progress(reader.Name());
-    const Report::Analysis analysis = Report::Analyse(reader, options.settings, [&](auto position) {
-        progress.Show("line " + std::to_string(position));
-    });
-    progress.Clear();
-
+    const Report::Analysis analysis =
+        AnalyseTrace(reader, options.path, options.settings, options.skipped);
+    if (options.folded && analysis.stacks.empty()) {
+        throw std::runtime_error(reader.Name() + ": has no call stacks: record it with --stacks");
+    }
     if (options.html == "-") {
         WritePage(*page, analysis);
         return WarnOfBrokenTrace(reader);
     }
-    if (options.json) {
+    if (options.folded) {
+        PrintFolded(std::cout, analysis);
+    } else if (options.json) {
         std::cout << Report::ToJson(analysis) << '\n';
     } else {
         PrintAnalysis(std::cout, analysis, options.all ? Extent::All : Extent::Page);
@@ -96,6 +104,20 @@ int ReportOn(const Options& options) {
 }
 
 }  // namespace
+
+Report::Analysis AnalyseTrace(Trace::StepReader& reader, const std::string& path,
+                              const OBR::MemPool::PoolSettings& settings, Report::Skipped skipped) {
+    while (true) {
+        const Progress progress(reader.Name());
+        Report::Analysis analysis = Report::Analyse(
+            reader, settings,
+            [&](auto position) { progress.Show("line " + std::to_string(position)); }, skipped);
+        progress.Clear();
+        if (analysis.passingOn.empty() || path == "-") { return analysis; }
+        skipped.insert(skipped.end(), analysis.passingOn.begin(), analysis.passingOn.end());
+        reader = Trace::StepReader(Trace::OpenTrace(path), reader.Name());
+    }
+}
 
 std::unique_ptr<System::OutputFile> OpenPage(const std::string& path,
                                              const std::vector<std::string>& inputs) {
@@ -122,6 +144,15 @@ void AddReport(Program& program) {
             "--html", options->html,
             "Also write a page with charts to FILE; - writes only the page, to standard output")
         ->type_name("FILE");
+    report
+        .add_flag("--folded", options->folded,
+                  "Print the call stacks at the peak for flame graph tools")
+        ->excludes("--json");
+    report
+        .add_option("--skip", options->skipped,
+                    "Functions that match PATTERN are not callers of stacks; may be repeated")
+        ->type_name("PATTERN")
+        ->allow_extra_args(false);
     report.add_flag("--all", options->all, "Print every size and every group");
     AddSettings(report, options->settings);
     report.callback([&program, &report, options] {

@@ -250,6 +250,17 @@ void PrintGroups(std::ostream& out, const Analysis& analysis, Extent extent) {
 
 }  // namespace
 
+void PrintFolded(std::ostream& out, const Analysis& analysis) {
+    for (const Report::StackRow& stack : analysis.stacks) {
+        if (stack.atPeak.bytes == 0) { continue; }
+        std::string line;
+        for (const std::string& frame : stack.frames) {
+            line += (line.empty() ? "" : ";") + Report::FunctionOf(frame);
+        }
+        out << SafeText(line) << ' ' << stack.atPeak.bytes << '\n';
+    }
+}
+
 void PrintAnalysis(std::ostream& out, const Analysis& analysis, Extent extent) {
     out << SafeText(analysis.trace) << '\n';
     if (extent != Extent::Short) { PrintBadLines(out, analysis.trace, analysis.badLines); }

@@ -16,6 +16,9 @@ enum class Extent : std::uint8_t {
     All,    // Every size and every group.
 };
 
+// A line per stack that has blocks at the peak: its functions, the outermost first, and its bytes.
+void PrintFolded(std::ostream& out, const Report::Analysis& analysis);
+
 void PrintAnalysis(std::ostream& out, const Report::Analysis& analysis, Extent extent);
 
 }  // namespace Tool

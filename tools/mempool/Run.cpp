@@ -94,11 +94,8 @@ Trace::StepReader Open(const NamelessFile& trace, const Options& options) {
 
 void ReportOn(const NamelessFile& trace, const Options& options, System::OutputFile* page) {
     Trace::StepReader reader = Open(trace, options);
-    const Progress progress("mempool");
     const Report::Analysis analysis =
-        Report::Analyse(reader, OBR::MemPool::PoolSettings(),
-                        [&](auto position) { progress.Show("event " + std::to_string(position)); });
-    progress.Clear();
+        AnalyseTrace(reader, trace.Path(), OBR::MemPool::PoolSettings(), {});
     std::cerr << '\n';
     PrintAnalysis(std::cerr, analysis, Extent::Short);
     if (page != nullptr) { WritePage(*page, analysis); }

@@ -7,7 +7,6 @@
 
 #include <dlfcn.h>
 #include <fnmatch.h>
-#include <strings.h>
 #include <sys/auxv.h>
 #include <unistd.h>
 #include <unwind.h>
@@ -16,7 +15,8 @@
 #include <cstddef>
 #include <cstring>
 #include <ctime>
-#include <initializer_list>
+
+#include "trace/PassingOn.hpp"
 
 namespace Recorder {
 
@@ -61,28 +61,9 @@ _Unwind_Reason_Code AddFrame(_Unwind_Context* context, void* toFrames) {
     return _URC_NO_REASON;
 }
 
-bool IsRuntime(const char* path) {
-    const char* const slash = std::strrchr(path, '/');
-    const char* const name = slash == nullptr ? path : slash + 1;
-    for (const char* start :
-         {"libc.so", "libc-", "libstdc++.so", "libgcc_s.so", "libc++.so", "libc++abi.so",
-          "ld-linux", "libm.so", "libpthread.so", "libmempool-record"}) {
-        if (std::strncmp(name, start, std::strlen(start)) == 0) { return true; }
-    }
-    return false;
-}
-
-// Whether the function only passes on what an allocator gives: one of the malloc family by its
-// name, operator new, one of the C++ library, or one that the user has named.
+// One that passes memory on by its name, or that the user has named.
 bool IsWrapper(const Channel& channel, const char* function) {
-    for (const char* start : {"_Zn", "_ZSt", "_ZNSt", "_ZNKSt", "_ZN9__gnu_cxx"}) {
-        if (std::strncmp(function, start, std::strlen(start)) == 0) { return true; }
-    }
-    for (const char* part : {"malloc", "calloc", "realloc", "memalign", "strdup", "strndup"}) {
-        if (strcasestr(function, part) != nullptr) { return true; }
-    }
-    const std::size_t size = std::strlen(function);
-    if (size >= 5 && strcasecmp(function + size - 5, "alloc") == 0) { return true; }
+    if (Trace::PassesOn(function)) { return true; }
     const char* pattern = channel.skipped;
     while (*pattern != '\0' && fnmatch(pattern, function, 0) != 0) {
         pattern += std::strlen(pattern) + 1;
@@ -150,8 +131,9 @@ bool Enter(Channel& channel, const Frame& frame, std::uint64_t frameSize) {
     caller.module = isKnown ? FindModule(channel, info) : 0;
     const bool isWrapper =
         channel.by == By::Caller && info.dli_sname != nullptr && IsWrapper(channel, info.dli_sname);
-    const bool isPassed = frameSize != 0 && (channel.by == By::Stack ||
-                                             (isKnown && (isWrapper || IsRuntime(info.dli_fname))));
+    const bool isPassed =
+        frameSize != 0 &&
+        (channel.by == By::Stack || (isKnown && (isWrapper || Trace::IsRuntime(info.dli_fname))));
     caller.frameSize = frameSize;
     caller.state.store(isPassed ? Caller::Passed : Caller::Final, std::memory_order_release);
     return isPassed;

@@ -3,6 +3,7 @@
 #include "report/Analysis.hpp"
 
 #include <algorithm>
+#include <array>
 #include <cstddef>
 #include <set>
 #include <tuple>
@@ -25,8 +26,8 @@ const std::string& NameOf(const Trace::Pool& pool) {
 
 class Analyst {
 public:
-    explicit Analyst(const OBR::MemPool::PoolSettings& settings)
-        : pools(settings), onePool(settings) {
+    Analyst(const OBR::MemPool::PoolSettings& settings, Skipped skippedFunctions)
+        : skipped(std::move(skippedFunctions)), pools(settings), onePool(settings) {
         result.settings = settings;
         onePool.Create(0);
     }
@@ -39,17 +40,20 @@ public:
         const std::uint64_t formerAllocation = std::exchange(allocation, 0);
         switch (step.kind) {
             case Trace::Kind::Created:
-                rows.emplace_back();
-                pools.Create(step.pool);
-                livePools.insert(step.pool);
+                if (rowOf.empty()) { isByStack = IsByStack(reader.Facts()); }
+                rowOf.push_back(isByStack ? noRow : AddRow({}));
+                stacks.resize(isByStack ? rowOf.size() : 0);
                 break;
             case Trace::Kind::Allocated:
+                if (rowOf[step.pool] == noRow) {
+                    FindRow(step.pool, NameOf(reader.Blocks().Pools()[step.pool]));
+                }
                 Allocate(step.pool, step.block);
                 allocation = result.events;
                 break;
             case Trace::Kind::Freed:
                 ++result.frees;
-                pools.Free(step.pool, alive[step.block.index].place, step.block.size);
+                pools.Free(rowOf[step.pool], alive[step.block.index].place, step.block.size);
                 Release(step.pool, step.block,
                         alive[step.block.index].since == formerAllocation ? End::FreedAtOnce
                                                                           : End::Freed);
@@ -57,12 +61,9 @@ public:
             case Trace::Kind::Cleared:
                 ++result.clears;
                 Drop(step.pool, reader.Blocks().Dropped(), End::Cleared);
-                pools.Clear(step.pool);
                 break;
             case Trace::Kind::Destroyed:
                 Drop(step.pool, reader.Blocks().Dropped(), End::Destroyed);
-                pools.Destroy(step.pool);
-                livePools.erase(step.pool);
                 break;
             case Trace::Kind::Named:
             case Trace::Kind::Info:
@@ -89,6 +90,7 @@ public:
         }
         JoinGroups(reader.Blocks().Pools());
         AddGrowth(reader.Blocks().Pools());
+        AddStacks(reader.Blocks().Pools());
         return std::move(result);
     }
 
@@ -98,24 +100,54 @@ private:
         Place place;
         Place placeInOne;
     };
-    struct PoolRow {
+    struct Row {
+        std::string name;  // Empty for that of the traced pool.
         Tally tally;
         Runs runs;
     };
-    // Live bytes by traced pool.
+    // Live bytes by row.
     struct LiveColumn {
         std::uint64_t event = 0;
         std::optional<std::uint64_t> milliseconds;
-        std::vector<std::pair<std::uint32_t, std::uint64_t>> pools;
+        std::vector<std::pair<std::uint32_t, std::uint64_t>> rows;
     };
+    static constexpr std::uint32_t noRow = ~std::uint32_t{0};
+
+    static bool IsByStack(const std::map<std::string, std::string>& facts) {
+        const auto by = facts.find("by");
+        return by != facts.end() && by->second == "stack";
+    }
+
+    std::uint32_t AddRow(std::string name) {
+        const auto row = static_cast<std::uint32_t>(rows.size());
+        rows.push_back({std::move(name), {}, {}});
+        pools.Create(row);
+        liveRows.insert(row);
+        return row;
+    }
+
+    // Of a stack: the row of its caller.
+    void FindRow(std::uint32_t pool, const std::string& stack) {
+        const std::vector<std::string> frames = FramesOf(stack);
+        const std::string& name = frames[CallerIn(frames, skipped)];
+        const auto [place, isNew] = rowsByName.try_emplace(name, noRow);
+        if (isNew) { place->second = AddRow(name); }
+        rowOf[pool] = place->second;
+    }
+
+    std::array<Tally*, 4> Tallies(std::uint32_t pool, std::uint32_t size) {
+        return {&result.total, &sizes.Row(size).tally, &rows[rowOf[pool]].tally,
+                isByStack ? &stacks[pool] : &noStack};
+    }
 
     void Allocate(std::uint32_t pool, const Trace::Block& block) {
-        rows[pool].runs.End(rows[pool].tally.live.blocks);
+        const std::uint32_t row = rowOf[pool];
+        rows[row].runs.End(rows[row].tally.live.blocks);
         SizeRow& sizeRow = sizes.Row(block.size);
         if (sizeRow.tally.all.blocks == 0) { sizeRow.smallest = block.size; }
         sizeRow.smallest = std::min(sizeRow.smallest, block.size);
         sizeRow.largest = std::max(sizeRow.largest, block.size);
-        for (Tally* const tally : {&result.total, &sizeRow.tally, &rows[pool].tally}) {
+        for (Tally* const tally : Tallies(pool, block.size)) {
             tally->Change(result.events, result.peak.event);
             tally->live.Add(block.size);
             tally->all.Add(block.size);
@@ -125,7 +157,7 @@ private:
         }
         heapBytes += MallocBytes(block.size);
         if (alive.size() <= block.index) { alive.resize(block.index + std::size_t{1}); }
-        alive[block.index] = {result.events, pools.Allocate(pool, block.size),
+        alive[block.index] = {result.events, pools.Allocate(row, block.size),
                               onePool.Allocate(0, block.size)};
     }
 
@@ -134,10 +166,9 @@ private:
         const Alive& was = alive[block.index];
         onePool.Free(0, was.placeInOne, block.size);
         heapBytes -= MallocBytes(block.size);
-        rows[pool].runs.Release(1);
+        rows[rowOf[pool]].runs.Release(1);
         const std::size_t bin = LifetimeBin(result.events - was.since);
-        for (Tally* const tally :
-             {&result.total, &sizes.Row(block.size).tally, &rows[pool].tally}) {
+        for (Tally* const tally : Tallies(pool, block.size)) {
             tally->Change(result.events, result.peak.event);
             tally->live.Remove(block.size);
             if (end == End::Destroyed) {
@@ -151,8 +182,20 @@ private:
     }
 
     void Drop(std::uint32_t pool, const std::vector<Trace::Block>& dropped, End end) {
-        for (const Trace::Block& block : dropped) { Release(pool, block, end); }
+        const std::uint32_t row = rowOf[pool];
+        for (const Trace::Block& block : dropped) {
+            // The pool of a caller lasts while one of its stacks goes.
+            if (isByStack) { pools.Free(row, alive[block.index].place, block.size); }
+            Release(pool, block, end);
+        }
         if (result.total.live.blocks == 0) { onePool.Clear(0); }
+        if (isByStack) { return; }
+        if (end == End::Cleared) {
+            pools.Clear(row);
+        } else {
+            pools.Destroy(row);
+            liveRows.erase(row);
+        }
     }
 
     // Called after each event.
@@ -167,8 +210,8 @@ private:
         if (LiveColumn* const column = growth.At(now.event)) {
             column->event = now.event;
             column->milliseconds = milliseconds;
-            for (const std::uint32_t pool : livePools) {
-                column->pools.emplace_back(pool, rows[pool].tally.live.bytes);
+            for (const std::uint32_t row : liveRows) {
+                column->rows.emplace_back(row, rows[row].tally.live.bytes);
             }
         }
         if (std::tie(now.asked, now.blocks) > std::tie(result.peak.asked, result.peak.blocks)) {
@@ -183,18 +226,23 @@ private:
         most.chunks = std::max(most.chunks, now.chunks);
     }
 
+    // Without stacks the rows are those of the traced pools.
+    const std::string& NameOfRow(std::size_t row, const std::vector<Trace::Pool>& traced) const {
+        return rows[row].name.empty() ? NameOf(traced[row]) : rows[row].name;
+    }
+
     void JoinGroups(const std::vector<Trace::Pool>& traced) {
         std::map<std::string, std::size_t> places;
-        for (std::size_t pool = 0; pool < rows.size(); ++pool) {
-            rows[pool].tally.Finish(result.peak.event);
-            rows[pool].runs.End(rows[pool].tally.live.blocks);
-            const std::string& name = NameOf(traced[pool]);
+        for (std::size_t row = 0; row < rows.size(); ++row) {
+            rows[row].tally.Finish(result.peak.event);
+            rows[row].runs.End(rows[row].tally.live.blocks);
+            const std::string& name = NameOfRow(row, traced);
             const auto [place, isNew] = places.try_emplace(name, result.groups.size());
-            if (isNew) { result.groups.push_back({name, 0, {}, {}}); }
+            if (isNew) { result.groups.push_back({name, 0, {}, {}, {}}); }
             GroupRow& group = result.groups[place->second];
             ++group.numPools;
-            group.tally.Add(rows[pool].tally);
-            group.runs.Add(rows[pool].runs);
+            group.tally.Add(rows[row].tally);
+            group.runs.Add(rows[row].runs);
         }
         for (const GroupRow& group : result.groups) { result.runs.Add(group.runs); }
         std::sort(result.groups.begin(), result.groups.end(),
@@ -212,8 +260,8 @@ private:
         const std::vector<std::uint64_t> nothing(numGrowing + 1);
         for (const LiveColumn& column : growth.Columns()) {
             result.growth.push_back({column.event, column.milliseconds, nothing});
-            for (const auto& [pool, bytes] : column.pools) {
-                const auto place = places.find(NameOf(traced[pool]));
+            for (const auto& [row, bytes] : column.rows) {
+                const auto place = places.find(NameOfRow(row, traced));
                 result.growth.back().live[place != places.end() ? place->second : numGrowing] +=
                     bytes;
             }
@@ -230,17 +278,47 @@ private:
         }
     }
 
+    // After JoinGroups.
+    void AddStacks(const std::vector<Trace::Pool>& traced) {
+        for (std::size_t pool = 0; pool < stacks.size(); ++pool) {
+            if (rowOf[pool] == noRow) { continue; }
+            stacks[pool].Finish(result.peak.event);
+            result.stacks.push_back(
+                {FramesOf(NameOf(traced[pool])), stacks[pool].all, stacks[pool].atPeak});
+        }
+        std::sort(result.stacks.begin(), result.stacks.end(),
+                  [](const StackRow& a, const StackRow& b) {
+                      return std::tie(b.atPeak.bytes, b.all.bytes, a.frames) <
+                             std::tie(a.atPeak.bytes, a.all.bytes, b.frames);
+                  });
+        result.passingOn = FindPassingOn(result.stacks, skipped);
+        std::map<std::string, const StackRow*> largest;
+        for (const StackRow& stack : result.stacks) {
+            largest.try_emplace(stack.frames[CallerIn(stack.frames, skipped)], &stack);
+        }
+        for (GroupRow& group : result.groups) {
+            const auto place = largest.find(group.name);
+            if (place != largest.end()) { group.stack = place->second->frames; }
+        }
+    }
+
     Analysis result;
+    const Skipped skipped;
     PoolModel pools;
     PoolModel onePool;
     Sizes sizes;
-    std::vector<PoolRow> rows;  // By index of the traced pool.
+    std::vector<Row> rows;             // Of the traced pools, or of the callers of their stacks.
+    std::vector<std::uint32_t> rowOf;  // By index of the traced pool.
+    bool isByStack = false;
+    std::unordered_map<std::string, std::uint32_t> rowsByName;  // Of callers.
+    std::vector<Tally> stacks;  // By index of the traced pool, if each is a stack.
+    Tally noStack;              // In place of one.
     std::vector<Alive> alive;   // By index of the block.
     std::uint64_t heapBytes = 0;
     Timeline timeline;
     Samples<FillColumn> fill;
     Samples<LiveColumn> growth;
-    std::set<std::uint32_t> livePools;
+    std::set<std::uint32_t> liveRows;
     std::unordered_map<std::uint64_t, std::uint64_t>
         lastAllocations;  // By thread: the event of its last one, or 0 if another event followed.
 };
@@ -248,9 +326,10 @@ private:
 }  // namespace
 
 Analysis Analyse(Trace::StepReader& reader, const OBR::MemPool::PoolSettings& settings,
-                 const std::function<void(std::uint64_t position)>& atEvent) {
+                 const std::function<void(std::uint64_t position)>& atEvent,
+                 const Skipped& skipped) {
     constexpr std::uint64_t interval = 100000;
-    Analyst analyst(settings);
+    Analyst analyst(settings, skipped);
     Trace::Step step = {};
     for (std::uint64_t number = 1; reader.Next(step); ++number) {
         analyst.Take(step, reader);

@@ -4,8 +4,9 @@
 //
 // A *group* is what the recording traced as one pool: all blocks, or those of a caller, module,
 // thread or real pool. Traced pools with the same name are one group; without names, those with the
-// same address. An *event* is an allocation, a release, a Clear, or the creation or the destruction
-// of a pool.
+// same address. If the recording traced call stacks, the stacks of a caller are one group, as if
+// they were one pool. An *event* is an allocation, a release, a Clear, or the creation or the
+// destruction of a pool.
 
 #ifndef OBR_TOOLS_REPORT_ANALYSIS_HPP
 #define OBR_TOOLS_REPORT_ANALYSIS_HPP
@@ -24,6 +25,7 @@
 #include "report/PoolModel.hpp"
 #include "report/Runs.hpp"
 #include "report/Sizes.hpp"
+#include "report/Stack.hpp"
 #include "report/Tally.hpp"
 #include "report/Timeline.hpp"
 #include "trace/StepReader.hpp"
@@ -35,6 +37,7 @@ struct GroupRow {
     std::uint64_t numPools = 0;
     Tally tally;
     Runs runs;
+    std::vector<std::string> stack;  // The frames of its largest stack at the peak, if it has any.
 };
 
 // The live bytes of groups at one moment.
@@ -63,6 +66,8 @@ struct Analysis {
 
     std::vector<SizeRow> sizes;    // Those that occur, the smallest first.
     std::vector<GroupRow> groups;  // The largest at the peak first.
+    std::vector<StackRow> stacks;  // Likewise.
+    Skipped passingOn;             // Functions that only pass memory on, as the stacks show.
     std::vector<Point> timeline;
     std::vector<GrowthPoint> growth;  // Of at most `maxGrowing` groups. The peak is a point.
     std::vector<SizeClass> classes;   // At the end. For their sizes.
@@ -70,9 +75,10 @@ struct Analysis {
 };
 
 // Reads the trace to its end, and calls `atEvent` with the position from time to time. The settings
-// must be valid for a pool.
+// must be valid for a pool. Functions that are skipped are not callers.
 Analysis Analyse(Trace::StepReader& reader, const OBR::MemPool::PoolSettings& settings,
-                 const std::function<void(std::uint64_t position)>& atEvent);
+                 const std::function<void(std::uint64_t position)>& atEvent,
+                 const Skipped& skipped = {});
 
 }  // namespace Report
 

@@ -122,8 +122,21 @@ void AddGroups(Json& json, const Analysis& analysis, const JsonLimits& limits) {
         Json group = {{"name", Trace::CutText(row.name, limits.nameBytes)},
                       {"pools", row.numPools}};
         AddTally(group, row.tally);
+        group["stack"] = row.stack;
         group["together"] = ToJson(row.runs);
         json["groups"].push_back(std::move(group));
+    }
+}
+
+void AddStacks(Json& json, const Analysis& analysis, const JsonLimits& limits) {
+    json["num_stacks"] = analysis.stacks.size();
+    json["stacks"] = Json::array();
+    for (const StackRow& row : analysis.stacks) {
+        if (json["stacks"].size() == limits.stacks) { break; }
+        json["stacks"].push_back({{"frames", row.frames},
+                                  {"blocks", row.all.blocks},
+                                  {"bytes", row.all.bytes},
+                                  {"at_peak", ToJson(row.atPeak)}});
     }
 }
 
@@ -209,6 +222,7 @@ std::string ToJson(const Analysis& analysis, const JsonLimits& limits) {
     AddTotals(json, analysis);
     AddSizes(json, analysis);
     AddGroups(json, analysis, limits);
+    AddStacks(json, analysis, limits);
     AddTimeline(json, analysis);
     AddGrowth(json, analysis, limits);
     AddFill(json, analysis, limits);

@@ -16,6 +16,7 @@ struct JsonLimits {
     std::size_t groups = std::numeric_limits<std::size_t>::max();
     std::size_t nameBytes = std::numeric_limits<std::size_t>::max();
     std::size_t fillRows = std::numeric_limits<std::size_t>::max();
+    std::size_t stacks = std::numeric_limits<std::size_t>::max();
 };
 
 // One line in UTF-8, with the replacement character for bytes of a name that are not UTF-8.

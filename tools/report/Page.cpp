@@ -15,7 +15,7 @@ void CheckCanMakePage() {
 }
 
 std::string MakePage(const Analysis& analysis) {
-    constexpr JsonLimits limits = {1000, 500, 60};
+    constexpr JsonLimits limits = {1000, 500, 60, 500};
     std::string page(PageHead());
     // A name in the trace may look like the end of the data, so "<" is escaped.
     for (const char letter : ToJson(analysis, limits)) {

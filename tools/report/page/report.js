@@ -250,6 +250,63 @@ function peakBars() {
   byId("peak-note").text(shown.length < data.num_groups ? `The ${shown.length} largest of ${count(data.num_groups)}.` : "");
 }
 
+// The stacks at the peak as an icicle. A function is one frame, whatever the offsets of its calls. The
+// frames of the groups above have their colours.
+
+const functionOf = (frame) => frame.replace(/\+0x[0-9a-f]+(?= \()/, "").replace(/, [^()]*\)$/, ")");
+
+// A frame above all others, which are in `calls`.
+function stackTree() {
+  const root = {name: "all stacks", bytes: data.peak.asked, calls: []};
+  data.stacks.forEach((stack) => stack.frames.map(functionOf).reduce((frame, name) => {
+    let call = frame.calls.find((one) => one.name === name);
+    if (!call) { frame.calls.push(call = {name: name, bytes: 0, calls: []}); }
+    call.bytes += stack.at_peak.bytes;
+    return call;
+  }, root));
+  return root;
+}
+
+// All frames from this one on, each with its place.
+function placed(frame, from, depth) {
+  Object.assign(frame, {from: from, depth: depth});
+  return frame.calls.sort((a, b) => b.bytes - a.bytes).reduce((all, call) => {
+    const frames = placed(call, from, depth + 1);
+    from += call.bytes;
+    return all.concat(frames);
+  }, [frame]);
+}
+
+const stackFrames = data.stacks.length > 0 ? placed(stackTree(), 0, 0) : [];
+let widened = stackFrames[0];
+
+function stacks() {
+  if (stackFrames.length === 0) { return; }
+  byId("stacks-part").attr("hidden", null);
+  byId("stacks-note").text(data.stacks.length < data.num_stacks
+    ? `The ${count(data.stacks.length)} largest of ${count(data.num_stacks)} stacks.` : "");
+  const width = byId("stacks").node().clientWidth;
+  const x = d3.scale.linear().domain([widened.from, widened.from + widened.bytes]).range([0, width]).clamp(true);
+  const frameWidth = (frame) => x(frame.from + frame.bytes) - x(frame.from);
+  const shown = stackFrames.filter((frame) => frameWidth(frame) >= 1);
+  const row = 22;
+  const box = chart("stacks", (d3.max(shown, (frame) => frame.depth) + 1) * row, {left: 0, right: 0, top: 0, bottom: 0},
+    "Bytes at the peak by call stack", `${count(data.num_stacks)} stacks`);
+  const colourOf = {};
+  data.groups.slice(0, colours.length - 1).forEach((group, i) => {
+    if (!(functionOf(group.name) in colourOf)) { colourOf[functionOf(group.name)] = colours[i]; }
+  });
+  const frames = box.plot.selectAll("g").data(shown).enter().append("g")
+    .attr("transform", (frame) => `translate(${x(frame.from)},${frame.depth * row})`);
+  tipFor(frames.append("rect").attr({class: "frame", width: frameWidth, height: row})
+    .on("click", (frame) => { widened = frame; hideTip(); stacks(); }),
+    (frame) => `${frame.name}\n${bytes(frame.bytes)}, ${percent(frame.bytes, data.peak.asked)}`);
+  frames.filter((frame) => frame.name in colourOf).append("rect")
+    .attr({y: row - 4, width: frameWidth, height: 3, fill: (frame) => colourOf[frame.name]});
+  frames.filter((frame) => frameWidth(frame) > 44).append("text").attr({class: "frame-name", x: 4, y: 14})
+    .text((frame) => shortName(frame.name.replace(/ \([^()]*\)$/, ""), Math.floor((frameWidth(frame) - 6) / 7)));
+}
+
 // Live bytes, the groups stacked, the largest at the bottom. Groups that never hold a hundredth of the
 // peak are part of the others.
 
@@ -588,6 +645,7 @@ function tables() {
 
 function charts() {
   peakBars();
+  stacks();
   growth();
   timeline();
   sizes();

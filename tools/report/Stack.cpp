@@ -1,0 +1,94 @@
+#include "report/Stack.hpp"
+
+#include <fnmatch.h>
+
+#include <algorithm>
+#include <cstddef>
+#include <map>
+#include <set>
+#include <sstream>
+
+#include "trace/PassingOn.hpp"
+
+namespace Report {
+
+namespace {
+
+std::string ModuleOf(const std::string& frame) {
+    const std::size_t bracket = frame.rfind(" (");
+    if (bracket == std::string::npos) { return frame.substr(0, frame.rfind("+0x")); }
+    return frame.substr(bracket + 2, frame.find_first_of(",)", bracket) - bracket - 2);
+}
+
+bool IsPassedOver(const std::string& frame, const Skipped& skipped) {
+    const std::string function = FunctionOf(frame);
+    return Trace::IsRuntime(ModuleOf(frame).c_str()) || Trace::PassesOn(function.c_str()) ||
+           std::any_of(skipped.begin(), skipped.end(), [&](const std::string& pattern) {
+               return pattern == function || fnmatch(pattern.c_str(), function.c_str(), 0) == 0;
+           });
+}
+
+}  // namespace
+
+std::vector<std::string> FramesOf(const std::string& name) {
+    std::istringstream text(name);
+    std::vector<std::string> frames;
+    for (std::string frame; std::getline(text, frame, ';');) { frames.push_back(frame); }
+    return frames;
+}
+
+std::string FunctionOf(const std::string& frame) {
+    const std::size_t bracket = frame.rfind(" (");
+    if (bracket == std::string::npos) { return frame; }
+    std::string function = frame.substr(0, frame.rfind("+0x", bracket));
+    const std::string nameless = "(anonymous namespace)::";
+    for (std::size_t place = 0; (place = function.find(nameless)) != std::string::npos;) {
+        function.erase(place, nameless.size());
+    }
+    function.resize(std::min(function.size(), function.find('(', 1)));
+    if (function.find("operator") != std::string::npos) { return function; }
+    return function.substr(function.rfind(' ') + 1);  // Without the type that it returns.
+}
+
+std::size_t CallerIn(const std::vector<std::string>& frames, const Skipped& skipped) {
+    std::size_t index = frames.size() - 1;
+    while (index != 0 && IsPassedOver(frames[index], skipped)) { --index; }
+    return index;
+}
+
+Skipped FindPassingOn(const std::vector<StackRow>& stacks, const Skipped& skipped) {
+    struct Function {
+        std::uint64_t blocks = 0;
+        std::set<std::string> callers;
+    };
+    struct Module {
+        std::uint64_t blocks = 0;
+        std::map<std::string, Function> functions;
+    };
+    std::map<std::string, Module> modules;
+    std::uint64_t blocks = 0;
+    for (const StackRow& stack : stacks) {
+        const std::size_t index = CallerIn(stack.frames, skipped);
+        if (index == 0) { continue; }
+        const std::string name = FunctionOf(stack.frames[index]);
+        const std::string caller = FunctionOf(stack.frames[index - 1]);
+        Module& module = modules[ModuleOf(stack.frames[index])];
+        Function& function = module.functions[name];
+        for (std::uint64_t* sum : {&blocks, &module.blocks, &function.blocks}) {
+            *sum += stack.all.blocks;
+        }
+        if (caller != name) { function.callers.insert(caller); }
+    }
+    Skipped found;
+    for (const auto& [path, module] : modules) {
+        for (const auto& [name, function] : module.functions) {
+            const bool isMost = 10 * function.blocks >= 9 * module.blocks;
+            if (isMost && function.callers.size() >= 3 && module.blocks >= blocks / 100) {
+                found.push_back(name);
+            }
+        }
+    }
+    return found;
+}
+
+}  // namespace Report

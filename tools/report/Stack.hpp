@@ -1,0 +1,37 @@
+// Call stacks, as a trace that is recorded by stack names its pools: "main+0x1f (prog);f+0x2
+// (prog)", the innermost frame last.
+
+#ifndef OBR_TOOLS_REPORT_STACK_HPP
+#define OBR_TOOLS_REPORT_STACK_HPP
+
+#include <string>
+#include <vector>
+
+#include "report/Tally.hpp"
+
+namespace Report {
+
+struct StackRow {
+    std::vector<std::string> frames;  // The outermost first.
+    BlockSum all;
+    BlockSum atPeak;
+};
+
+std::vector<std::string> FramesOf(const std::string& name);
+
+// The function of a frame without its arguments, or the frame itself if its function has no name.
+std::string FunctionOf(const std::string& frame);
+
+// Names and patterns of functions that only pass memory on, in addition to those known as such.
+using Skipped = std::vector<std::string>;
+
+// The index of the innermost frame that does more than pass memory on, or of the outermost.
+std::size_t CallerIn(const std::vector<std::string>& frames, const Skipped& skipped);
+
+// Further functions that pass memory on, by what they do: 90 % of the blocks of their module are
+// asked for by them, on behalf of three functions or more.
+Skipped FindPassingOn(const std::vector<StackRow>& stacks, const Skipped& skipped);
+
+}  // namespace Report
+
+#endif
