@@ -1,7 +1,7 @@
 // Unwinding a stack takes thousands of cycles, far more than an allocation. So each return address
-// is unwound once: its distance to the next one on the stack is the same at every call. Only a
-// function that takes a variable part of the stack is an exception; it counts as the caller itself,
-// and ends a whole stack.
+// is unwound only once: its distance to the next one on the stack is the same at every call. A
+// function whose stack frame varies in size is an exception. It counts as the caller itself, and a
+// recorded stack ends there.
 
 #include "record/Callers.hpp"
 
@@ -32,7 +32,7 @@ constexpr std::size_t maxFrames = maxDepth + 8;  // The recorder's own among the
 
 constexpr std::size_t longestSearch = 64;  // In a table.
 
-// The place of the address in the table, or that where it belongs; the last one if it is full.
+// The entry of the address in the table, or the free entry for it; the last one if there is none.
 Caller& Find(Channel& channel, std::uint64_t address) {
     std::size_t place = address * 0x9E3779B97F4A7C15U >> 48;
     for (std::size_t step = 0; step != longestSearch; ++step, ++place) {
@@ -61,7 +61,7 @@ _Unwind_Reason_Code AddFrame(_Unwind_Context* context, void* toFrames) {
     return _URC_NO_REASON;
 }
 
-// One that passes memory on by its name, or that the user has named.
+// Whether a function passes memory on, by its name or by a pattern of the user.
 bool IsWrapper(const Channel& channel, const char* function) {
     if (Trace::PassesOn(function)) { return true; }
     const char* pattern = channel.skipped;
@@ -71,7 +71,8 @@ bool IsWrapper(const Channel& channel, const char* function) {
     return *pattern != '\0';
 }
 
-// The path of the program's own file, which the loader calls by whatever name it was started.
+// The path of a file. For the program itself the loader only knows the name by which it was
+// started.
 void FindPath(const Dl_info& info, char* path, std::size_t size) {
     Dl_info program = {};
     const std::uint64_t entry = getauxval(AT_ENTRY);
@@ -90,7 +91,7 @@ std::uint32_t FindModule(Channel& channel, const Dl_info& info) {
     char path[sizeof(Module::path)];
     FindPath(info, path, sizeof(path));
     const auto base = reinterpret_cast<std::uint64_t>(info.dli_fbase);
-    // A signal handler may have interrupted the one who holds the lock: it gives up then.
+    // A signal handler that has interrupted the holder of the lock gives up.
     for (int tries = 0; channel.modulesLock.exchange(1) != 0; ++tries) {
         if (tries == 1000000) { return 0; }
     }
@@ -110,7 +111,7 @@ std::uint32_t FindModule(Channel& channel, const Dl_info& info) {
     return index < numModules ? index : 0;
 }
 
-// Enters the address, unless the table is full. Returns whether it is passed on the way.
+// Enters the address, unless the table is full. Returns whether the walk goes on past it.
 bool Enter(Channel& channel, const Frame& frame, std::uint64_t frameSize) {
     Caller* place = nullptr;
     for (std::uint64_t found = 0; found != frame.address;) {
@@ -139,7 +140,7 @@ bool Enter(Channel& channel, const Frame& frame, std::uint64_t frameSize) {
     return isPassed;
 }
 
-// The callers on the way, the innermost first.
+// The callers of a walk, the innermost first.
 struct Trail {
     void Add(std::size_t caller) {
         callers[number++] = static_cast<std::uint16_t>(caller);
@@ -152,7 +153,7 @@ struct Trail {
     std::uint64_t hash = 0;
 };
 
-// Unwinds the stack and enters what the table lacks.
+// Unwinds the stack and adds the missing addresses to the table.
 __attribute__((noinline)) void Unwind(Channel& channel, std::uint64_t address,
                                       std::uint64_t stack) {
     const int oldErrno = errno;
@@ -161,10 +162,10 @@ __attribute__((noinline)) void Unwind(Channel& channel, std::uint64_t address,
     _Unwind_Backtrace(AddFrame, &found);
     std::size_t index = 0;
     while (index != found.number && found.frames[index].stack != stack) { ++index; }
-    if (index == found.number) {  // Code without tables to unwind it by.
+    if (index == found.number) {  // Code without unwind tables.
         Enter(channel, {address, stack}, 0);
     }
-    // How far it is from the last frame that there was room for is not known.
+    // The size of the last frame that was stored is unknown.
     const std::size_t end = found.number - (found.number == maxFrames ? 1 : 0);
     for (bool isPassed = true; isPassed && index < end; ++index) {
         const Frame& frame = found.frames[index];
@@ -175,7 +176,7 @@ __attribute__((noinline)) void Unwind(Channel& channel, std::uint64_t address,
     errno = oldErrno;
 }
 
-// Goes from one caller to the next as far as the table leads. False if it lacks one.
+// Walks from caller to caller through the table. False if one is missing.
 bool Follow(Channel& channel, std::uint64_t address, std::uint64_t stack, Trail& trail) {
     trail.number = 0;
     trail.hash = 0;
@@ -193,7 +194,7 @@ bool Follow(Channel& channel, std::uint64_t address, std::uint64_t stack, Trail&
     return true;
 }
 
-// The index of the stack in the table.
+// The index of the stack in the table, to which it is added if it is new.
 std::uint64_t Intern(Channel& channel, const Trail& trail) {
     const std::uint64_t hash = trail.hash | 1;
     std::size_t place = hash >> 44;
@@ -202,7 +203,7 @@ std::uint64_t Intern(Channel& channel, const Trail& trail) {
         std::uint64_t found = stack.hash.load(std::memory_order_acquire);
         if (found == 0 && stack.hash.compare_exchange_strong(found, hash)) { found = hash; }
         if (found != hash) { continue; }
-        // Whoever finds it empty fills it: who entered it may not run for long.
+        // Any thread that finds it empty fills it: the thread that entered it may not run for long.
         if (stack.number.load(std::memory_order_acquire) == 0) {
             const auto number = static_cast<std::uint32_t>(trail.number);
             const std::uint32_t first = channel.framesUsed.fetch_add(number);
@@ -216,7 +217,8 @@ std::uint64_t Intern(Channel& channel, const Trail& trail) {
     return maxGroup;
 }
 
-// Of this thread. Asking for it takes a system call, which is little beside unwinding.
+// The processor time of this thread. Reading it takes a system call: little, compared with
+// unwinding.
 std::uint64_t ProcessorNanoseconds() {
     timespec time = {};
     clock_gettime(CLOCK_THREAD_CPUTIME_ID, &time);

@@ -1,5 +1,5 @@
-// Whose call it is: the first return address outside of the run-time libraries of C and C++, or the
-// whole stack.
+// Finds the caller of an allocation, the first return address outside of the run-time libraries of
+// C and C++, or its whole stack.
 
 #ifndef OBR_TOOLS_RECORD_CALLERS_HPP
 #define OBR_TOOLS_RECORD_CALLERS_HPP

@@ -26,7 +26,7 @@ enum class Op : std::uint8_t {
     PoolDestroyed,
     PoolCleared,
     PoolAllocated,  // Pool; a Data slot with the block and the size follows.
-    PoolFreed,      // Pool; likewise.
+    PoolFreed,      // Pool; a Data slot follows too.
     PoolNamed,      // Pool, size of the name; Data slots with 8 bytes each follow.
     Data,           // Only as a part of another event.
     Executed,       // Another program has replaced this one.
@@ -57,21 +57,21 @@ constexpr std::uint64_t Lap(std::uint64_t index) {
 static_assert(Lap(14 * numSlots) >> lapShift == 15 && Lap(15 * numSlots) == Lap(0),
               "The number of a lap has its bits to itself.");
 
-// A place that code calls from, by its return address. One that is passed on the way to the caller
-// keeps how far away on the stack the next return address is: those in the run-time libraries of C
-// and C++, and for whole stacks all but the outermost.
+// A call site, by its return address. If a walk goes on past it, the entry has the distance on the
+// stack to the next return address. That is so in the run-time libraries of C and C++, and, for
+// whole stacks, everywhere but in the outermost frame.
 struct Caller {
     enum State : std::uint32_t { Unknown, Final, Passed, Variable };
 
     std::atomic<std::uint64_t> address;  // 0 while the place in the table is free.
     std::atomic<std::uint32_t> state;    // Stored last.
     std::uint32_t module;                // Index into the modules.
-    std::uint64_t frameSize;             // Of Passed.
+    std::uint64_t frameSize;             // That distance, if Passed.
 };
 constexpr std::size_t numCallers = 1U << 16;
 constexpr std::size_t maxCaller = numCallers - 1;  // The last stands for all others.
 
-// The callers of a block, the innermost first. Stacks of one hash are taken for the same.
+// The callers of a block, the innermost first. Stacks with equal hashes count as the same.
 struct Stack {
     std::atomic<std::uint64_t> hash;    // 0 while the place in the table is free.
     std::atomic<std::uint32_t> first;   // Index into the frames.

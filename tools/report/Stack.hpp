@@ -1,5 +1,5 @@
-// Call stacks, as a trace that is recorded by stack names its pools: "main+0x1f (prog);f+0x2
-// (prog)", the innermost frame last.
+// Call stacks, from the names of the pools in a trace that was recorded by stack: "main+0x1f
+// (prog);f+0x2 (prog)", the innermost frame last.
 
 #ifndef OBR_TOOLS_REPORT_STACK_HPP
 #define OBR_TOOLS_REPORT_STACK_HPP
@@ -28,8 +28,8 @@ using Skipped = std::vector<std::string>;
 // The index of the innermost frame that does more than pass memory on, or of the outermost.
 std::size_t CallerIn(const std::vector<std::string>& frames, const Skipped& skipped);
 
-// Further functions that pass memory on, by what they do: 90 % of the blocks of their module are
-// asked for by them, on behalf of three functions or more.
+// Further functions that pass memory on: 90 % of the blocks of their module pass through them, on
+// behalf of three functions or more.
 Skipped FindPassingOn(const std::vector<StackRow>& stacks, const Skipped& skipped);
 
 }  // namespace Report

@@ -1,5 +1,5 @@
-// Functions that only pass on the memory that they ask for, so that the caller of one is the one
-// who wants it. For the recorder inside of a program: it uses the C library alone.
+// Functions that only pass memory on to their callers. The recorder in a program uses this file, so
+// it needs only the C library.
 
 #ifndef OBR_TOOLS_TRACE_PASSINGON_HPP
 #define OBR_TOOLS_TRACE_PASSINGON_HPP
