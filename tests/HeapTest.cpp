@@ -89,6 +89,7 @@ TEST_F(HeapTest, KnowsTheMemoryOfAPool) {
     const BucketMgr& pool = *mgr.GetBucketMgr();
     EXPECT_EQ(ReadAt<Group**>(&pool, format::poolGroups), pool.groups);
     EXPECT_EQ(ReadAt<std::uint32_t>(&pool, format::poolNumGroups), pool.numGroups);
+    EXPECT_EQ(ReadAt<std::uint32_t>(&pool, format::poolBucketSize), pool.bucketSize);
     EXPECT_EQ(ReadAt<std::uint32_t>(&pool, format::poolRounding), pool.dataAlignment);
     EXPECT_EQ(ReadAt<std::uint32_t>(&pool, format::poolMaxRecord), pool.maxRecordSize);
     EXPECT_EQ(ReadAt<std::uint32_t>(&pool, format::poolMinRecord), pool.minRecordSize);

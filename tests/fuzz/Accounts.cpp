@@ -43,8 +43,8 @@ void Account::Check(bool thoroughly) const {
     constexpr std::uint32_t fewSteps = 600;
     const std::uint32_t recsOfBucket = pool->bucketSize / (pool->dataAlignment + 4) + 1;
     const bool isQuick = pool->numGroups + pool->GetNumBuckets() * recsOfBucket < fewSteps;
-    if (!thoroughly && !isQuick) { return; }
-    const Blocks blocks = CheckInvariants(*pool);
+    if (!thoroughly && (!isQuick || Large() != nullptr)) { return; }
+    const Blocks blocks = AllBlocks();
     ASSERT_EQ(blocks.size(), pool->enabled ? live.size() : 0);
     if (!pool->enabled) { return; }
     auto at = blocks.begin();
@@ -61,13 +61,25 @@ void Account::Check(bool thoroughly) const {
 }
 
 const std::uint8_t* Account::RecordOf(const std::uint8_t* data) const {
-    const Blocks blocks = CheckInvariants(*pool);
+    const Blocks blocks = AllBlocks();
     const auto above = blocks.upper_bound(data);
     return above == blocks.begin() ? data : std::prev(above)->first;
 }
 
+const BucketMgr* Account::Large() const {
+    const Mgr* const large = isOfHeap ? GetMgr((name + ", large buckets").c_str()) : nullptr;
+    return large == nullptr ? nullptr : large->GetBucketMgr();
+}
+
+Blocks Account::AllBlocks() const {
+    Blocks blocks = CheckInvariants(*pool);
+    if (const BucketMgr* const large = Large()) { blocks.merge(CheckInvariants(*large)); }
+    return blocks;
+}
+
 bool Account::StaysReadable(const void* data) const {
-    const Bucket* const bucket = pool->FindBucket(data);
+    const Bucket* bucket = pool->FindBucket(data);
+    if (bucket == nullptr && Large() != nullptr) { bucket = Large()->FindBucket(data); }
     if (bucket == nullptr) { return false; }
     const std::uint32_t total = (bucket->size - 2u) / bucket->recSize;
     return pool->keepEmptyBuckets || total - bucket->numFree > 1;
@@ -117,13 +129,18 @@ void Accounts::WithBlockOfOther(
 }
 
 void Accounts::CheckRegistry(const std::function<bool(const Mgr*)>& hasPool) const {
-    EXPECT_EQ(GetNumMgrs(), all.size());
     std::map<std::string, Mgr*> expected;
+    std::size_t number = all.size();
     for (const auto& account : all) {
+        if (const BucketMgr* const large = account->Large()) {
+            expected[large->name] = large->mgr;
+            ++number;
+        }
         Mgr* const handle = hasPool(account->builder) ? account->builder : nullptr;
         EXPECT_EQ(GetMgr(account->name.c_str()), handle);
         if (handle != nullptr) { expected[account->name] = handle; }
     }
+    EXPECT_EQ(GetNumMgrs(), number);
     EXPECT_EQ(GetMgr("no such pool"), nullptr);
     std::vector<Mgr*> wanted;
     for (const auto& [name, handle] : expected) { wanted.push_back(handle); }

@@ -14,6 +14,7 @@
 #include <string>
 #include <vector>
 
+#include "../PoolFixture.hpp"
 #include "Bytes.hpp"
 #include "MemPool/BucketMgr.hpp"
 
@@ -48,6 +49,10 @@ struct Account {
 
     // The block of the pool that the block at `data` of a Heap is the end of.
     const std::uint8_t* RecordOf(const std::uint8_t* data) const;
+
+    // The pool of large buckets, null if the pool has none, and the blocks of both.
+    const OBR::MemPool::BucketMgr* Large() const;
+    OBR::MemPool::Blocks AllBlocks() const;
 
     // Whether the block at `data` lies in a bucket that stays once it is freed.
     bool StaysReadable(const void* data) const;

@@ -80,7 +80,6 @@ void World::Build(HeapPlace& place) {
     say(3, &HeapSettings::DataAlignment, sizes.alignment);
     const bool isOn = (said & 16) != 0 || NUV_OBR_MEMPOOL_ON();
     settings.On(isOn);
-    if ((said & 1) == 0) { settings.BucketSize(sizes.bucket); }  // There is one pool then.
     if ((said & 32) != 0) { settings.KeepEmptyBuckets((said & 64) != 0); }
     place.alignment = (said & 128) != 0 ? std::size_t{1} << bytes.Below(14) : 8;
     settings.Alignment(place.alignment);
@@ -90,7 +89,7 @@ void World::Build(HeapPlace& place) {
     if ((said & 32) != 0) {
         inC.keep_empty_buckets = (said & 64) != 0 ? OBR_HEAP_ON : OBR_HEAP_OFF;
     }
-    inC.bucket_size = sizes.bucket;
+    inC.bucket_size = (said & 1) != 0 ? sizes.bucket : 0;
     inC.max_record_size = sizes.largest;
     inC.min_record_size = sizes.smallest;
     inC.data_alignment = sizes.alignment;
@@ -117,6 +116,8 @@ void World::Build(HeapPlace& place) {
     EXPECT_EQ(isRefused, isWrong || !sizes.CanMakePool() || accounts.IsTaken(name));
     if (isRefused) { return; }
     place.heap = &place.owner->heap;
+    const bool hasSecond = (said & 1) == 0 && sizes.bucket == PoolSettings().bucketSize;
+    place.canFail = !hasSecond && sizes.bucket < detail::largeBucketSize;
     place.account = &accounts.Open(place.heap->GetMgr(), true);
     EXPECT_EQ(place.account->pool->enabled, isOn);
 }
@@ -191,7 +192,7 @@ void World::Take(HeapPlace& place) {
         EXPECT_THROW(take(), std::bad_alloc);
         return;
     }
-    if (!Succeeds(take)) { return; }
+    if (!Succeeds(take, place.canFail)) { return; }
     if (isZero) { EXPECT_EQ(std::count(data, data + size, 0), static_cast<long>(size)); }
     const std::size_t usable = obr_heap_usable_size(place.owner.get(), data);
     if (!place.account->pool->enabled) { EXPECT_EQ(usable, std::max<std::size_t>(size, 1)); }
@@ -216,13 +217,15 @@ void World::Resize(HeapPlace& place) {
     std::uint8_t* moved = nullptr;
     bool isRefused = false;
     account.ExpectFilled(one);
-    Succeeds([&] {
-        moved = static_cast<std::uint8_t*>(
-            size % 2 == 0 ? place.heap->Call(data, block.size, size)
-                          : obr_heap_call(place.owner.get(), data, block.size, size));
-        isRefused = HeapSpy::refuseIn == 0;
-        if (isRefused) { throw std::bad_alloc(); }
-    });
+    Succeeds(
+        [&] {
+            moved = static_cast<std::uint8_t*>(
+                size % 2 == 0 ? place.heap->Call(data, block.size, size)
+                              : obr_heap_call(place.owner.get(), data, block.size, size));
+            isRefused = HeapSpy::refuseIn == 0;
+            if (isRefused) { throw std::bad_alloc(); }
+        },
+        place.canFail);
     if (moved == nullptr) {
         EXPECT_TRUE(isRefused && grows);
         return account.ExpectFilled(one);
@@ -314,10 +317,12 @@ void World::CheckStats(const HeapPlace& place) const {
     const HeapStats stats = place.heap->GetStats();
     const Account& account = *place.account;
     EXPECT_EQ(stats.usedRecords + stats.heapRecords, account.live.size());
-    EXPECT_EQ(stats.buckets, account.pool->GetNumBuckets());
+    const BucketMgr* const large = account.Large();
+    EXPECT_EQ(stats.buckets,
+              account.pool->GetNumBuckets() + (large == nullptr ? 0 : large->GetNumBuckets()));
     std::size_t bytesUsed = 0;
     if (account.pool->enabled) {
-        for (const auto& [data, size] : CheckInvariants(*account.pool)) { bytesUsed += size; }
+        for (const auto& [data, size] : account.AllBlocks()) { bytesUsed += size; }
     } else {
         for (const auto& [data, block] : account.live) { bytesUsed += block.usable; }
     }

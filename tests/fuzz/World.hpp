@@ -38,6 +38,7 @@ private:
         OBR::MemPool::Heap* heap = nullptr;  // The owner's. It takes the calls of C and of C++.
         Account* account = nullptr;
         std::size_t alignment = 8;  // Of blocks without a requested alignment.
+        bool canFail = true;        // Large buckets can do without some of their requests.
     };
 
     // Settings, handles and names: WorldOps.cpp.
@@ -68,10 +69,10 @@ private:
 
     // Runs `action`, whose request to the heap is refused if the input says so. False if it was.
     template <typename Action>
-    bool Succeeds(Action action) {
+    bool Succeeds(Action action, bool canFail = true) {
         // Most inputs have no refusal in most places.
         const std::uint32_t choice = bytes.Byte();
-        return !HeapSpy::FailsAt(choice < 224 ? SIZE_MAX - 1 : choice % 3, action);
+        return !HeapSpy::FailsAt(choice < 224 || !canFail ? SIZE_MAX - 1 : choice % 3, action);
     }
     std::uint32_t Size(const Account& account);
     bool HasRoom() const { return accounts.NumBlocks() < 400; }
