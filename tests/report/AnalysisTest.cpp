@@ -351,6 +351,7 @@ TEST(Analysis, KnowsThreadsAndTimes) {
     const Report::Analysis analysis = Report::Analyse(reader, usual, [](std::uint64_t) {});
     EXPECT_EQ(analysis.total.temporary, 1U);
     EXPECT_EQ(analysis.peak.milliseconds, 250U);
+    EXPECT_EQ(analysis.growth.back().milliseconds, 250U);
     EXPECT_EQ(analysis.timeline.front().most.milliseconds, std::nullopt);
 }
 
