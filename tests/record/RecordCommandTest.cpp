@@ -156,11 +156,11 @@ TEST(Record, KeepsStacks) {
     const auto isStack = [](const std::string& pattern) {
         return testing::Contains(testing::Key(ContainsRegex(pattern)));
     };
-    const std::string third = ";main\\+[^;]*;void ThirdCaller\\(\\)\\+[^;]*;pass_alloc\\+[^;]*$";
+    const std::string third = ";main\\+[^;]*;void ThirdCaller\\(\\)\\+[^;]*;pass_Alloc\\+[^;]*$";
     EXPECT_THAT(Record("callers", "--stacks").numBlocks, isStack("^_start\\+.*" + third));
     const auto cut = Record("exec", "--stacks=2").numBlocks;
     EXPECT_THAT(cut, isStack("^main\\+[^;]*;FirstCaller\\(\\)\\+[^;]*$"));
-    EXPECT_THAT(cut, isStack("^void ThirdCaller\\(\\)\\+[^;]*;pass_alloc\\+[^;]*$"));
+    EXPECT_THAT(cut, isStack("^void ThirdCaller\\(\\)\\+[^;]*;pass_Alloc\\+[^;]*$"));
     EXPECT_THAT(Record("alloca", "--stacks").numBlocks,
                 isStack("^FourthCaller\\([^;]*;FirstCaller\\(\\)\\+[^;]*$"));
 }
