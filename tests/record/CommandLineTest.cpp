@@ -48,7 +48,7 @@ TEST(CommandLine, SuggestsWhatWasMeant) {
               "See 'mempool --help'.\n");
     EXPECT_EQ(refused("--hlep"), "mempool: --hlep: unknown option; did you mean '--help'?");
     EXPECT_EQ(refused("help rnu"), "mempool: rnu: unknown subcommand; did you mean 'run'?");
-    EXPECT_EQ(refused("zzz"), "mempool: zzz: unknown subcommand");
+    EXPECT_EQ(refused("tzzt"), "mempool: tzzt: unknown subcommand");
     EXPECT_EQ(refused("''"), "mempool: : unknown subcommand");
     EXPECT_EQ(refused(""), "mempool: A subcommand is required");
     EXPECT_EQ(refused("report --jsno=1"),

@@ -195,8 +195,10 @@ void Environment() {
 __attribute__((noinline)) void FirstCaller() {
     Keep(std::malloc(70001));
 }
-// A string that is duplicated is the C library's own call of malloc, in the name of its caller.
-__attribute__((noinline)) void SecondCaller() {
+// A string that is duplicated is the C library's own call of malloc, in the name of its caller,
+// which has a hash as in Rust.
+__attribute__((noinline)) void SecondCaller() __asm__("_ZN6Second6Caller17h0123456789abcdefE");
+void SecondCaller() {
     const std::string text(70001, 'x');
     Keep(strdup(text.c_str()));
 }

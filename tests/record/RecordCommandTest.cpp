@@ -106,6 +106,9 @@ TEST(Record, FollowsAProgramThatBecomesAnother) {
     const std::string story = "+70000 +70001 -70001 ";
     EXPECT_EQ(record("env X=1 ./Host exit", 7), story);
     EXPECT_EQ(record("sh -c 'exec ./lost; exit 1' 2>/dev/null", 127), "");
+    const std::string lost =
+        "bash -c 'shopt -s execfail; exec ./lost 2>/dev/null; echo /proc/self/fd/*'";
+    EXPECT_EQ(record(lost, 0), Shell::Output(lost));
     EXPECT_EQ(record("env LD_PRELOAD=libz.so.1 sh -c 'echo $LD_PRELOAD; exec ./Host exit'", 7),
               "libz.so.1\n" + story);
     EXPECT_EQ(record("env " STATIC_HOST, 0),
@@ -142,7 +145,7 @@ TEST(Record, CallsTheGroups) {
     ASSERT_EQ(byCaller.size(), 5U);
     for (const char* name :
          {"^FirstCaller\\(\\)\\+0x[0-9a-f]+ \\(RecordHost[,)]",
-          "^SecondCaller\\(\\)\\+0x[0-9a-f]+ \\(RecordHost[,)]", "^void ThirdCaller\\(\\)\\+0x"}) {
+          "^Second::Caller\\+0x[0-9a-f]+ \\(RecordHost[,)]", "^void ThirdCaller\\(\\)\\+0x"}) {
         EXPECT_THAT(byCaller, testing::Contains(testing::Key(ContainsRegex(name))));
     }
     EXPECT_EQ(Record("callers", "--by module").numBlocks,
@@ -150,6 +153,10 @@ TEST(Record, CallsTheGroups) {
     const auto skipped = Record("callers", "--by caller --skip no --skip '*Caller*'").numBlocks;
     EXPECT_THAT(skipped, testing::Contains(testing::Key(ContainsRegex("^main\\+0x"))));
     EXPECT_THAT(skipped, testing::Not(testing::Contains(testing::Key(HasSubstr("Caller()")))));
+    Shell::Output("strip -o Stripped " HOST "; " MEMPOOL
+                  " record -o trace --by caller ./Stripped family");
+    EXPECT_THAT(ReadTrace("trace").numBlocks,
+                testing::Contains(testing::Key(ContainsRegex("^Stripped\\+0x[0-9a-f]{1,5}$"))));
 }
 
 TEST(Record, KeepsStacks) {
@@ -259,9 +266,10 @@ TEST(Record, WritesTheTraceWholeOrNotAtAll) {
 
 TEST(Record, RefusesWhatCannotBeRecorded) {
     const std::string record = MEMPOOL " record ";
-    Shell::Output("ln -sf " HOST
-                  " Host; echo >plain; mkdir -p folder; "
-                  "printf '#!/lost/sh\\n' >script; chmod +x script");
+    Shell::Output(
+        "ln -sf " HOST
+        " Host; echo >plain; mkdir -p folder; "
+        "printf '#!/lost/sh\\n' >inner; printf '#!./inner\\n' >script; chmod +x inner script");
     const auto refused = [&](const std::string& command, int status) {
         return Shell::Output(record + command, status);
     };
@@ -278,6 +286,8 @@ TEST(Record, RefusesWhatCannotBeRecorded) {
               "mempool: /dev/full: No space left on device\n");
     EXPECT_EQ(refused("-o trace --skip $(printf %1024d 1 | tr ' ' x) ./Host", 125),
               "mempool: --skip: the patterns are too long\n");
+    EXPECT_EQ(refused("-o trace --skip '' ./Host", 125),
+              "mempool: --skip: the pattern is empty\nSee 'mempool record --help'.\n");
     EXPECT_EQ(refused("-o /dev/full", 125),
               "mempool: PROGRAM is required\nSee 'mempool record --help'.\n");
     EXPECT_EQ(refused("--by size ./Host", 125),
@@ -286,7 +296,7 @@ TEST(Record, RefusesWhatCannotBeRecorded) {
     EXPECT_EQ(refused("-o trace " STATIC_HOST, 126),
               "mempool: " STATIC_HOST ": is statically linked: cannot be recorded\n");
     Shell::Output(
-        "head -c 3000 Host >cut; chmod +x cut; cp Host kept; chmod 750 kept; "
+        "head -c 3000 Host >cut; chmod +x cut; cp Host kept; chmod 750 kept; echo >folder/kept; "
         "(head -c 18 Host; printf '\\3\\0'; tail -c +21 Host) >other; chmod +x other");
     EXPECT_EQ(refused("-o trace ./other", 126),
               "mempool: ./other: is a program for another kind of machine: cannot be recorded\n");
@@ -297,7 +307,7 @@ TEST(Record, RefusesWhatCannotBeRecorded) {
               "mempool: kept: input and output are the same file\n");
     EXPECT_EQ(refused("-o kept ./Host <kept", 125),
               "mempool: kept: input and output are the same file\n");
-    EXPECT_EQ(Shell::Output("PATH=. " MEMPOOL " record -o ./kept kept", 125),
+    EXPECT_EQ(Shell::Output("PATH=folder:: " MEMPOOL " record -o ./kept kept", 125),
               "mempool: ./kept: input and output are the same file\n");
     EXPECT_EQ(Shell::Output("cmp Host kept && ls kept*"), "kept\n");
     // A failure on the way is reported after the end of the program, which is not affected.

@@ -327,6 +327,23 @@ TEST(Analysis, KeepsTheCourseOfALongTrace) {
     }
 }
 
+// 20 groups get a block in turn. 11 of them have no growth of their own.
+TEST(Analysis, SumsTheGrowthOfFurtherGroups) {
+    std::string lines;
+    for (int event = 0; event < 519; ++event) {
+        const std::string pool = ":00000000000000" + std::to_string(10 + event % 20);
+        const std::string block = ":0000000000000" + std::to_string(100 + event);
+        lines += event < 20 ? "xmpt:c" + pool + "\n" : "xmpt:a" + pool + block + ":8\n";
+    }
+    const auto growth = Analyse(lines).growth;
+    EXPECT_EQ(growth.back().event, 519U) << "The peak.";
+    for (const Report::GrowthPoint& point : growth) {
+        const std::uint64_t rounds = std::max<std::uint64_t>(point.event / 20, 1) - 1;
+        EXPECT_GE(point.live.back(), 11 * 8 * rounds);
+        EXPECT_LE(point.live.back(), 11 * 8 * (rounds + 1));
+    }
+}
+
 // A block is temporary if the next event of its thread frees it, whatever other threads do between.
 TEST(Analysis, KnowsThreadsAndTimes) {
     std::string file;
@@ -378,7 +395,7 @@ TEST(Analysis, JoinsTheStacksOfACaller) {
         {"main+0x1 (p);parse+0x2 (p);xmalloc+0x8 (p);p+0x44 (libc.so.6)", "parse+0x2 (p)"},
         {"main+0x1 (p);parse+0x9 (p, p.c:3);operator new(unsigned long)+0x3 (q)",
          "parse+0x9 (p, p.c:3)"},
-        {"main+0x1 (p)", "main+0x1 (p)"}};
+        {"main+0x1 (p);xmalloc+0x8 (p)", "main+0x1 (p)"}};
     std::map<std::string, std::string> pools;
     std::string byStack = "xmpt:i:by:stack\n";
     std::string byCaller = "xmpt:i:by:caller\n";
@@ -407,7 +424,8 @@ TEST(Analysis, JoinsTheStacksOfACaller) {
     EXPECT_EQ(json["groups"][2]["stack"],
               (std::vector<std::string>{"main+0x1 (p)", "parse+0x2 (p)",
                                         "void std::list::add(int)+0x3 (p)"}));
-    EXPECT_EQ(json["stacks"][0]["frames"], std::vector<std::string>{"main+0x1 (p)"});
+    EXPECT_EQ(json["stacks"][0]["frames"],
+              (std::vector<std::string>{"main+0x1 (p)", "xmalloc+0x8 (p)"}));
     EXPECT_EQ(json["stacks"][3]["bytes"], 108);
     EXPECT_EQ(json["stacks"][3]["at_peak"]["bytes"], 0);
     EXPECT_TRUE(analysis.passingOn.empty());
@@ -428,8 +446,9 @@ TEST(Stack, FindsWhatPassesMemoryOn) {
     EXPECT_EQ(Report::FindPassingOn(stacks, {}), Report::Skipped{"make"});
     stacks.back().all.blocks = 11;
     EXPECT_EQ(Report::FindPassingOn(stacks, {}), Report::Skipped{}) << "Less than 90 %.";
-    stacks.resize(2);
-    EXPECT_EQ(Report::FindPassingOn(stacks, {}), Report::Skipped{}) << "Too few callers.";
+    stacks.resize(3);
+    stacks.back().frames[1] = "make(int)+0x9 (p)";
+    EXPECT_EQ(Report::FindPassingOn(stacks, {}), Report::Skipped{}) << "Two and itself.";
 }
 
 TEST(Json, CutsNamesBetweenCharacters) {

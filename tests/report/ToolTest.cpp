@@ -101,6 +101,18 @@ TEST(Report, IsAPageUnlessAllIsAskedFor) {
     EXPECT_THAT(all, HasSubstr("\n            100            1 "));
 }
 
+TEST(Report, FoldsTheStacksOfThePeak) {
+    const std::string pool = ":0000000000000001";
+    std::ofstream(Path("stacks")) << "xmpt:i:by:stack\nxmpt:c" << pool << "\nxmpt:n" << pool
+                                  << ":main+0x1 (p);list<int>::f(int)+0x2 (p, p.c:3)\nxmpt:a"
+                                  << pool << ":0000000000000010:24\nxmpt:f" << pool
+                                  << ":0000000000000010:\nxmpt:a" << pool
+                                  << ":0000000000000010:99\n";
+    EXPECT_EQ(Tool("--folded stacks"), "main;list<int>::f 99\n");
+    std::ofstream(Path("small")) << trace;
+    EXPECT_THAT(Tool("--folded small", 1), HasSubstr("small: has no call stacks"));
+}
+
 // Names are text in the page, and its data end where they should.
 TEST(Report, WritesAPage) {
     std::ofstream(Path("small")) << trace;
