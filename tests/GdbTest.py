@@ -236,6 +236,11 @@ class LiveHost(unittest.TestCase):
             with self.poke(thing, field, value):
                 self.assertTrue(run(f'mempool check "{LETTERS}"').endswith(fault + "\n"), fault)
 
+        for offset, byte, fault in ((15, b"x", "no end after its 15 bytes"),
+                                    (0, b"\xFF", r"its name is \xffifteen letters")):
+            with Poke(pool.address + 16 + offset, byte):  # The string holds its text itself.
+                self.assertTrue(run(f'mempool check "{LETTERS}"').endswith(fault + "\n"), fault)
+
     def test_words_the_rules_as_the_library_does(self):
         for field, value, problem in (("bucketSize", 43, "tooLarge"), ("minRecordSize", 44, "tooSmall")):
             with self.poke(self.pools["three"], field, value):
@@ -318,6 +323,8 @@ class LiveHost(unittest.TestCase):
     def test_prints_values(self):
         self.assertEqual(run("output letters"), f'pool "{LETTERS}", 12 blocks, 4 buckets')
         self.assertEqual(run("output off"), 'pool "off", disabled')
+        with Poke(evaluate("(long) &off"), bytes(8)):
+            self.assertEqual(run("output off"), "no pool")
         self.assertEqual(run("output numbers"), "OBR::vector of length 3, capacity 4 = {1, 2, 3}")
         text = run(f"output *(OBR::MemPool::BucketMgr*) {self.pools[LETTERS].address}")
         self.assertIn(f'pool "{LETTERS}", 12 blocks, 4 buckets = {{', text)

@@ -63,6 +63,7 @@ def library_lines(fault, kind):
         "underrun 40": [at_40],
         "cleared": [at_40],
         "neighbours": [at_40, at_40],
+        "beside": [damaged + r"4[48] bytes before the data \(\w+\)"],
         "underrun 1, large": [r"pool nodes: heap record 0x\w{16}: the header is damaged up to 1 byte"
                               r" before the data \(guard\)"],
         "two threads": [two_threads],
@@ -79,7 +80,7 @@ def library_lines(fault, kind):
 found = {"asan": {"read after free": "heap-use-after-free", "write after free": "heap-use-after-free",
                   "use after clear": "heap-use-after-free", "underrun 40": "use-after-poison",
                   "cleared": "use-after-poison", "neighbours": "use-after-poison",
-                  "underrun 1, large": "use-after-poison",
+                  "beside": "use-after-poison", "underrun 1, large": "use-after-poison",
                   "overrun 1": "heap-buffer-overflow", "heap record overrun, large": "heap-buffer-overflow",
                   "overrun 40": "heap-buffer-overflow",
                   "overrun 100": "heap-buffer-overflow", "underrun 100": "heap-buffer-overflow"},
@@ -92,8 +93,8 @@ found = {"asan": {"read after free": "heap-use-after-free", "write after free": 
 # Without a checker nobody sees what is written beyond the heap block of a bucket.
 all_faults = ["none", "none, large", "double free", "double free, large", "wrong pool",
               "wrong pool, large", "inner", "underrun 1", "underrun 1, large", "underrun 40", "cleared",
-              "neighbours", "leak", "leak, large", "leak at exit", "two threads", "two threads, large",
-              "threads in turns"]
+              "neighbours", "beside", "leak", "leak, large", "leak at exit", "two threads",
+              "two threads, large", "threads in turns"]
 
 for checker, host in {"nothing": plain, "asan": sanitized, "valgrind": plain}.items():
     if checker == "valgrind" and has_valgrind != "yes":

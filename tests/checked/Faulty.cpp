@@ -162,6 +162,10 @@ bool Make(const std::string& fault) {
         nodes.Give(second);           // found: neighbours
         std::cerr << "== after neighbours" << std::endl;
         return nodes.Give(block) && nodes.Give(third);
+    } else if (is("beside")) {
+        block[-48] = 1;                                  // at: beside
+        volatile char* const second = nodes.Take(size);  // found: beside
+        return nodes.Give(second) && nodes.Give(block);
     } else if (is("leak at exit")) {
         static auto* const kept = new Pool("kept");
         static Pool* const alive[] = {new Pool("alive"), new Pool("also")};
