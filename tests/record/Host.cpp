@@ -240,7 +240,7 @@ int main(int argc, char** argv) {
         ThirdCaller<std::vector<int>>();
     }
     if (what == "alloca") {
-        for (const std::size_t size : {100, 3000}) { FourthCaller(size); }
+        for (const std::size_t size : {100U, 3000U}) { FourthCaller(size); }
     }
     if (what == "exit") {
         Use(70001);
