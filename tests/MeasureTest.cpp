@@ -27,10 +27,11 @@ namespace {
 
 using Replay::Layer;
 
-Replay::Recording Record(const std::string& shorthand) {
+Replay::Recording Record(const std::string& shorthand, std::size_t maxSteps = 1000000) {
     OBR::MemPool::NUV_OBR_MEMPOOL_ON(true);
     Trace::StepReader reader(ReadLines(Lines(shorthand)), "lines");
-    return Replay::ReadRecording(reader, [](auto) {});
+    return Replay::ReadRecording(
+        reader, [](auto) {}, maxSteps);
 }
 
 // What the allocator takes for a request, its header of 8 bytes included.
@@ -51,6 +52,13 @@ TEST(Recording, FindsTheFirstOfThePeaksWithTheMostBlocks) {
     EXPECT_EQ(recording.numCleared, 3U);
     EXPECT_EQ(recording.numNeverFreed, 2U);
     EXPECT_EQ(recording.steps.size(), 12U);
+}
+
+TEST(Recording, CountsTheStepsAboveItsLimit) {
+    const Replay::Recording recording =
+        Record("@c:P\n@a:P:X:64\n@f:P:X:\n@n:P:caller\n@a:P:X:8\n", 2);
+    EXPECT_EQ(recording.steps.size(), 2U);
+    EXPECT_EQ(recording.numLeftOut, 2U) << "A name is no step.";
 }
 
 TEST(Recording, MergesGroupsButNoPools) {

@@ -116,6 +116,8 @@ TEST(Replay, ReportsOnEachTrace) {
     const Figures times = Find(report, "ns per event");
     EXPECT_TRUE(times.pool > 1 && times.pool < 1e7) << times.pool;
     EXPECT_TRUE(times.heap > 1 && times.heap < 1e7) << times.heap;
+    const Figures idle = Find(report.substr(report.find("\nidle\n")), "ns per event");
+    EXPECT_GT(idle.pool, idle.heap) << "A pool is built; the heap has nothing to do.";
 }
 
 TEST(Replay, RefusesACommandLineThatMakesNoSense) {
@@ -180,14 +182,16 @@ TEST(Replay, CountsWhatIsHeldAtThePeak) {
     const std::string path =
         File("held", Lines("@c:P\n@a:P:X:200\n@f:P:X:\n@a:P:X:1992\n@a:P:Y:24\n@f:P:X:\n") +
                          Lines("@a:P:X:5000\n@f:P:X:\n@a:P:X:56\n"));
-    const auto held = [&](const std::string& options) {
-        return Find(Tool("--layer mgr --rounds 1 " + options + path), "bytes held at the peak");
+    const auto held = [&](const std::string& options, const std::string& layer = "mgr") {
+        return Find(Tool("--layer " + layer + " --rounds 1 " + options + path),
+                    "bytes held at the peak");
     };
     const Figures figures = held("");
     EXPECT_NEAR(figures.heap, 5000 + 24 + 2 * 8, 16) << "A free block may be split off or not.";
     // A pool, its table, its first group, a heap record, a bucket; names and the like.
     EXPECT_NEAR(figures.pool, 88 + 249 * 8 + 40 + 5000 + 24 + 4000 + 250, 250);
     EXPECT_NEAR(held("--keep-empty ").pool, figures.pool + 4000, 200) << "The bucket of 200 bytes.";
+    EXPECT_NEAR(held("--keep-empty ", "heap").pool, held("", "heap").pool + 4000, 200);
     EXPECT_NEAR(held("--bucket-size 1004 ").pool, figures.pool - 3000, 50);
 }
 
@@ -198,6 +202,7 @@ TEST(Replay, BuildsPoolsByOptionsAndEnvironment) {
         Tool("--layer mgr --dbg --bucket-size 600 --max-record 300 --min-record 16 " + path, 0,
              {{"NUV_OBR_MEMPOOL_TRACE", "1"},
               {"NUV_OBR_MEMPOOL_BUCKET_SIZE", "700"},
+              {"NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS", ""},
               {"NUV_OBR_MEMPOOL_DATA_ALIGNMENT", "2"}});
     for (const char* line :
          {"MemPool::Mgr 00000000006a1200\n", "Bucket Size :              600\n",

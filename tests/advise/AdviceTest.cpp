@@ -30,13 +30,14 @@ std::string Verdict(const Advise::Advice& advice) {
 }
 
 TEST(Advice, IsForOnePoolOrForThoseOfTheTrace) {
-    const auto bytes = [](bool mergesGroups) {
+    const auto bytes = [](bool mergesGroups, Replay::Layer layer = Replay::Layer::Heap) {
         Trace::StepReader reader(ReadLines(Lines("@c:P\n@a:P:X:24\n@c:Q\n@a:Q:Y:24\n")), "trace");
-        const auto advice = Advise::TakeAdvice(reader, {Replay::Layer::Heap, mergesGroups, 0.1},
-                                               [](const std::string&) {});
+        const auto advice =
+            Advise::TakeAdvice(reader, {layer, mergesGroups, 0.1}, [](const std::string&) {});
         return advice.findings.settings.at(0).figures.bytes;
     };
     EXPECT_NEAR(bytes(false), 2 * bytes(true), 300);
+    EXPECT_GT(bytes(true, Replay::Layer::Malloc), bytes(true) + 300000) << "With the preload.";
 }
 
 TEST(Advice, IsPrintedWithLinesToPasteIfPoolsHelp) {
@@ -56,6 +57,27 @@ TEST(Advice, IsPrintedWithLinesToPasteIfPoolsHelp) {
                 HasSubstr(" 10.0     0.1  1.00   1000  1.00\n      506     128       8 "
                           "     16  kept        5.0     0.1  0.50    900  0.90  "
                           "fastest, smallest, best, advised\n"));
+}
+
+TEST(Advice, TableHasTheBestAndTheNamedSettings) {
+    Advise::Advice advice = Advice(900);
+    advice.findings.settings.push_back({{}, {20, 0.1, 1000, 9}});
+    for (unsigned int i = 9; i > 0; --i) {
+        advice.findings.settings.push_back({{2010, 500, i, 4, false}, {i + 10., 0, 1000, 1}});
+    }
+    advice.findings.givenUp = {{{}, "too slow"}, {{}, "out of memory"}, {{}, "too slow"}};
+    advice.verdict = Advise::Judge(advice.findings, advice.program);
+    std::ostringstream table;
+    Tool::PrintTable(table, advice, false);
+    EXPECT_THAT(table.str(),
+                HasSubstr("advised\n     2010     500       1       4  released    "
+                          "11.0       -  1.10   1000  1.00\n     2010     500       2 "));
+    EXPECT_THAT(
+        table.str(),
+        HasSubstr(
+            "  1.70   1000  1.00\n     4010    1000       8       4  released    20.0     0.1  "
+            "2.00   1000  1.00  default\n   and 2 more settings that were tried\n"
+            "   1 setting was given up: out of memory\n   2 settings were given up: too slow\n"));
 }
 
 TEST(Advice, EndsInACommandThatTriesIt) {

@@ -105,6 +105,7 @@ TEST(Verdict, CountsWhatTheProgramWouldNotice) {
     expect({12, 800}, 0.2, "smaller", "Pools would help, at a price: they take 1.20");
     expect({9.5, 800}, 0.2, "smaller", "Pools would help: they take 0.95 of the heap's time (the");
     expect({9.5, 1000}, 0.2, "none", "Pools would not help: no settings gain more than the spread");
+    expect({5, 2100}, 0.2, "none", "Pools would not help: no settings gain more than the spread");
     expect({5, 500}, 0.5, "none", "The program would not notice: it has only 999 events.", 999);
 }
 
@@ -123,6 +124,8 @@ TEST(Verdict, SaysWhatTheFiguresMeanForTheProgram) {
             "Allocation calls take an estimated 5.0 % (+/- 1.5 %) of the program's time."}));
     EXPECT_THAT(Judge({}).sentences.front(), StartsWith("Too few replays for a verdict"));
     EXPECT_EQ(Advise::ShareOf("0.125"), std::optional(0.125));
+    EXPECT_EQ(Advise::ShareOf("0"), std::optional(0.));
+    EXPECT_EQ(Advise::ShareOf("1"), std::optional(1.));
     for (const char* text : {"", "x", "-0.1", "1.1", "0.5 ", "nan"}) {
         EXPECT_EQ(Advise::ShareOf(text), std::nullopt) << text;
     }

@@ -3,6 +3,7 @@
 #include <sys/wait.h>
 
 #include <cstdio>
+#include <cstdlib>
 #include <fstream>
 #include <string>
 
@@ -14,6 +15,7 @@
 
 using nlohmann::json;
 using testing::HasSubstr;
+using testing::Not;
 
 namespace {
 
@@ -29,9 +31,13 @@ std::string Try(const std::string& arguments, int exitStatus = 0) {
     return text;
 }
 
-std::string Errors() {
-    std::ifstream file(FolderPath() + "/errors");
+std::string Content(const std::string& name) {
+    std::ifstream file(FolderPath() + "/" + name);
     return {std::istreambuf_iterator<char>(file), {}};
+}
+
+std::string Errors() {
+    return Content("errors");
 }
 
 TEST(Try, ComparesMallocAndPools) {
@@ -42,6 +48,7 @@ TEST(Try, ComparesMallocAndPools) {
     EXPECT_EQ(tried["rounds"], 2);
     EXPECT_EQ(tried["same_output"], true);
     EXPECT_THAT(tried["sentences"][0].get<std::string>(), HasSubstr("On pools the program takes "));
+    EXPECT_THAT(tried["sentences"].back().get<std::string>(), Not(HasSubstr("gains more")));
     const json& sides = tried["sides"];
     ASSERT_GE(sides.size(), 2U);
     EXPECT_EQ(sides[0]["name"], "malloc");
@@ -65,6 +72,18 @@ TEST(Try, SaysWhereTheOutputDiffers) {
     EXPECT_TRUE(json::parse(Try("--json sh -c 'echo $$'"))["same_output"].is_null());
     const json status = json::parse(Try("--json -- sh -c 'test -z \"$LD_PRELOAD\"'"));
     EXPECT_EQ(status["same_output"], false) << "The exit status counts too.";
+    const json once = json::parse(Try("--json -- sh -c 'test -z \"$LD_PRELOAD\" || ! mkdir " +
+                                      FolderPath() + "/once 2>/dev/null || echo more'"));
+    EXPECT_EQ(once["same_output"], false) << "On pools in the first round only.";
+}
+
+// Each of two rounds begins with another side. Lines of mimalloc count only if they are wrong.
+TEST(Try, SetsTheEnvironmentOfEachRun) {
+    setenv("LD_PRELOAD", ":", 1);
+    Try("-- sh -c 'echo ${LD_PRELOAD##*/} $NUV_OBR_MEMPOOL_ON | grep -v mimalloc.so.2::$ >>" +
+        FolderPath() + "/runs; true'");
+    unsetenv("LD_PRELOAD");
+    EXPECT_EQ(Content("runs"), ":\nlibMallocOnPools.so:: 1\n:\n:\nlibMallocOnPools.so:: 1\n");
 }
 
 TEST(Try, EndsAsTheProgramDoes) {
