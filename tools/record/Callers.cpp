@@ -206,8 +206,10 @@ std::uint64_t Intern(Channel& channel, const Trail& trail) {
         // Any thread that finds it empty fills it: the thread that entered it may not run for long.
         if (stack.number.load(std::memory_order_acquire) == 0) {
             const auto number = static_cast<std::uint32_t>(trail.number);
+            const std::uint32_t most = numFrames - number;
+            if (channel.framesUsed.load() > most) { break; }  // The sum never wraps.
             const std::uint32_t first = channel.framesUsed.fetch_add(number);
-            if (first > numFrames - number) { break; }
+            if (first > most) { break; }
             std::memcpy(channel.frames + first, trail.callers, number * sizeof(*trail.callers));
             stack.first.store(first, std::memory_order_release);
             stack.number.store(number, std::memory_order_release);
