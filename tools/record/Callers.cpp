@@ -111,16 +111,21 @@ std::uint32_t FindModule(Channel& channel, const Dl_info& info) {
     return index < numModules ? index : 0;
 }
 
+// The entry of the address, which is added if it is missing; the last one if there is no room.
+Caller& FindOrAdd(Channel& channel, std::uint64_t address) {
+    while (true) {
+        Caller& caller = Find(channel, address);
+        if (&caller == &channel.callers[maxCaller]) { return caller; }
+        std::uint64_t found = 0;
+        const bool isAdded = caller.address.compare_exchange_strong(found, address);
+        if (isAdded || found == address) { return caller; }
+    }
+}
+
 // Enters the address, unless the table is full. Returns whether the walk goes on past it.
 bool Enter(Channel& channel, const Frame& frame, std::uint64_t frameSize) {
-    Caller* place = nullptr;
-    for (std::uint64_t found = 0; found != frame.address;) {
-        place = &Find(channel, frame.address);
-        if (place == &channel.callers[maxCaller]) { return false; }
-        found = 0;
-        if (place->address.compare_exchange_strong(found, frame.address)) { break; }
-    }
-    Caller& caller = *place;
+    Caller& caller = FindOrAdd(channel, frame.address);
+    if (&caller == &channel.callers[maxCaller]) { return false; }
     const std::uint32_t state = caller.state.load(std::memory_order_acquire);
     if (state == Caller::Passed && caller.frameSize != frameSize) {
         caller.state.store(Caller::Variable, std::memory_order_release);
@@ -180,7 +185,7 @@ __attribute__((noinline)) void Unwind(Channel& channel, std::uint64_t address,
 bool Follow(Channel& channel, std::uint64_t address, std::uint64_t stack, Trail& trail) {
     trail.number = 0;
     trail.hash = 0;
-    while (trail.number != channel.depth) {
+    do {
         const Caller& caller = Find(channel, address);
         const auto index = static_cast<std::size_t>(&caller - channel.callers);
         const bool isEntered = caller.address.load(std::memory_order_acquire) == address;
@@ -190,7 +195,7 @@ bool Follow(Channel& channel, std::uint64_t address, std::uint64_t stack, Trail&
         if (state != Caller::Passed) { return true; }
         stack += caller.frameSize;
         std::memcpy(&address, Pointer(stack) - sizeof(address), sizeof(address));
-    }
+    } while (trail.number != channel.depth);
     return true;
 }
 
