@@ -37,13 +37,12 @@ std::string TraceFile(const std::string& name, const std::string& lines) {
     return path;
 }
 
-// A pool with small blocks of many sizes, half of which go again. They take far fewer bytes than on
-// the heap.
-std::string Blocks(const std::string& more) {
+// A pool with blocks of many sizes, half of which go again.
+std::string Blocks(const std::string& more, int number = 4000) {
     std::string lines = "@c:P\n" + more;
-    for (int i = 0; i < 4000; ++i) {
+    for (int i = 0; i < number; ++i) {
         const std::string address = "0000000000" + std::to_string(100000 + i);
-        lines += "@a:P:" + address + ":" + std::to_string(i % 30) + "\n";
+        lines += "@a:P:" + address + ":" + std::to_string(i % 90 * 3) + "\n";
         if (i % 2 == 0) { lines += "@f:P:" + address + ":\n"; }
     }
     return lines;
@@ -91,7 +90,7 @@ TEST(Advise, TextFiguresVerdictAndEnvironmentAgree) {
 }
 
 TEST(Advise, PrintsWhatItHasWhenItIsStopped) {
-    const std::string path = TraceFile("long", Blocks(""));
+    const std::string path = TraceFile("long", Blocks("", 100000));  // Takes far longer.
     const json advice = json::parse(
         Command("timeout -s TERM 3 " MEMPOOL " advise --json --seconds 60 " + path, 124));
     EXPECT_EQ(advice["stopped"], true);
