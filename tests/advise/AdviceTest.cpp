@@ -33,7 +33,7 @@ TEST(Advice, IsForOnePoolOrForThoseOfTheTrace) {
     const auto bytes = [](bool mergesGroups, Replay::Layer layer = Replay::Layer::Heap) {
         Trace::StepReader reader(ReadLines(Lines("@c:P\n@a:P:X:24\n@c:Q\n@a:Q:Y:24\n")), "trace");
         const auto advice =
-            Advise::TakeAdvice(reader, {layer, mergesGroups, 0.1}, [](const std::string&) {});
+            Advise::TakeAdvice(reader, {layer, mergesGroups, 1}, [](const std::string&) {});
         return advice.findings.settings.at(0).figures.bytes;
     };
     EXPECT_NEAR(bytes(false), 2 * bytes(true), 300);

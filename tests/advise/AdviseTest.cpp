@@ -50,7 +50,7 @@ std::string Blocks(const std::string& more, int number = 4000) {
 
 TEST(Advise, TextFiguresVerdictAndEnvironmentAgree) {
     const std::string path = TraceFile("shared", Blocks("@i:allocation_share:0.25\n"));
-    const json advice = json::parse(Command(MEMPOOL " advise --json --seconds 1 " + path));
+    const json advice = json::parse(Command(MEMPOOL " advise --json --seconds 4 " + path));
 
     std::set<std::string> keys;
     for (const auto& [key, value] : advice.items()) { keys.insert(key); }
@@ -92,7 +92,7 @@ TEST(Advise, TextFiguresVerdictAndEnvironmentAgree) {
 TEST(Advise, PrintsWhatItHasWhenItIsStopped) {
     const std::string path = TraceFile("long", Blocks("", 100000));  // Takes far longer.
     const json advice = json::parse(
-        Command("timeout -s TERM 3 " MEMPOOL " advise --json --seconds 60 " + path, 124));
+        Command("timeout -s TERM 6 " MEMPOOL " advise --json --seconds 60 " + path, 124));
     EXPECT_EQ(advice["stopped"], true);
     EXPECT_GE(advice["settings"].size(), 1U);
 }
