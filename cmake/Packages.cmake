@@ -58,9 +58,9 @@ set(CPACK_DEBIAN_RUNTIME_PACKAGE_CONTROL_EXTRA
 # Empty, because each description starts with its own summary.
 set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "")
 string(JOIN "\n" about
-    "libObrMemPool gives C++ and C programs named pools for millions of small objects"
-    "that are dropped in groups. A block costs 4 to 8 bytes, is allocated and freed"
-    "in constant time, and appears in reports of where the memory is."
+    "libObrMemPool gives C++ and C programs named pools for millions of small"
+    "objects that are dropped in groups. A block costs 4 to 8 bytes, is allocated"
+    "and freed in constant time, and appears in reports of where the memory is."
     "" "")
 string(JOIN "\n" CPACK_DEBIAN_RUNTIME_DESCRIPTION
     "named memory pools for C++ and C programs"
