@@ -153,6 +153,7 @@ TEST(Quantile, LiesBetweenTheNearestTwo) {
     EXPECT_EQ(Advise::Quantile({4, 1, 3, 2}, 0.5), 2.5);
     EXPECT_EQ(Advise::Quantile({4, 1, 3, 2, 5}, 0.25), 2);
     EXPECT_EQ(Advise::Quantile({7}, 0.75), 7);
+    EXPECT_EQ(Advise::Spread({8, 1, 3, 2, 5}), 3) << "5 - 2.";
 }
 
 TEST(Verdict, SettingsArePastedAsEnvironmentAndAsCode) {

@@ -32,4 +32,8 @@ double Quantile(std::vector<double> values, double share) {
     return values[below] + (place - static_cast<double>(below)) * (values[above] - values[below]);
 }
 
+double Spread(const std::vector<double>& values) {
+    return Quantile(values, 0.75) - Quantile(values, 0.25);
+}
+
 }  // namespace Advise

@@ -54,6 +54,9 @@ bool DifferInTime(const Figures& a, const Figures& b);
 // There must be at least one value.
 double Quantile(std::vector<double> values, double share);
 
+// From the lower to the upper quartile.
+double Spread(const std::vector<double>& values);
+
 }  // namespace Advise
 
 #endif

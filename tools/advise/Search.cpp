@@ -211,8 +211,7 @@ private:
 
     Figures FiguresOf(const std::vector<double>& ratios, double bytes) const {
         const double heapTime = Quantile(heapTimes, 0.5);
-        return {heapTime * Quantile(ratios, 0.5),
-                heapTime * (Quantile(ratios, 0.75) - Quantile(ratios, 0.25)), bytes,
+        return {heapTime * Quantile(ratios, 0.5), heapTime * Spread(ratios), bytes,
                 static_cast<unsigned int>(ratios.size())};
     }
 

@@ -76,10 +76,6 @@ void AddRow(Table& table, const char* label, double pool, double heap, int digit
                  heap > 0 ? fmt::format("{:.2f}", pool / heap) : "-");
 }
 
-double Spread(const std::vector<double>& times) {
-    return Advise::Quantile(times, 0.75) - Advise::Quantile(times, 0.25);
-}
-
 // Returns the exit status.
 int Compare(const std::string& path, const Options& options) {
     Trace::StepReader reader(path);
@@ -118,8 +114,8 @@ int Compare(const std::string& path, const Options& options) {
     addSame("blocks never freed", recording.numNeverFreed);
     AddRow(table, "bytes held at the peak", poolBytes, heapBytes, 0);
     AddRow(table, "ns per event", Advise::Quantile(pool, 0.5), Advise::Quantile(heap, 0.5), 1);
-    table.AddRow("spread", fmt::format("{:.1f}", Spread(pool)),
-                 fmt::format("{:.1f}", Spread(heap)));
+    table.AddRow("spread", fmt::format("{:.1f}", Advise::Spread(pool)),
+                 fmt::format("{:.1f}", Advise::Spread(heap)));
     table.Write(std::cout);
     std::cout << std::flush;
     return WarnOfBrokenTrace(reader);

@@ -130,9 +130,7 @@ std::unique_ptr<Run> RunOnce(const Order& order, const Side& side) {
 }
 
 Advise::Figures FiguresOf(const Side& side, unsigned int rounds) {
-    const std::vector<double>& times = side.cpuSeconds;
-    return {Advise::Quantile(times, 0.5),
-            Advise::Quantile(times, 0.75) - Advise::Quantile(times, 0.25),
+    return {Advise::Quantile(side.cpuSeconds, 0.5), Advise::Spread(side.cpuSeconds),
             Advise::Quantile(side.peakBytes, 0.5), rounds};
 }
 
