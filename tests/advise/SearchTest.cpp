@@ -8,6 +8,7 @@
 #include <random>
 #include <set>
 #include <stdexcept>
+#include <string>
 #include <tuple>
 #include <vector>
 
@@ -159,6 +160,15 @@ TEST(Search, GivesUpWhatFails) {
     MadeMeter heapless;
     heapless.fails = [](const Side& side) { return !Pools(side); };
     EXPECT_THROW(Find(heapless, 1000), std::runtime_error);
+
+    MadeMeter stopped;
+    stopped.mostSeconds = stopped.secondsPerReplay;
+    try {
+        Find(stopped, 1000);
+        FAIL() << "There is no figure of the heap.";
+    } catch (const std::runtime_error& error) {
+        EXPECT_EQ(std::string(error.what()).find("the search ended before the heap"), 0U);
+    }
 }
 
 // All settings that can be reached from the defaults. Settings that no pool can have would end the

@@ -7,6 +7,7 @@
 #include <algorithm>
 #include <optional>
 #include <set>
+#include <stdexcept>
 #include <utility>
 #include <variant>
 #include <vector>
@@ -31,6 +32,8 @@ constexpr double lookingShare = 0.4;
 constexpr double walkingShare = 0.7;
 
 constexpr const char* heapFailed = "the replay on the heap failed";
+constexpr const char* endedEarly =
+    "the search ended before the heap was measured; let it run longer, or raise --seconds";
 
 // Settings, or mimalloc, during the search.
 struct Candidate {
@@ -52,8 +55,8 @@ class Searcher {
 public:
     Searcher(Meter& replays, double budget, const std::function<void(std::size_t)>& progress)
         : meter(replays), seconds(budget), atStep(progress) {
-        heapBytes = meter.Held(Malloc()).OrFail(heapFailed);
-        heapTimes.push_back(meter.Time(Malloc()).OrFail(heapFailed));
+        heapBytes = FirstOfHeap(meter.Held(Malloc()));
+        heapTimes.push_back(FirstOfHeap(meter.Time(Malloc())));
     }
 
     Findings Run() {
@@ -80,6 +83,13 @@ public:
     }
 
 private:
+    double FirstOfHeap(const Outcome& outcome) const {
+        if (!outcome.figure.has_value() && meter.IsStopped()) {
+            throw std::runtime_error(endedEarly);
+        }
+        return outcome.OrFail(heapFailed);
+    }
+
     bool HasTime(double share) const {
         return !meter.IsStopped() && meter.Elapsed() < share * seconds;
     }
