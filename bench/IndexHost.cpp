@@ -16,7 +16,7 @@
 #include <unordered_map>
 #include <vector>
 
-#include <CLI/CLI.hpp>
+#include "CommandLine.hpp"
 
 namespace {
 
@@ -69,12 +69,13 @@ int main(int argc, char** argv) {
     bool usePmr = false;
     bool off = false;
     bool close = false;
-    CLI::App app("Indexes the words of the standard input in a memory pool.", "IndexHost");
-    app.add_flag("--heap", useNew, "Use new and delete instead of pools");
-    app.add_flag("--pmr", usePmr, "Use std::pmr::unsynchronized_pool_resource instead of pools");
-    app.add_flag("--off", off, "Disable pools");
-    app.add_flag("--close", close, "Destroy the index before the heap");
-    CLI11_PARSE(app, argc, argv);
+    CommandLine line("IndexHost", "Indexes the words of the standard input in a memory pool.");
+    line.Flag("--heap", useNew, "Use new and delete instead of pools");
+    line.Flag("--pmr", usePmr, "Use std::pmr::unsynchronized_pool_resource instead of pools");
+    line.Flag("--off", off, "Disable pools");
+    line.Flag("--close", close, "Destroy the index before the heap");
+    int status = 0;
+    if (!line.Read(argc, argv, status)) { return status; }
 
     std::ios::sync_with_stdio(false);
     if (useNew) {

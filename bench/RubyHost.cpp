@@ -9,7 +9,8 @@
 
 #include <mruby.h>
 #include <mruby/compile.h>
-#include <CLI/CLI.hpp>
+
+#include "CommandLine.hpp"
 
 namespace {
 
@@ -30,19 +31,23 @@ int main(int argc, char** argv) {
     bool useMalloc = false;
     bool off = false;
     bool close = false;
-    CLI::App app("Runs a Ruby program in a memory pool.", "RubyHost");
-    app.add_option("PROGRAM", program, "A Ruby file")->required()->check(CLI::ExistingFile);
-    app.add_flag("--heap", useMalloc, "Use the C library's malloc instead of pools");
-    app.add_flag("--off", off, "Disable pools");
-    app.add_flag("--close", close, "Free all blocks before the heap");
-    CLI11_PARSE(app, argc, argv);
+    CommandLine line("RubyHost", "Runs a Ruby program in a memory pool.");
+    line.File("PROGRAM", program, "A Ruby file");
+    line.Flag("--heap", useMalloc, "Use the C library's malloc instead of pools");
+    line.Flag("--off", off, "Disable pools");
+    line.Flag("--close", close, "Free all blocks before the heap");
+    int status = 0;
+    if (!line.Read(argc, argv, status)) { return status; }
 
     Heap heap("ruby", HeapSettings().On(!off));
     mrb_state* const ruby = useMalloc ? mrb_open() : mrb_open_allocf(FromHeap, &heap);
     if (ruby == nullptr) { return 1; }
     const std::unique_ptr<std::FILE, int (*)(std::FILE*)> file(std::fopen(program.c_str(), "r"),
                                                                std::fclose);
-    if (file == nullptr) { return 1; }
+    if (file == nullptr) {
+        std::perror(program.c_str());
+        return 1;
+    }
     mrb_load_file(ruby, file.get());
     const bool success = ruby->exc == nullptr;
     if (!success) { mrb_print_error(ruby); }

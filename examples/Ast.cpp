@@ -25,7 +25,7 @@
 #include <unordered_map>
 #include <vector>
 
-#include <CLI/CLI.hpp>
+#include "CommandLine.hpp"
 
 namespace {
 
@@ -278,14 +278,14 @@ int Main(int argc, char** argv) {
     bool useHeap = false;
     bool off = false;
     bool report = false;
-    CLI::App app("Parses and evaluates a generated text, with its tree in a memory pool.", "Ast");
-    app.add_option("--definitions", definitions, "Definitions in the text")
-        ->check(CLI::Range(1, 10000000))
-        ->capture_default_str();
-    app.add_flag("--heap", useHeap, "Use new and delete instead of a pool");
-    app.add_flag("--off", off, "Disable the pool, so that a memory checker sees each block");
-    app.add_flag("--report", report, "Print the pool before the tree is dropped");
-    CLI11_PARSE(app, argc, argv);
+    CommandLine line("Ast",
+                     "Parses and evaluates a generated text, with its tree in a memory pool.");
+    line.Number("--definitions", definitions, 1, 10000000, "Definitions in the text");
+    line.Flag("--heap", useHeap, "Use new and delete instead of a pool");
+    line.Flag("--off", off, "Disable the pool, so that a memory checker sees each block");
+    line.Flag("--report", report, "Print the pool before the tree is dropped");
+    int status = 0;
+    if (!line.Read(argc, argv, status)) { return status; }
 
     const std::string text = MadeText(definitions);
     if (useHeap) {

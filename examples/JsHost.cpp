@@ -13,10 +13,12 @@
 #include <fstream>
 #include <iostream>
 #include <iterator>
+#include <stdexcept>
 #include <string>
 
 #include <duktape.h>
-#include <CLI/CLI.hpp>
+
+#include "CommandLine.hpp"
 
 namespace {
 
@@ -86,16 +88,16 @@ bool Run(const Options& options, std::string text) {
 
 int Main(int argc, char** argv) {
     Options options;
-    CLI::App app("Runs a JavaScript program in a memory pool.", "JsHost");
-    app.add_option("PROGRAM", options.program, "A JavaScript file")
-        ->required()
-        ->check(CLI::ExistingFile);
-    app.add_flag("--heap", options.useMalloc, "Use the C library's malloc instead of pools");
-    app.add_flag("--off", options.off, "Disable pools, so that a memory checker sees each block");
-    app.add_flag("--close", options.close, "Run finalizers and free all blocks before the heap");
-    CLI11_PARSE(app, argc, argv);
+    CommandLine line("JsHost", "Runs a JavaScript program in a memory pool.");
+    line.File("PROGRAM", options.program, "A JavaScript file");
+    line.Flag("--heap", options.useMalloc, "Use the C library's malloc instead of pools");
+    line.Flag("--off", options.off, "Disable pools, so that a memory checker sees each block");
+    line.Flag("--close", options.close, "Run finalizers and free all blocks before the heap");
+    int status = 0;
+    if (!line.Read(argc, argv, status)) { return status; }
 
     std::ifstream input(options.program);
+    if (!input) { throw std::runtime_error("cannot read " + options.program); }
     const std::string text(std::istreambuf_iterator<char>(input), {});
     std::ios::sync_with_stdio(false);  // Faster input: reading is not what is measured here.
     return Run(options, text) ? 0 : 1;

@@ -18,8 +18,9 @@
 #include <string>
 #include <vector>
 
-#include <CLI/CLI.hpp>
 #include <lua.hpp>
+
+#include "CommandLine.hpp"
 
 namespace {
 
@@ -129,15 +130,15 @@ bool Run(const Options& options, const std::string& script, std::size_t number) 
 
 int Main(int argc, char** argv) {
     Options options;
-    CLI::App app("Runs Lua scripts, each in a memory pool of its own.", "LuaHost");
-    app.add_option("SCRIPT", options.scripts, "Lua scripts to run, one after the other")
-        ->required();
-    app.add_flag("--heap", options.useMalloc, "Use the C library's malloc instead of pools");
-    app.add_flag("--off", options.off, "Disable pools, so that a memory checker sees each block");
-    app.add_flag("--close", options.close,
-                 "Close the state before the heap is dropped, which runs finalizers");
-    app.add_flag("--report", options.report, "Print the pool of each script when it ends");
-    CLI11_PARSE(app, argc, argv);
+    CommandLine line("LuaHost", "Runs Lua scripts, each in a memory pool of its own.");
+    line.Files("SCRIPT", options.scripts, "Lua scripts to run, one after the other");
+    line.Flag("--heap", options.useMalloc, "Use the C library's malloc instead of pools");
+    line.Flag("--off", options.off, "Disable pools, so that a memory checker sees each block");
+    line.Flag("--close", options.close,
+              "Close the state before the heap is dropped, which runs finalizers");
+    line.Flag("--report", options.report, "Print the pool of each script when it ends");
+    int status = 0;
+    if (!line.Read(argc, argv, status)) { return status; }
 
     bool success = true;
     for (std::size_t number = 0; number < options.scripts.size(); ++number) {

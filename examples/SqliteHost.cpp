@@ -19,7 +19,8 @@
 #include <string>
 
 #include <sqlite3.h>
-#include <CLI/CLI.hpp>
+
+#include "CommandLine.hpp"
 
 namespace {
 
@@ -128,13 +129,14 @@ bool Run(const Options& options) {
 
 int Main(int argc, char** argv) {
     Options options;
-    CLI::App app("Runs an SQL file with SQLite's memory in a pool.", "SqliteHost");
-    app.add_option("FILE", options.file, "SQL statements")->required();
-    app.add_option("--database", options.database, "Database file")->capture_default_str();
-    app.add_flag("--heap", options.useMalloc, "Use the C library's malloc instead of pools");
-    app.add_flag("--off", options.off, "Disable pools, so that a memory checker sees each block");
-    app.add_flag("--report", options.report, "Print the pool at the end");
-    CLI11_PARSE(app, argc, argv);
+    CommandLine line("SqliteHost", "Runs an SQL file with SQLite's memory in a pool.");
+    line.File("FILE", options.file, "SQL statements");
+    line.Text("--database", options.database, "Database file");
+    line.Flag("--heap", options.useMalloc, "Use the C library's malloc instead of pools");
+    line.Flag("--off", options.off, "Disable pools, so that a memory checker sees each block");
+    line.Flag("--report", options.report, "Print the pool at the end");
+    int status = 0;
+    if (!line.Read(argc, argv, status)) { return status; }
 
     std::unique_ptr<Heap> heap;
     sqlite3_config(SQLITE_CONFIG_MEMSTATUS, 0);  // SQLite then keeps no statistics of its own.

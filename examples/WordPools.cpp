@@ -26,8 +26,7 @@
 #include <utility>
 #include <vector>
 
-#include <CLI/CLI.hpp>
-
+#include "CommandLine.hpp"
 #include "Progress.hpp"
 
 namespace {
@@ -212,7 +211,7 @@ long PeakResident() {
 
 struct Options {
     std::vector<std::string> files;
-    std::size_t top = 10;
+    int top = 10;
     bool heap = false;
     bool report = false;
     bool detailed = false;
@@ -220,7 +219,7 @@ struct Options {
 };
 
 void PrintTexts(const std::deque<Text>& texts, const Options& options) {
-    for (const Text& text : texts) { PrintWords(text, options.top); }
+    for (const Text& text : texts) { PrintWords(text, static_cast<std::size_t>(options.top)); }
     PrintPools(texts);
     if (options.detailed) {
         OBR::MemPool::DbgDetailed();
@@ -269,28 +268,19 @@ resident memory.
 A text that cannot be read is reported on standard error and left out. The exit status is then 1.)";
 
 int Run(int argc, char** argv) {
-    CLI::App app(description, "WordPools");
     Options options;
-    app.add_option("FILE", options.files, "Texts to read; - is the standard input")
-        ->required()
-        ->type_name("");
-    auto* const top = app.add_option("--top", options.top, "Print the N most frequent words")
-                          ->check(CLI::Range(0, 1000000))
-                          ->type_name("N")
-                          ->capture_default_str();
-    app.add_flag("--heap", options.heap, "Disable pools, so that every block comes from the heap");
-    auto* const report = app.add_flag("--report", options.report, "Print the report of each pool");
-    auto* const detailed =
-        app.add_flag("--detailed", options.detailed,
-                     "Print the detailed report of each pool, with every record");
-    app.add_flag("--figures", options.figures,
-                 "Print only seconds to read, seconds to drop, and KiB at the peak")
-        ->excludes(top, report, detailed);
-    try {
-        app.parse(argc, argv);
-    } catch (const CLI::ParseError& error) {
-        return app.exit(error) == 0 ? EXIT_SUCCESS : EXIT_FAILURE;
-    }
+    CommandLine line("WordPools", description);
+    line.Files("FILE", options.files, "Texts to read; - is the standard input");
+    line.Number("--top", options.top, 0, 1000000, "Print the N most frequent words");
+    line.Flag("--heap", options.heap, "Disable pools, so that every block comes from the heap");
+    line.Flag("--report", options.report, "Print the report of each pool");
+    line.Flag("--detailed", options.detailed,
+              "Print the detailed report of each pool, with every record");
+    line.Flag("--figures", options.figures,
+              "Print only seconds to read, seconds to drop, and KiB at the peak");
+    line.Exclude("--figures", {"--top", "--report", "--detailed"});
+    int status = 0;
+    if (!line.Read(argc, argv, status)) { return status; }
     std::ios::sync_with_stdio(false);
     return CountAll(options) ? EXIT_SUCCESS : EXIT_FAILURE;
 }

@@ -15,7 +15,8 @@
 
 #include <libxml/parser.h>
 #include <libxml/tree.h>
-#include <CLI/CLI.hpp>
+
+#include "CommandLine.hpp"
 
 namespace {
 
@@ -75,8 +76,12 @@ void Count(const xmlNode* node, Figures& figures) {
 // first needs them, and which would then be dropped with the document.
 bool Read(const std::string& file, bool close) {
     const int descriptor = open(file.c_str(), O_RDONLY | O_CLOEXEC);
+    if (descriptor < 0) {
+        std::perror(file.c_str());
+        return false;
+    }
     xmlDoc* const made = xmlReadFd(descriptor, file.c_str(), nullptr, XML_PARSE_HUGE);
-    if (descriptor >= 0) { ::close(descriptor); }
+    ::close(descriptor);
     if (made != nullptr) {
         Figures figures;
         Count(xmlDocGetRootElement(made), figures);
@@ -106,12 +111,13 @@ bool ReadAll(const Options& options) {
 
 int Main(int argc, char** argv) {
     Options options;
-    CLI::App app("Reads XML files, each into a memory pool of its own.", "XmlHost");
-    app.add_option("FILE", options.files, "XML files")->required()->check(CLI::ExistingFile);
-    app.add_flag("--heap", options.useMalloc, "Use the C library's malloc instead of pools");
-    app.add_flag("--off", options.off, "Disable pools, so that a memory checker sees each block");
-    app.add_flag("--close", options.close, "Free each document node by node before its heap");
-    CLI11_PARSE(app, argc, argv);
+    CommandLine line("XmlHost", "Reads XML files, each into a memory pool of its own.");
+    line.Files("FILE", options.files, "XML files");
+    line.Flag("--heap", options.useMalloc, "Use the C library's malloc instead of pools");
+    line.Flag("--off", options.off, "Disable pools, so that a memory checker sees each block");
+    line.Flag("--close", options.close, "Free each document node by node before its heap");
+    int status = 0;
+    if (!line.Read(argc, argv, status)) { return status; }
 
     Heap heap("libxml2", HeapSettings().On(!options.off));
     library = &heap;
