@@ -1,5 +1,9 @@
 // mempool check: runs a program with pools enabled, with the checked library, and under a checker.
 
+#include <fcntl.h>
+#include <libelf.h>
+
+#include <cerrno>
 #include <cstdlib>
 #include <filesystem>
 #include <iostream>
@@ -7,14 +11,15 @@
 #include <memory>
 #include <stdexcept>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include <MemPoolSettings>
 
 #include "mempool/CommandLine.hpp"
-#include "mempool/HostFile.hpp"
 #include "mempool/Program.hpp"
 #include "system/Child.hpp"
+#include "system/Descriptor.hpp"
 #include "system/ExitStatus.hpp"
 #include "system/ProgramFile.hpp"
 
@@ -61,6 +66,33 @@ struct Options {
     std::string with;  // A name of `checkers`, or empty.
     unsigned int alignment = 1;
 };
+
+// Facts about the program, from its file.
+struct HostFile {
+    bool isScript;      // Then the other three are unknown.
+    bool isSanitized;   // Built with AddressSanitizer.
+    bool namesLibrary;  // Names the shared library, to be loaded at the start or later.
+    bool holdsLibrary;  // Contains the archive.
+};
+
+// Searches the whole file for a few texts. This also works for a stripped program, and for
+// libraries that it loads by name while it runs.
+HostFile ReadHostFile(const std::string& path) {
+    const System::Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC));
+    if (!file.IsOpen()) { throw System::Failure(System::cannotRun, path, errno); }
+    elf_version(EV_CURRENT);
+    const std::unique_ptr<Elf, int (*)(Elf*)> elf(
+        elf_begin(file.Number(), ELF_C_READ_MMAP, nullptr), elf_end);
+    std::size_t size = 0;
+    const char* const start = elf_rawfile(elf.get(), &size);
+    const std::string_view bytes(start, start == nullptr ? 0 : size);
+    const auto has = [&](std::string_view text) { return bytes.find(text) != bytes.npos; };
+
+    const bool namesLibrary = has("libObrMemPool.so") || has("libObrMemPoolC.so");
+    // Every program that reads the settings itself contains the name of one.
+    return {elf_kind(elf.get()) != ELF_K_ELF, System::IsAddressSanitized(path), namesLibrary,
+            !namesLibrary && has("NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS")};
+}
 
 void Say(const std::string& what) {
     std::cerr << "mempool: " << what << '\n';

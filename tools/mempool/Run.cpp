@@ -25,6 +25,7 @@
 #include "mempool/Settings.hpp"
 #include "report/Analysis.hpp"
 #include "system/Child.hpp"
+#include "system/Descriptor.hpp"
 #include "system/ExitStatus.hpp"
 #include "system/ProgramFile.hpp"
 #include "trace/OpenTrace.hpp"
@@ -64,16 +65,13 @@ class NamelessFile {
 public:
     NamelessFile()
         : name(std::filesystem::temp_directory_path() / "mempool.XXXXXX"),
-          descriptor(mkostemp(name.data(), O_CLOEXEC)) {
-        if (descriptor < 0) { throw std::system_error(errno, std::generic_category(), name); }
+          file(mkostemp(name.data(), O_CLOEXEC)) {
+        if (!file.IsOpen()) { throw std::system_error(errno, std::generic_category(), name); }
         unlink(name.c_str());
     }
-    NamelessFile(const NamelessFile&) = delete;
-    NamelessFile& operator=(const NamelessFile&) = delete;
-    ~NamelessFile() { close(descriptor); }
 
     // A path by which this process can open it.
-    std::string Path() const { return "/proc/self/fd/" + std::to_string(descriptor); }
+    std::string Path() const { return "/proc/self/fd/" + std::to_string(file.Number()); }
 
     // The text of an error, with the file's former name instead of that path.
     std::string Named(std::string error) const {
@@ -85,7 +83,7 @@ public:
 
 private:
     std::string name;
-    const int descriptor;
+    const System::Descriptor file;
 };
 
 Trace::StepReader Open(const NamelessFile& trace, const Options& options) {
@@ -147,7 +145,7 @@ void AddRun(Program& program) {
     AddCommand(program, run);
     const auto options = std::make_shared<Options>();
     AddRecordOptions(run, options->order);
-    run.add_option("--html", options->html, "Write the page of the report to FILE too")
+    run.add_option("--html", options->html, "Also write the report to FILE, as a page with charts")
         ->type_name("FILE");
     AddLayer(run, options->layer);
     AddSeconds(run, options->seconds);
