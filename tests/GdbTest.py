@@ -238,12 +238,24 @@ class LiveHost(unittest.TestCase):
             with self.poke(thing, field, value):
                 self.assertTrue(run(f'mempool check "{LETTERS}"').endswith(fault + "\n"), fault)
 
+        # A group inside a heap record, and a heap record whose block begins with the pool.
+        inside = evaluate("(long) extBlocks[2]")
+        forged = self.layout.GROUP.form.pack(pool.address, 0, 0, 0, 0, 0, 4, 50, 6, 0)
+        with Poke(inside, forged), Poke(pool.row.groups, struct.pack("<Q", inside)):
+            self.assertIn(f"group 0 at {inside:#018x}: it begins inside the heap record at ",
+                          run(f'mempool check "{LETTERS}"'))
+        before = pool.address - self.layout.EXT_REC.size
+        forged = self.layout.EXT_REC.form.pack(0, 0, 37, self.layout.EXT_HDR)
+        with Poke(before, forged), self.poke(pool, "extRecs", before), self.poke(pool, "numExtRecs", 1):
+            self.assertIn(f"pool at {pool.address:#018x}: it begins inside the heap record at ",
+                          run(f'mempool check "{LETTERS}"'))
+
         for offset, byte, fault in ((15, b"x", "no end after its 15 bytes"),
                                     (0, b"\xFF", r"its name is \xffifteen letters")):
             with Poke(pool.address + 16 + offset, byte):  # The string holds its text itself.
                 self.assertTrue(run(f'mempool check "{LETTERS}"').endswith(fault + "\n"), fault)
 
-    def test_words_the_rules_as_the_library_does(self):
+    def test_states_the_rules_in_the_words_of_the_library(self):
         for field, value, problem in (("bucketSize", 43, "tooLarge"), ("minRecordSize", 44, "tooSmall")):
             with self.poke(self.pools["three"], field, value):
                 text = gdb.parse_and_eval(f"{problem}._M_dataplus._M_p").string()
@@ -261,7 +273,7 @@ class LiveHost(unittest.TestCase):
     def whois(self, expression):
         return run("mempool whois " + expression)
 
-    def test_tells_what_an_address_is(self):
+    def test_describes_an_address(self):
         pool = self.pools[LETTERS]
         bucket = next(pool.buckets())
         head = (f"   Pool    : {LETTERS}, {pool.address:#018x}\n"
