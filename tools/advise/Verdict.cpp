@@ -155,10 +155,12 @@ private:
             sentences.push_back(Share() + ".");
         }
         if (verdict.isMimallocBetter) {
-            sentences.push_back(fmt::format(
-                "Preloaded mimalloc would help more: it takes {:.2f} of the heap's time and {:.2f} "
-                "of its bytes.",
-                TimeRatio(*findings.mimalloc), BytesRatio(*findings.mimalloc)));
+            sentences.push_back(
+                fmt::format("{} mimalloc would help{}: it takes {:.2f} of the heap's time and "
+                            "{:.2f} of its bytes.",
+                            verdict.advised.has_value() ? "Preloaded" : "Only preloaded",
+                            verdict.advised.has_value() ? " more" : "",
+                            TimeRatio(*findings.mimalloc), BytesRatio(*findings.mimalloc)));
         }
         return sentences;
     }

@@ -36,6 +36,8 @@ cpu s         User and system time, the median of the rounds.
 spread        Between the lower and the upper quartile. A difference within it, or of less than 1 %,
               is neither a gain nor a price.
 peak MB       The peak of resident memory, including the program's code.
+page faults   Pages that were made resident. One that was given back to the system and is used again
+              counts again. A replay does not show these.
 
 Standard input is empty unless --stdin names a file. Ctrl-C ends the trial and shows the complete
 rounds.
@@ -58,7 +60,8 @@ nlohmann::ordered_json JsonOf(unsigned int rounds, const Preload::Conclusion& co
                          {"cpu_ratio", each.timeRatio},
                          {"wall_seconds", each.wallSeconds},
                          {"peak_bytes", static_cast<std::int64_t>(each.figures.bytes)},
-                         {"peak_ratio", each.bytesRatio}});
+                         {"peak_ratio", each.bytesRatio},
+                         {"page_faults", static_cast<std::int64_t>(each.pageFaults)}});
     }
     nlohmann::ordered_json same;
     if (conclusion.sameOutput.has_value()) { same = *conclusion.sameOutput; }
@@ -76,13 +79,15 @@ void Print(unsigned int rounds, const Preload::Conclusion& conclusion) {
                  {"of malloc"},
                  {"wall s"},
                  {"peak MB"},
-                 {"of malloc"}});
+                 {"of malloc"},
+                 {"page faults"}});
     for (const Preload::Result& each : conclusion.results) {
         table.AddRow(each.name, fmt::format("{:.3f}", each.figures.time),
                      fmt::format("{:.3f}", each.figures.spread),
                      fmt::format("{:.2f}", each.timeRatio), fmt::format("{:.3f}", each.wallSeconds),
                      fmt::format("{:.1f}", each.figures.bytes / 1e6),
-                     fmt::format("{:.2f}", each.bytesRatio));
+                     fmt::format("{:.2f}", each.bytesRatio),
+                     fmt::format("{:.0f}", each.pageFaults));
     }
     fmt::print(std::cerr, "\n   Rounds: {}\n", rounds);
     table.Write(std::cerr);

@@ -90,6 +90,7 @@ struct Run {
     double cpuSeconds = 0;
     double wallSeconds = 0;
     double peakBytes = 0;
+    double pageFaults = 0;
 };
 
 double Seconds(const timeval& time) {
@@ -126,6 +127,7 @@ std::unique_ptr<Run> RunOnce(const Order& order, const Side& side) {
     run->wallSeconds = taken.count();
     run->cpuSeconds = Seconds(used.ru_utime) + Seconds(used.ru_stime);
     run->peakBytes = 1024 * static_cast<double>(used.ru_maxrss);
+    run->pageFaults = static_cast<double>(used.ru_minflt);
     return run;
 }
 
@@ -177,6 +179,7 @@ Trial TryProgram(const Order& order,
             side.cpuSeconds.push_back(runs[i]->cpuSeconds);
             side.wallSeconds.push_back(runs[i]->wallSeconds);
             side.peakBytes.push_back(runs[i]->peakBytes);
+            side.pageFaults.push_back(runs[i]->pageFaults);
             const bool isLike = runs[i]->status == first->status &&
                                 first->output.IsLike(runs[i]->output) &&
                                 first->errors.IsLike(runs[i]->errors);
@@ -193,6 +196,7 @@ Conclusion Conclude(const Trial& trial) {
     for (const Side& side : trial.sides) {
         const Advise::Figures figures = FiguresOf(side, trial.rounds);
         conclusion.results.push_back({side.name, figures, Advise::Quantile(side.wallSeconds, 0.5),
+                                      Advise::Quantile(side.pageFaults, 0.5),
                                       Cost(figures, malloc, Advise::Aim::Time),
                                       Cost(figures, malloc, Advise::Aim::Bytes)});
     }
@@ -208,7 +212,10 @@ Conclusion Conclude(const Trial& trial) {
     };
     add("On pools", 1);
     if (hasMimalloc) {
-        add(verdict.isMimallocBetter ? "Preloaded mimalloc gains more: with it" : "With mimalloc",
+        const bool isBetter = verdict.isMimallocBetter;
+        add(!isBetter                     ? "With mimalloc"
+            : verdict.advised.has_value() ? "Preloaded mimalloc gains more: with it"
+                                          : "Only preloaded mimalloc gains: with it",
             2);
     }
     if (!trial.sides.at(0).isSame) {

@@ -27,8 +27,9 @@ struct Side {
     std::string library;             // The preloaded library; empty for malloc.
     std::vector<double> cpuSeconds;  // User and system time, a value for each round.
     std::vector<double> wallSeconds;
-    std::vector<double> peakBytes;  // Resident memory.
-    bool isSame = true;             // Output and exit status were the same as in the first run.
+    std::vector<double> peakBytes;   // Resident memory.
+    std::vector<double> pageFaults;  // Without those that read from a disk.
+    bool isSame = true;              // Output and exit status were the same as in the first run.
 };
 
 struct Trial {
@@ -49,6 +50,7 @@ struct Result {
     std::string name;
     Advise::Figures figures;  // The time is seconds of the processor.
     double wallSeconds;
+    double pageFaults;
     double timeRatio;
     double bytesRatio;
 };
