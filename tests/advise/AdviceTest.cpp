@@ -1,5 +1,6 @@
 // An advice from the trace to the text.
 
+#include <cstdlib>
 #include <sstream>
 #include <string>
 
@@ -84,6 +85,10 @@ TEST(Advice, EndsInACommandThatTriesIt) {
     EXPECT_EQ(Tool::TryCommand({2010, 500, 16, 8, true}, {"perl", "-e", "print 'x'", ""}),
               "mempool try --bucket-size 2010 --max-record 500 --min-record 16 --alignment 8 "
               "--keep-empty -- perl -e 'print '\\''x'\\''' ''");
+    EXPECT_EQ(Tool::TryCommand({}, {"a"}), "mempool try -- a");
+    setenv("NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS", "1", 1);
+    EXPECT_EQ(Tool::TryCommand({}, {"a"}), "mempool try --keep-empty=false -- a");
+    unsetenv("NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS");
 }
 
 }  // namespace

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
+#include <cstdlib>
 #include <map>
 #include <string>
 #include <utility>
@@ -142,8 +143,11 @@ std::string TryCommand(const OBR::MemPool::PoolSettings& settings,
     std::string line = "mempool try";
     for (const auto& row : OBR::MemPool::SettingTable::all) {
         const unsigned int value = row.In(settings);
-        if (!row.IsFlag()) { line += fmt::format(" {} {}", row.option, value); }
-        if (row.IsFlag() && value != 0) { line += fmt::format(" {}", row.option); }
+        const bool isUsual = value == row.In(OBR::MemPool::PoolSettings());
+        if (isUsual && std::getenv(row.variable) == nullptr) { continue; }
+        line += fmt::format(" {}", row.option);
+        if (!row.IsFlag()) { line += fmt::format(" {}", value); }
+        if (row.IsFlag() && value == 0) { line += "=false"; }
     }
     line += " --";
     for (const std::string& word : command) { line += " " + Quoted(word); }

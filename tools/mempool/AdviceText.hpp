@@ -18,7 +18,8 @@ void PrintTable(std::ostream& out, const Advise::Advice& advice, bool all);
 // Prints the verdict in words, and the lines to paste if pools would help.
 void PrintVerdict(std::ostream& out, const Advise::Advice& advice);
 
-// The command line of `mempool try` with these settings, for a shell.
+// The command line of `mempool try` with these settings, for a shell. It has no option for a
+// setting that would be the same without one.
 std::string TryCommand(const OBR::MemPool::PoolSettings& settings,
                        const std::vector<std::string>& command);
 
