@@ -67,7 +67,7 @@ TEST_F(HeapTest, CountsWhatTheReportCounts) {
     }
 }
 
-TEST_F(HeapTest, TellsWhatItHoldsOfTheHeapBelow) {
+TEST_F(HeapTest, CountsWhatItHoldsOfTheHeapBelow) {
     for (const bool off : {false, true}) {
         Settings::off = off;
         Heap heap;
@@ -199,7 +199,7 @@ TEST_F(HeapTest, RefusesWhatIsTooMuch) {
     }
 }
 
-TEST_F(HeapTest, PassesOverNullAndForeignPointers) {
+TEST_F(HeapTest, IgnoresNullAndForeignPointers) {
     std::uint64_t words[20] = {};
     for (const bool off : {false, true}) {
         Settings::off = off;
@@ -249,7 +249,7 @@ TEST_F(HeapTest, IsRefusedWhereNoPoolCanBeMade) {
     EXPECT_NE(Refusal(nullptr, HeapSettings().MinRecordSize(std::size_t{1} << 32)), "");
 }
 
-TEST_F(HeapTest, HasTheSettingsSaidAndElseThoseOfTheProcess) {
+TEST_F(HeapTest, HasTheGivenSettingsAndElseThoseOfTheProcess) {
     Use(300, 5, 90, 6, true);
     Settings::off = true;
     const auto settings = [](const Heap& heap) {

@@ -163,7 +163,7 @@ TEST(Process, MayForkWithPoolsThatLive) {
                 testing::MatchesRegex("xmpt:c:[^\n]*\nxmpt:a:[^\n]*:10\n" + end + end));
 }
 
-TEST(Process, ABrokenAssumptionIsToldWithItsPlace) {
+TEST(Process, ABrokenAssumptionIsReportedWithItsPlace) {
     ExpectStop(
         "MYASSERT:Host.cpp:   42: no more symbols\n"
         "\tSet your debug breakpoint in ../s/MemPool at line 100.\n",

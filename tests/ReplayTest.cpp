@@ -120,7 +120,7 @@ TEST(Replay, ReportsOnEachTrace) {
     EXPECT_NE(idle.pool, idle.heap) << "A pool is built; the heap has nothing to do.";
 }
 
-TEST(Replay, RefusesACommandLineThatMakesNoSense) {
+TEST(Replay, RefusesAnInvalidCommandLine) {
     EXPECT_EQ(Tool("", 1), "mempool: TRACE is required\nSee 'mempool replay --help'.\n");
     EXPECT_THAT(Tool("--rounds 0 x", 1), HasSubstr("--rounds"));
     for (const char* option : {"--bucket-size 65536", "--max-record 32768", "--min-record 3",
@@ -131,7 +131,7 @@ TEST(Replay, RefusesACommandLineThatMakesNoSense) {
 }
 
 // One step more or less, and the library would stop the process.
-TEST(Replay, RefusesSettingsThatMakeNoPool) {
+TEST(Replay, RefusesSettingsThatNoPoolCanHave) {
     const std::string path = File("one", Lines("@c:P\n"));
     for (const char* options :
          {"--bucket-size 1004", "--alignment 3 --bucket-size 1003", "--min-record 997",
@@ -150,13 +150,13 @@ TEST(Replay, RefusesSettingsThatMakeNoPool) {
                           "not 20\n"));
 }
 
-// The last line that is left may lack digits: it does not count.
-TEST(Replay, GoesAsFarAsATruncatedTraceDoes) {
+// The last line may lack digits, so it does not count.
+TEST(Replay, ReplaysATruncatedTraceUpToItsLastLine) {
     const std::string whole = Bytes(File("stored", Lines("@c:P\n@a:P:X:24\n@a:P:Y:128\n"), "wb0"));
     File("cut", whole.substr(0, whole.find("128\n") + 2));
     const std::string report = Tool("--rounds 1 - <cut", 1);
-    EXPECT_THAT(report, HasSubstr("mempool: standard input: unexpected end of file; read as far as "
-                                  "it goes\n"));
+    EXPECT_THAT(report, HasSubstr("mempool: standard input: unexpected end of file; the events "
+                                  "before that were read\n"));
     EXPECT_THAT(report, HasSubstr("bytes at the peak               24 "));
     EXPECT_THAT(report, HasSubstr("   ns per event"));
 }

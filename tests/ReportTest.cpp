@@ -272,7 +272,7 @@ TEST_F(Report, TakesTheStreamAsItIsWhereItSetsNothing) {
 }
 
 // Only a host that has enabled the stream's exceptions gets those of a failed write.
-TEST_F(Report, TellsOfAFailedWriteWhereTheStreamDoes) {
+TEST_F(Report, ReportsAFailedWriteIfTheStreamDoes) {
     const Mgr pool("failing");
     Output output;
     output.onFlush = [] { throw "no device"; };
@@ -307,18 +307,18 @@ const struct {
     {"nothing", [](Bucket&) {}, ""},
     {"a circle", [](Bucket& bucket) { bucket.RecordAt(34)->Format(18); }, tooLong},
     {"a link to a used record", [](Bucket& bucket) { bucket.RecordAt(34)->Format(2); }, used},
-    {"a link behind the end", [](Bucket& bucket) { bucket.RecordAt(34)->Format(50); }, unknown},
+    {"a link after the end", [](Bucket& bucket) { bucket.RecordAt(34)->Format(50); }, unknown},
     {"a link between records", [](Bucket& bucket) { bucket.RecordAt(34)->Format(19); }, unknown},
-    {"a head behind the end", [](Bucket& bucket) { bucket.freeHead = 65522; }, unknown},
+    {"a head after the end", [](Bucket& bucket) { bucket.freeHead = 65522; }, unknown},
     {"a list cut short", [](Bucket& bucket) { bucket.freeHead = 0; }, ""},
-    {"a head a whole record ahead of them",
+    {"a head a whole record before them",
      [](Bucket& bucket) {
          bucket.size = 47;
          bucket.recSize = 15;
          bucket.freeHead = 1;
      },
      unknown},
-    {"too many free records told", [](Bucket& bucket) { bucket.numFree = 9; }, ""},
+    {"too many free records stated", [](Bucket& bucket) { bucket.numFree = 9; }, ""},
     {"a heap record's type", [](Bucket& bucket) { bucket.RecordAt(34)->type = typeExt; },
      notFree + "EXT\n"},
     {"an unknown type", [](Bucket& bucket) { bucket.RecordAt(18)->type = 7; }, unknown},
@@ -340,8 +340,8 @@ TEST_F(Report, OfADamagedBucketStaysWithinIt) {
         }
         damage(*whole);
         const char* const start = reinterpret_cast<const char*>(whole);
-        const std::size_t told = Bucket::baseDistance + whole->size;
-        const std::vector<char> bytes(start, start + std::max(sizeof(Bucket), told));
+        const std::size_t stated = Bucket::baseDistance + whole->size;
+        const std::vector<char> bytes(start, start + std::max(sizeof(Bucket), stated));
         whole->recSize = 16;
         Bucket::Destroy(whole);
 

@@ -134,7 +134,7 @@ std::string StartUp(const Values& values) {
 }
 
 // At load. The second variable is read only if the first leaves pools off.
-TEST(Settings, TheStartUpFindsTheRegistryReadyAndAsksAsTheReadmeTells) {
+TEST(Settings, TheStartUpFindsTheRegistryReadyAndReadsInTheOrderOfTheReadme) {
     std::vector<std::string> order = Readme().variables;
     EXPECT_EQ(Asked(), order);
     EXPECT_EQ(GetNumMgrs(), 1u);
@@ -209,7 +209,7 @@ TEST(Settings, EachEnvironmentLeavesItsSettings) {
 }
 
 // Standard output works then, although the host does not initialise it.
-TEST(Settings, TheLoadShowsTheBannerAheadOfTheHost) {
+TEST(Settings, TheLoadShowsTheBannerBeforeTheHostStarts) {
     const auto load = [](const Child::Environment& environment) {
         Child::Run(Child::Captured::out, environment, HOST);
     };
@@ -235,7 +235,7 @@ TEST(Settings, RecordSizesThatCannotWorkEndTheLoad) {
                             "\nterminate called after throwing an instance of 'char const*'\n"));
 }
 
-TEST(Settings, AccessorsStoreWhatTheyAreGiven) {
+TEST(Settings, AccessorsStoreAnyValue) {
     NUV_OBR_MEMPOOL_BUCKET_SIZE(4294967295);
     NUV_OBR_MEMPOOL_MAX_RECORD_SIZE(70000);
     NUV_OBR_MEMPOOL_MIN_RECORD_SIZE(80000);

@@ -75,7 +75,7 @@ protected:
     }
 };
 
-TEST_F(WordPools, CountsWordsAndTellsWhatItCannotRead) {
+TEST_F(WordPools, CountsWordsAndSaysWhatItCannotRead) {
     std::string text;
     for (const char* command :
          {"WordPools missing . /proc/self/mem mixed empty",
@@ -93,7 +93,7 @@ TEST_F(WordPools, CountsWordsAndTellsWhatItCannotRead) {
 }
 
 // docs/reading-reports.md shows the report of a text that every Debian has.
-TEST_F(WordPools, ReportsAsMuchAsItIsAskedFor) {
+TEST_F(WordPools, HasTheRequestedDetail) {
     const std::string command = "WordPools /usr/share/common-licenses/BSD ";
     const std::string page = Content(SOURCES "/docs/reading-reports.md");
     const std::size_t start = page.find("\nMemPool::Mgr ");

@@ -39,7 +39,7 @@ TEST(InChild, BringsTheFigureBackAndNothingElse) {
     EXPECT_EQ(number, 0);
 }
 
-TEST(InChild, TellsWhatTheChildDiedOf) {
+TEST(InChild, SaysWhatEndedTheChild) {
     EXPECT_EQ(ProblemOf([]() -> double { throw std::bad_alloc(); }), "out of memory");
     EXPECT_EQ(ProblemOf([]() -> double { throw "up"; }), "ended with status 1");
     EXPECT_EQ(ProblemOf([]() -> double { _exit(7); }), "ended with status 7");
@@ -54,7 +54,7 @@ TEST(InChild, TellsWhatTheChildDiedOf) {
 }
 
 // Blocks of 100 bytes. In buckets of 506 bytes there are 4 of them each.
-TEST(ForkedMeter, ReplaysWithTheSettingsAskedFor) {
+TEST(ForkedMeter, ReplaysWithTheGivenSettings) {
     Replay::Recording recording;
     recording.pools.push_back({"P", ""});
     recording.steps.push_back({Trace::Kind::Created, 0, {}});

@@ -47,7 +47,7 @@ Ended Mempool(const std::string& arguments, const std::string& ahead = "") {
     return {WIFEXITED(status) ? WEXITSTATUS(status) : -1, output, Content(errors)};
 }
 
-TEST(Run, TellsBehindAProgramThatRunsAsEver) {
+TEST(Run, ReportsAfterAProgramThatRunsUnchanged) {
     const std::string page = FolderPath() + "/page.html";
     const Ended sorted =
         Mempool((HAS_PAGE ? "--html " + page : "") + " sort -r", "printf 'a\\nb\\n' |");

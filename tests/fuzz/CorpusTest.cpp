@@ -31,7 +31,7 @@ TEST(Corpus, HasNoFindings) {
     EXPECT_NE(number, 0);
 }
 
-TEST(Corpus, IsNotAllThatHolds) {
+TEST(Corpus, RandomInputsHaveNoFindings) {
     std::mt19937 random(7);
     for (int round = 0; round < 200 && !HasFailure(); ++round) {
         std::vector<char> input(random() % (round % 10 == 0 ? 20000 : 600));

@@ -57,32 +57,32 @@ std::unique_ptr<Trace::EventSource> Reader(std::string_view bytes, std::size_t p
 }
 
 // An event that outlives the next one: the fields of its kind, and its place.
-struct Told {
+struct Line {
     Kind kind;
     std::string line;  // As it is written.
     std::uint64_t position;
 
-    friend bool operator==(const Told& a, const Told& b) {
+    friend bool operator==(const Line& a, const Line& b) {
         return std::tie(a.kind, a.line, a.position) == std::tie(b.kind, b.line, b.position);
     }
 };
 
-std::vector<Told> ReadAll(Trace::EventSource& source) {
-    std::vector<Told> all;
+std::vector<Line> ReadAll(Trace::EventSource& source) {
+    std::vector<Line> all;
     Trace::Event event;
     while (source.Next(event)) {
-        Told told = {event.kind, {}, source.Position()};
-        Trace::AppendLine(told.line, event);
-        EXPECT_EQ(told.line.empty(), event.kind == Kind::Malformed);
-        all.push_back(std::move(told));
+        Line line = {event.kind, {}, source.Position()};
+        Trace::AppendLine(line.line, event);
+        EXPECT_EQ(line.line.empty(), event.kind == Kind::Malformed);
+        all.push_back(std::move(line));
     }
     EXPECT_FALSE(source.Next(event)) << "Nothing follows the end.";
     return all;
 }
 
-std::string LinesOf(const std::vector<Told>& events) {
+std::string LinesOf(const std::vector<Line>& events) {
     std::string lines;
-    for (const Told& event : events) { lines += event.line; }
+    for (const Line& event : events) { lines += event.line; }
     return lines;
 }
 
@@ -149,7 +149,7 @@ private:
     std::size_t most = 0;
 };
 
-void FollowSteps(std::string_view bytes, std::size_t pieceSize, const std::vector<Told>& events) {
+void FollowSteps(std::string_view bytes, std::size_t pieceSize, const std::vector<Line>& events) {
     Trace::StepReader reader(Reader(bytes, pieceSize), "input");
     Follower follower(reader);
     Trace::Step step = {};
@@ -159,7 +159,7 @@ void FollowSteps(std::string_view bytes, std::size_t pieceSize, const std::vecto
         for (; reader.Next(step); ++numSteps) { follower.Follow(step); }
     } catch (const std::runtime_error&) { isTrace = false; }
     follower.End();
-    const auto isNoStep = [](const Told& event) {
+    const auto isNoStep = [](const Line& event) {
         return event.kind == Kind::Info || event.kind == Kind::Time;
     };
     const auto numOthers = std::count_if(events.begin(), events.end(), isNoStep);
@@ -169,10 +169,10 @@ void FollowSteps(std::string_view bytes, std::size_t pieceSize, const std::vecto
 }
 
 // The trace in a file of these bytes.
-std::vector<Told> ReadFile(std::string_view bytes, bool& isWhole) {
+std::vector<Line> ReadFile(std::string_view bytes, bool& isWhole) {
     const int file = memfd_create("trace", MFD_CLOEXEC);
     EXPECT_EQ(write(file, bytes.data(), bytes.size()), static_cast<ssize_t>(bytes.size()));
-    std::vector<Told> events;
+    std::vector<Line> events;
     try {
         const auto source = Trace::OpenTrace("/proc/self/fd/" + std::to_string(file));
         events = ReadAll(*source);
@@ -198,13 +198,13 @@ std::string Compressed(std::string_view bytes) {
 }
 
 // A compressed trace gives the same events, and one that is cut off gives the first of them.
-void ReadCompressed(std::string_view bytes, std::size_t numCut, const std::vector<Told>& events,
+void ReadCompressed(std::string_view bytes, std::size_t numCut, const std::vector<Line>& events,
                     bool isSound) {
     std::string packed = Compressed(bytes);
     numCut %= packed.size();
     packed.resize(packed.size() - numCut);
     bool isWhole = false;
-    std::vector<Told> read = ReadFile(packed, isWhole);
+    std::vector<Line> read = ReadFile(packed, isWhole);
     // The last event can be the reader's own count of what it has read.
     if (numCut != 0 && !read.empty() && read.back().kind == Kind::Info) { read.pop_back(); }
     ASSERT_LE(read.size(), events.size());
@@ -225,16 +225,16 @@ std::string CompactOf(Trace::EventSource& source) {
 
 // The compact form of these events gives them again. If it is cut off, it gives the first of them,
 // and reports that.
-void ReadCompact(const std::string& compact, std::size_t numCut, const std::vector<Told>& events) {
+void ReadCompact(const std::string& compact, std::size_t numCut, const std::vector<Line>& events) {
     numCut %= compact.size();
     const std::string_view bytes(compact.data(), compact.size() - numCut);
     const auto source = Reader(bytes, bytes.size());
-    const std::vector<Told> read = ReadAll(*source);
+    const std::vector<Line> read = ReadAll(*source);
     EXPECT_EQ(source->Problem().empty(), numCut == 0 || bytes.size() < Trace::compactMagic.size());
     auto place = events.begin();
-    for (const Told& one : read) {
+    for (const Line& one : read) {
         place = std::find_if(place, events.end(),
-                             [](const Told& event) { return event.kind != Kind::Malformed; });
+                             [](const Line& event) { return event.kind != Kind::Malformed; });
         ASSERT_NE(place, events.end());
         ASSERT_EQ(one.line, place->line);
         ++place;
@@ -274,7 +274,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     if (isRecords) { bytes = file; }
 
     const auto source = Reader(bytes, pieceSize);
-    const std::vector<Told> events = ReadAll(*source);
+    const std::vector<Line> events = ReadAll(*source);
     EXPECT_EQ(ReadAll(*Reader(bytes, bytes.size() + 1)), events);
 
     const std::string lines = LinesOf(events);

@@ -13,7 +13,7 @@ namespace {
 
 const std::string mempool = MEMPOOL " ";
 
-TEST(CommandLine, IsHelpedWith) {
+TEST(CommandLine, HasHelp) {
     EXPECT_EQ(Shell::Output("for sub in '' run record replay report advise text check help; do " +
                             mempool + "help $sub | grep Usage; done"),
               "Usage: mempool [OPTIONS] SUBCOMMAND\n"
@@ -66,7 +66,7 @@ TEST(CommandLine, SuggestsWhatWasMeant) {
 
 // Of the settings in the environment some subcommands take what their options do not set, and say
 // so. What else is there is the program's alone.
-TEST(CommandLine, TakesFromTheEnvironmentWhatItSays) {
+TEST(CommandLine, TakesOnlyTheNamedSettingsFromTheEnvironment) {
     Shell::WriteFile("trace",
                      "xmpt:c:0000000000000001\nxmpt:a:0000000000000001:0000000000000010:8\n");
     const auto report = [](const std::string& environment, const std::string& options = "",
@@ -87,7 +87,7 @@ TEST(CommandLine, TakesFromTheEnvironmentWhatItSays) {
               "See 'mempool report --help'.\n");
 }
 
-TEST(CommandLine, SaysFirstWhatCannotBeWritten) {
+TEST(CommandLine, ReportsAnUnwritableOutputBeforeTheWork) {
     const std::string lost = "mempool: standard output cannot be written to\n";
     EXPECT_EQ(Shell::Output(mempool + "report /lost >&-", 1), lost);
     EXPECT_EQ(Shell::Output(mempool + "--help >&-", 1), lost);

@@ -126,7 +126,7 @@ TEST(Compact, KnowsWhereAReleasedBlockLies) {
                                         "20:\nxmpt:i:foreign_frees:1\n");
 }
 
-TEST(Compact, IsReadAsFarAsItGoes) {
+TEST(Compact, IsReadUpToTheDamage) {
     std::string file;
     std::size_t sizes[2] = {};  // Of the file up to the end of each of its two chunks.
     {
@@ -174,7 +174,7 @@ std::string HeaderOf(std::size_t packedSize, std::size_t plainSize) {
 
 // Chunks with a correct checksum that no writer writes: entries that make no sense, more pools than
 // have an index, and no entry at all, of which a file could have any number.
-TEST(Compact, RefusesSenselessChunks) {
+TEST(Compact, RefusesInvalidChunks) {
     std::string pools;
     for (std::size_t count = 0; count != Trace::maxPools + 1; ++count) { pools.append("\0\1", 2); }
     const std::string one("\x09\x01", 2);
@@ -215,7 +215,7 @@ TEST(TextCommand, PrintsAnyTrace) {
               "mempool: standard input: 1 malformed lines ignored\n"
               "mempool: standard input: not a trace\n");
     EXPECT_EQ(Shell::Output(command + "cut", 1),
-              "mempool: cut: unexpected end of file; read as far as it goes\n");
+              "mempool: cut: unexpected end of file; the events before that were read\n");
     EXPECT_EQ(Shell::Output(command + "lost", 1), "mempool: lost: No such file or directory\n");
     EXPECT_EQ(Shell::Output(command + "compact >/dev/full", 1),
               "mempool: standard output cannot be written to\n");

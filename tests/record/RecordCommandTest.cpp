@@ -57,7 +57,7 @@ Recorded Record(const std::string& what, const std::string& options = "", int ex
     return ReadTrace("trace");
 }
 
-TEST(Record, TellsTheMallocFamily) {
+TEST(Record, RecordsTheMallocFamily) {
     const Recorded recorded = Record("family");
     EXPECT_EQ(recorded.story.substr(0, recorded.story.find("+70005")),
               "+70000 +70001 -70001 +70007 -70007 +70002 -70002 +70003 -70003 +70004 -70004 +70008 "
@@ -72,7 +72,7 @@ TEST(Record, TellsTheMallocFamily) {
     EXPECT_EQ(recorded.facts.count("allocation_share"), 0U) << "Of few calls it would be a guess.";
 }
 
-TEST(Record, TellsEachBlockOfOperatorNewOnce) {
+TEST(Record, RecordsEachBlockOfOperatorNewOnce) {
     EXPECT_EQ(Record("operators").story,
               "+70000 +70001 -70001 +70002 -70002 +70003 -70003 +70004 -70004 +70016 -70016 "
               "+70016 -70016 ");
@@ -140,7 +140,7 @@ TEST(Record, DiesByTheSignalOfTheProgram) {
     }
 }
 
-TEST(Record, CallsTheGroups) {
+TEST(Record, NamesTheGroups) {
     const auto byCaller = Record("callers", "--by caller").numBlocks;
     ASSERT_EQ(byCaller.size(), 5U);
     for (const char* name :
@@ -189,7 +189,7 @@ TEST(Record, EstimatesTheShareOfTheAllocations) {
     EXPECT_LT(allocate.milliseconds, 60'000U);
 }
 
-TEST(Record, PassesTheProgramOn) {
+TEST(Record, LeavesTheEnvironmentAsItWas) {
     Shell::Output("ln -sf " HOST " Host");
     const std::string record = MEMPOOL " record -o trace ";
     for (const std::string set :

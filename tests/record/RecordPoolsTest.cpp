@@ -13,7 +13,7 @@ std::string Without(const std::string& lines, const char* pattern) {
     return std::regex_replace(lines, std::regex(pattern), "$1");
 }
 
-TEST(RecordPools, TellsWhatTheLibraryTellsAndMore) {
+TEST(RecordPools, RecordsTheTraceOfTheLibraryAndMore) {
     const std::string library =
         Shell::Output("NUV_OBR_MEMPOOL_TRACE=1 " MEMPOOL " record --pools -o trace " HOST, 3);
     const std::string lines = Shell::Output(MEMPOOL " text trace");

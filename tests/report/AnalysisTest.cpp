@@ -235,7 +235,7 @@ TEST(Analysis, AgreesWithPlainFigures) {
 }
 
 // Runs are those of a traced pool, so the moves of each pool of a group are followed separately.
-TEST(Analysis, TellsWhatDiesTogether) {
+TEST(Analysis, CountsWhatDiesTogether) {
     for (const unsigned int seed : {4U, 5U}) {
         const PlainTrace trace = MakeTrace(seed, 4000);
         for (const Report::GroupRow& group : Analyse(trace.lines).groups) {
@@ -373,7 +373,7 @@ TEST(Analysis, KnowsThreadsAndTimes) {
 }
 
 // A single pool for all holds no more than one per group, and the same if there is one group.
-TEST(Analysis, SetsOnePoolBesideThoseOfTheGroups) {
+TEST(Analysis, ComparesOnePoolWithThoseOfTheGroups) {
     const Report::Analysis several = Analyse(MakeTrace(7, 3000).lines);
     EXPECT_LT(several.most.onePool, several.most.pools);
     std::string lines = Lines("@c:P\n");

@@ -68,7 +68,7 @@ void ExpectFile(const std::string& text, const std::string& name) {
     EXPECT_EQ(text, Bytes(path));
 }
 
-TEST(Report, TellsTheFiguresOfASmallTrace) {
+TEST(Report, ShowsTheFiguresOfASmallTrace) {
     std::ofstream(Path("small")) << trace;
     ExpectFile(Tool("small"), "report.txt");
     ExpectFile(Tool("--json small"), "report.json");
@@ -76,7 +76,7 @@ TEST(Report, TellsTheFiguresOfASmallTrace) {
     EXPECT_THAT(Tool("--alignment 16 --json small"), HasSubstr("\"padding\":39,"));
 }
 
-TEST(Report, IsAPageUnlessAllIsAskedFor) {
+TEST(Report, IsAPageUnlessAllIsRequested) {
     std::ofstream file(Path("many"));
     const std::string longName = "<list<int>>" + std::string(80, 'n') + "-the-end";
     for (int group = 100; group < 150; ++group) {
@@ -147,7 +147,7 @@ TEST(Report, WritesAPage) {
     }
 }
 
-TEST(Report, TellsWhatIsWrongWithATrace) {
+TEST(Report, SaysWhatIsWrongWithATrace) {
     std::ofstream(Path("other")) << "nothing of the kind\n";
     EXPECT_EQ(Tool("other", 1), "mempool: other: not a trace\n");
     EXPECT_EQ(Tool("/dev/null", 1), "mempool: /dev/null: not a trace\n");
@@ -160,8 +160,9 @@ TEST(Report, TellsWhatIsWrongWithATrace) {
     const std::string cutCommand =
         "$(gzip <small >whole.gz; head -c 200 whole.gz >cut.gz; echo cut.gz)";
     const std::string broken = Tool(cutCommand, 1);
-    EXPECT_THAT(broken,
-                HasSubstr("mempool: cut.gz: unexpected end of file; read as far as it goes\n"));
+    EXPECT_THAT(
+        broken,
+        HasSubstr("mempool: cut.gz: unexpected end of file; the events before that were read\n"));
     EXPECT_THAT(broken, HasSubstr("   blocks                "));
     EXPECT_THAT(Tool("--json cut.gz", 1),
                 HasSubstr("\"warning\":\"cut.gz: unexpected end of file"));

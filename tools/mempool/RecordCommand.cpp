@@ -40,8 +40,8 @@ itself is not recorded.
 --stacks      A group is a call stack: the innermost 32 frames, or DEPTH frames, at most 64. A stack
               ends at a function whose stack frame varies in size.
 --by module   The program's file and each of its shared libraries are a group.
---pools       Records the pools of libObrMemPool instead of the heap, whether they are on or off,
-              including Mgr::Clear. The program must use the shared library.
+--pools       Records the pools of libObrMemPool instead of the heap, enabled or not, including
+              Mgr::Clear. The program must use the shared library.
 
 Facts in the trace, which 'mempool text' prints: program, by, cpu_seconds (without the recorder's own
 part), allocation_share (the share of that time that allocation calls take, estimated from samples),

@@ -110,7 +110,7 @@ void PrintTotals(std::ostream& out, const Analysis& analysis) {
                               Percent(total.padding, total.inRecords.bytes)));
     totals.AddRow(
         "die together",
-        fmt::format("{} of the blocks; one Clear would do for {} (runs: {})",
+        fmt::format("{} of the blocks; a Clear could replace the frees of {} (runs: {})",
                     Percent(analysis.runs.together, blocks),
                     Percent(analysis.runs.clearable, blocks), Count(analysis.runs.numClears)));
     totals.AddRow("peak", fmt::format("{} in {} blocks, at event {}", Bytes(analysis.peak.asked),

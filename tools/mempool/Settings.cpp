@@ -47,7 +47,9 @@ void TakeEnvironment(const CLI::App& subcommand, OBR::MemPool::PoolSettings& set
 }
 
 void AddLayer(CLI::App& subcommand, Replay::Layer& layer) {
-    subcommand.add_option("--layer", layer, "What serves the blocks instead of malloc")
+    subcommand
+        .add_option("--layer", layer,
+                    "What serves the blocks instead of malloc: heap, malloc or mgr")
         ->type_name("LAYER")
         ->transform(CLI::Transformer(layers))
         ->default_str(NameOf(layer));

@@ -55,8 +55,7 @@ int PrintTrace(const std::string& path) {
     if (numMalformed != 0) {
         std::cerr << "mempool: " << name << ": " << numMalformed << " malformed lines ignored\n";
     }
-    std::string problem = source->Problem();
-    if (!problem.empty()) { problem += "; read as far as it goes"; }
+    std::string problem = source->Warning();
     if (numEvents == 0 && problem.empty()) { problem = "not a trace"; }
     if (problem.empty()) { return EXIT_SUCCESS; }
     std::cerr << "mempool: " << name << ": " << problem << '\n';

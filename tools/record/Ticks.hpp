@@ -30,7 +30,7 @@ inline std::uint64_t Ticks() {
 }
 
 // The time at which the code before this call is done. Without the barrier, a processor may read
-// the counter before a short call ahead of it has returned.
+// the counter before the short call that precedes it has returned.
 inline std::uint64_t TicksWhenDone() {
 #if defined(__x86_64__)
     _mm_lfence();

@@ -53,6 +53,12 @@ public:
 
     // After the end: why the trace is not complete, or empty if it is.
     virtual std::string Problem() const = 0;
+
+    // The same as a message for the user.
+    std::string Warning() const {
+        const std::string problem = Problem();
+        return problem.empty() ? "" : problem + "; the events before that were read";
+    }
 };
 
 }  // namespace Trace

@@ -42,8 +42,8 @@ bool StepReader::Next(Step& step) {
 }
 
 std::string StepReader::Warning() const {
-    const std::string problem = source->Problem();
-    return problem.empty() ? "" : name + ": " + problem + "; read as far as it goes";
+    const std::string warning = source->Warning();
+    return warning.empty() ? "" : name + ": " + warning;
 }
 
 void StepReader::AddBadLine(Fault fault) {
