@@ -99,19 +99,21 @@ void AddRecordOptions(CLI::App& subcommand, Recorder::Order& order) {
 
 Recorder::Outcome RecordAsOrdered(const Recorder::Order& order) {
     Recorder::Outcome outcome = Recorder::RecordProgram(order);
+    const auto warn = [&](const char* what) {
+        std::cerr << "mempool: " << order.command.front() << ' ' << what << '\n';
+    };
     if (order.pools && outcome.numEvents == 0) {
-        std::cerr << "mempool: " << order.command.front()
-                  << " has made no pool of the shared library, libObrMemPool.so\n";
+        warn("has made no pool of the shared library, libObrMemPool.so");
     }
     if (outcome.isCutByExec) {
-        std::cerr << "mempool: " << order.command.front()
-                  << " has become a program that cannot be recorded: it is statically linked, or "
-                     "runs with other rights\n";
+        warn(
+            "has become a program that cannot be recorded: it is statically linked, or runs with "
+            "other rights");
     }
     if (outcome.isAddressSanitized) {
-        std::cerr << "mempool: " << order.command.front()
-                  << " is built with AddressSanitizer, which slows its allocations and delays its "
-                     "frees: record another build\n";
+        warn(
+            "is built with AddressSanitizer, which slows its allocations and delays its frees: "
+            "record another build");
     }
     return outcome;
 }

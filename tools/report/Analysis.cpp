@@ -166,7 +166,7 @@ private:
         const Alive& was = alive[block.index];
         onePool.Free(0, was.placeInOne, block.size);
         heapBytes -= MallocBytes(block.size);
-        rows[rowOf[pool]].runs.Release(1);
+        rows[rowOf[pool]].runs.Release();
         const std::size_t bin = LifetimeBin(result.events - was.since);
         for (Tally* const tally : Tallies(pool, block.size)) {
             tally->Change(result.events, result.peak.event);

@@ -24,7 +24,7 @@ constexpr std::size_t LengthBin(std::uint64_t numBlocks) {
 
 class Runs {
 public:
-    void Release(std::uint64_t numBlocks) { current += numBlocks; }
+    void Release() { ++current; }
 
     // Called at the next allocation and at the end, with the number of live blocks of the group.
     void End(std::uint64_t numLive) {

@@ -4,6 +4,7 @@
 #ifndef OBR_TOOLS_REPORT_TIMELINE_HPP
 #define OBR_TOOLS_REPORT_TIMELINE_HPP
 
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <optional>
@@ -49,7 +50,19 @@ public:
     const std::vector<Point>& Points() const { return points; }
 
 private:
-    void EndInterval();
+    // Joins the points in pairs when there are too many.
+    void EndInterval() {
+        filled = 0;
+        if (points.size() < maxPoints) { return; }
+        for (std::size_t i = 0; i < maxPoints / 2; ++i) {
+            const Point& a = points[2 * i];
+            const Point& b = points[2 * i + 1];
+            points[i] = {b.most.asked > a.most.asked ? b.most : a.most,
+                         std::min(a.leastAsked, b.leastAsked)};
+        }
+        points.resize(maxPoints / 2);
+        interval *= 2;
+    }
 
     std::vector<Point> points;
     std::uint64_t interval = 1;  // Events per point.
