@@ -81,7 +81,7 @@ TEST_F(HeapTest, CountsWhatItHoldsOfTheHeapBelow) {
     }
 }
 
-// What GetStats knows of a pool's memory is what that memory is.
+// The offsets by which GetStats reads a pool are those of the library.
 TEST_F(HeapTest, KnowsTheMemoryOfAPool) {
     using namespace detail;
     Mgr mgr;

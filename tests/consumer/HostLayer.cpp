@@ -1,4 +1,4 @@
-// A host layer that has the pools on, whatever the environment says.
+// A host layer that enables the pools, whatever the environment says.
 
 #include <cstring>
 

@@ -1,5 +1,5 @@
-// A host that leaves it to its environment to switch the pools on, and that has a static pool here
-// and in another file. Which of the two is constructed first depends on the order of linking.
+// A host that lets the environment enable the pools, and that has a static pool here and in another
+// file. Which of the two is constructed first depends on the order of linking.
 
 #include <MemPool>
 #include <cstring>
@@ -9,7 +9,7 @@ using OBR::MemPool::Mgr;
 extern Mgr otherPool;
 extern char* const otherBlock;
 
-// Ahead of all statics that name no priority.
+// Before all statics without a priority.
 __attribute__((init_priority(102))) static Mgr early("ahead");
 
 static Mgr pool("consumer");
