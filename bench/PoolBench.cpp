@@ -21,6 +21,7 @@
 #include <chrono>
 #include <cstdint>
 #include <cstdlib>
+#include <cstring>
 #include <functional>
 #include <iostream>
 #include <list>
@@ -83,6 +84,7 @@ struct Layer {
     OBR::MemPool::Resource memory{heap};
     void* Alloc(unsigned size) { return heap.Allocate(size); }
     void Free(void* block, unsigned size) { heap.Deallocate(block, size); }
+    void* Realloc(void* block, std::size_t size) { return heap.Realloc(block, size); }
     void DropAll(const Blocks&) { heap.FreeAll(); }
     std::size_t GetSize(void* block) { return heap.UsableSize(block); }
 };
@@ -91,6 +93,7 @@ struct Heap {
     std::pmr::memory_resource& memory = *std::pmr::new_delete_resource();
     void* Alloc(unsigned size) { return std::malloc(size); }
     void Free(void* block, unsigned) { std::free(block); }
+    void* Realloc(void* block, std::size_t size) { return std::realloc(block, size); }
     void DropAll(const Blocks& blocks) { std::for_each(blocks.begin(), blocks.end(), std::free); }
     std::size_t GetSize(void* block) { return malloc_usable_size(block); }
 };
@@ -274,6 +277,22 @@ void AskSizes(benchmark::State& state, std::size_t number) {
     SetOperations(state, number);
 }
 
+// A text that is read piece by piece.
+template <typename Subject>
+void Grow(benchmark::State& state, std::size_t step) {
+    constexpr std::size_t end = 1 << 20;
+    Subject subject;
+    for (auto _ : state) {
+        char* text = nullptr;
+        for (std::size_t size = step; size <= end; size += step) {
+            text = static_cast<char*>(subject.Realloc(text, size));
+            std::memset(text + size - step, 1, step);
+        }
+        subject.Free(text, end);
+    }
+    SetOperations(state, end / step);
+}
+
 void AskContains(benchmark::State& state) {
     Pool pool;
     void* const block = pool.Alloc(32);
@@ -433,6 +452,14 @@ void RegisterSizeRows() {
 }
 
 template <typename Subject>
+void RegisterGrowthRows() {
+    for (const std::size_t step : {16U, 64U, 1000U}) {
+        Register("grow to 1 MB in steps of " + std::to_string(step),
+                 [=](auto& s) { Grow<Subject>(s, step); });
+    }
+}
+
+template <typename Subject>
 void RegisterContainerRows() {
     Register("tree of 262k nodes, dropped whole", Tree<Subject>);
     Register("list of 100k, built and cleared", List<Subject>);
@@ -464,11 +491,13 @@ bool RegisterRows(const std::string& subject) {
         RegisterMixedRows<Layer>();
         RegisterSizeRows<Layer>();
         RegisterContainerRows<Layer>();
+        RegisterGrowthRows<Layer>();
     } else if (subject == "heap") {
         RegisterOneSizeRows<Heap>();
         RegisterMixedRows<Heap>();
         RegisterSizeRows<Heap>();
         RegisterContainerRows<Heap>();
+        RegisterGrowthRows<Heap>();
 #ifdef HAS_BOOST
     } else if (subject == "boost") {
         RegisterOneSizeRows<Boost>();

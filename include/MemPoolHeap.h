@@ -80,8 +80,8 @@ OBR_HEAP_API void obr_heap_delete(obr_heap* heap);
 // As the functions of C with these names. Blocks are aligned as the settings say. A size of 0 gives
 // a distinct block. The largest size is 1073733632. The alignment of obr_heap_aligned_alloc is a
 // power of two up to 4096; obr_heap_realloc keeps it. obr_heap_realloc leaves a block in its place
-// if it has room and at least half of that is used; it frees a block if the size is 0, and returns
-// null; and it fails for a foreign pointer.
+// if it has room and does not shrink to less than half; it frees a block if the size is 0, and
+// returns null; and it fails for a foreign pointer.
 OBR_HEAP_API void* obr_heap_malloc(obr_heap* heap, size_t size);
 OBR_HEAP_API void* obr_heap_calloc(obr_heap* heap, size_t count, size_t size);
 OBR_HEAP_API void* obr_heap_realloc(obr_heap* heap, void* block, size_t size);

@@ -21,6 +21,7 @@ PEERS = MALLOCS + ["boost", "pmr"]
 TRACES = ["trace lua", "trace jq", "trace sqlite"]
 TREE_ROW = "tree of 262k nodes, dropped whole"
 NODE_ROWS = ["list of 100k, built and cleared", "map, 10k live, insert or erase"]
+GROWTH_ROWS = [f"grow to 1 MB in steps of {step}" for step in (16, 64, 1000)]
 IN_GROWTH = ["pool-64k", "glibc", "mimalloc", "jemalloc", "pmr"]
 IN_PICTURE = ["mimalloc", "jemalloc", "tcmalloc", "pmr"]
 MEMORIES = {"malloc": "malloc", "mimalloc": "mimalloc", "Heap": "`Heap`",
@@ -171,6 +172,7 @@ def goals(measured, rows, resident, hosts):
         ("tree of nodes, dropped whole / glibc", 0.45, measured.ratio(TREE_ROW, "glibc", "layer")),
         ("worst node container on Resource / pmr", 0.9, measured.worst(NODE_ROWS, "pmr", "layer")),
         ("the same / bare Mgr", 1.1, measured.worst(NODE_ROWS, "pool-64k", "layer")),
+        ("worst growth in small steps / glibc", 3.0, measured.worst(GROWTH_ROWS, "glibc", "layer")),
         ("hosts on a Heap, time / mimalloc", 1.0,
          hosts.seconds.mean(hosts.plain, "mimalloc", "Heap")),
         ("hosts on a Heap, peak memory / malloc", 0.95,
@@ -268,7 +270,7 @@ def main():
     resident = {subject: {size: both[0] for size, both in sizes.items()}
                 for subject, sizes in figures.items()}
     held = {size: both[1] for size, both in figures["pool"].items()}
-    rows = list(results["rows"]["pool-64k"])
+    rows = list({**results["rows"]["pool-64k"], **results["rows"]["layer"]})
     peers = [peer for peer in PEERS if peer in measured.times]
     timed = [row for row in rows if measured.ratio(row, "glibc") or measured.ratio(row, "pmr")]
     compared = [peer for peer in ("glibc", "mimalloc", "pmr") if peer in peers]

@@ -87,7 +87,7 @@ class Runner:
         for turn in range(self.rounds):
             step(f"Rows, round {turn + 1} of {self.rounds}")
             order = list(times)[turn:] + list(times)[:turn]  # Each round begins with another.
-            for row in rows["pool-64k"]:
+            for row in dict.fromkeys(rows["pool-64k"] + rows["layer"]):
                 # The rows about growth are long and run once.
                 if re.match("live|drop", row) and (turn > 0 or self.quick and "0000000/" in row):
                     continue

@@ -165,6 +165,44 @@ TEST_F(HeapTest, HoldsNoMoreThanItsLimit) {
     }
 }
 
+// A block that grows in small steps moves seldom, also where a limit leaves little room. If it
+// shrinks to less than half, the rest is given back, or it stays where it is.
+TEST_F(HeapTest, GrowsInPlaceAndGivesBackWhatIsLeft) {
+    constexpr std::size_t most = 3000000;
+    for (const auto& [on, alignment, limit] :
+         {std::tuple(true, 8u, SIZE_MAX), std::tuple(true, 64u, SIZE_MAX),
+          std::tuple(true, 8u, most * 9 / 4), std::tuple(false, 8u, SIZE_MAX)}) {
+        Heap heap(nullptr, HeapSettings().On(on).Limit(limit));
+        auto* block = static_cast<char*>(heap.Malloc(1, alignment));
+        int moves = 0;
+        for (std::size_t size = 1; size < most; size += 1 + size / 100) {
+            auto* const moved = static_cast<char*>(heap.Realloc(block, size));
+            ASSERT_NE(moved, nullptr);
+            moves += moved == block ? 0 : 1;
+            block = moved;
+            ASSERT_GE(heap.UsableSize(block), size);
+            std::memset(block + size / 2, static_cast<int>(size), size - size / 2);
+            ASSERT_EQ(reinterpret_cast<std::uintptr_t>(block) % alignment, 0);
+        }
+        EXPECT_LT(moves, 60);
+        for (std::size_t size = most; size > 100; size = size * 2 / 5) {
+            block[0] = 'a';
+            block[size / 2] = 'b';
+            block = static_cast<char*>(heap.Realloc(block, size));
+            EXPECT_EQ(block[0], 'a');
+            EXPECT_EQ(block[size / 2], 'b');
+            EXPECT_LT(heap.GetStats().bytesHeld, size == most ? 4 * most : size * 9 / 8 + 4500);
+        }
+        HeapSpy::refuseIn = 1;
+        HeapSpy::refusesForGood = true;
+        EXPECT_EQ(heap.Realloc(block, 20), block);
+        HeapSpy::refuseIn = 0;
+        HeapSpy::refusesForGood = false;
+        EXPECT_TRUE(heap.Free(block));
+        EXPECT_EQ(heap.GetStats().bytesHeld, 0);
+    }
+}
+
 // If the heap gave memory back to the system, malloc's would end lower.
 TEST_F(HeapTest, KeepsMemoryForTheNextBlocks) {
     Heap heap;

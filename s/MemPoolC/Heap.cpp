@@ -14,6 +14,7 @@
 #include <sstream>
 #include <stdexcept>
 #include <string>
+#include <string_view>
 
 using OBR::MemPool::Heap;
 using OBR::MemPool::HeapSettings;
@@ -104,7 +105,10 @@ obr_heap* obr_heap_new(const char* name, const obr_heap_settings* settings) {
     try {
         return new obr_heap{Heap(name, SettingsFrom(settings))};
     } catch (const std::bad_alloc&) { SetError(exhausted); } catch (const std::exception& error) {
-        SetError(error.what());
+        const std::string_view prefix = OBR::MemPool::detail::refusalPrefix;  // Of C++ only.
+        const char* const reason = error.what();
+        const bool hasPrefix = std::string_view(reason).substr(0, prefix.size()) == prefix;
+        SetError(reason + (hasPrefix ? prefix.size() : 0));
     }
     return nullptr;
 }

@@ -119,7 +119,12 @@ void World::Build(HeapPlace& place) {
     const bool hasSecond = (said & 1) == 0 && sizes.bucket == PoolSettings().bucketSize;
     place.canFail = !hasSecond && sizes.bucket < detail::largeBucketSize;
     place.account = &accounts.Open(place.heap->GetMgr(), true);
-    EXPECT_EQ(place.account->pool->enabled, isOn);
+    const BucketMgr& pool = *place.account->pool;
+    EXPECT_EQ(pool.enabled, isOn);
+    EXPECT_EQ(pool.bucketSize, std::min(sizes.bucket, 65535u));
+    EXPECT_EQ(pool.dataAlignment, sizes.alignment);
+    EXPECT_EQ(pool.keepEmptyBuckets,
+              (said & 32) != 0 ? (said & 64) != 0 : NUV_OBR_MEMPOOL_KEEP_EMPTY_BUCKETS());
 }
 
 void World::Destroy(HeapPlace& place) {
@@ -200,8 +205,8 @@ void World::Take(HeapPlace& place) {
                               MostFor(size, alignment)});
 }
 
-// A block stays in place if it has room and uses half of it. It keeps bytes and alignment in any
-// case, and fewer bytes are always granted.
+// A block stays in place if it has room and does not shrink to less than half. It keeps bytes and
+// alignment in any case, and fewer bytes are always granted.
 void World::Resize(HeapPlace& place) {
     Account& account = *place.account;
     const auto one = OneBlock(account);
@@ -211,9 +216,12 @@ void World::Resize(HeapPlace& place) {
     const std::size_t size = std::max(Size(account), 1u);
     const bool enabled = account.pool->enabled;
     const bool grows = size > block.capacity;
-    const bool isMuchLess = size < block.capacity / 2 && block.capacity > 64;
-    const std::size_t withRoom = block.capacity + block.capacity / 4 * 3;
-    const bool getsRoom = grows && block.capacity >= 1024 && size < withRoom;
+    const std::size_t before = enabled ? block.capacity : block.usable;
+    const bool isMuchLess = (size < before / 2 || size < block.capacity / 8) && block.capacity > 64;
+    const std::size_t quarters = size - block.capacity > block.capacity / 4 * 3 ? 0
+                                 : block.capacity < 1024                        ? 1
+                                                                                : 3;
+    const std::size_t withRoom = block.capacity + block.capacity / 4 * quarters;
     std::uint8_t* moved = nullptr;
     bool isRefused = false;
     account.ExpectFilled(one);
@@ -234,7 +242,8 @@ void World::Resize(HeapPlace& place) {
     EXPECT_EQ(std::count(moved, moved + kept, block.fill), static_cast<long>(kept));
     EXPECT_EQ(moved == data, !grows && (!isMuchLess || isRefused));
     if (moved != data) {
-        block.capacity = getsRoom && !isRefused ? withRoom : size;
+        const bool getsRoom = grows && !isRefused && withRoom > size;
+        block.capacity = getsRoom ? withRoom : size;
         block.most = MostFor(block.capacity, std::max<std::size_t>(AlignmentAt(data), 8));
     }
     block.size = size;
