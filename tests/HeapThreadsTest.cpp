@@ -16,10 +16,13 @@ TEST(HeapThreads, HaveHeapsOfTheirOwn) {
             const std::size_t size = 8 * (1 + thread % 2 * 50 + round % 10);
             const std::string name = std::to_string(thread) + " " + std::to_string(round);
             Heap named(name.c_str(), HeapSettings().On(true).MinRecordSize(size + 8));
-            Heap unnamed(nullptr, HeapSettings().On(thread % 3 != 0));
+            const bool isOn = thread % 3 != 0;
+            Heap unnamed(nullptr, HeapSettings().On(isOn));
             ASSERT_EQ(named.UsableSize(named.Malloc(1)), size);
-            ASSERT_EQ(unnamed.GetMgr().IsEnabled(), thread % 3 != 0);
-            for (std::size_t i = 0; i < 100; ++i) { unnamed.Malloc(i); }
+            ASSERT_EQ(unnamed.GetMgr().IsEnabled(), isOn);
+            // More than 16 buckets of one class, so that the heap builds its second pool.
+            for (std::size_t i = 0; i < 3000; ++i) { unnamed.Malloc(40); }
+            ASSERT_EQ(unnamed.GetStats().buckets, isOn ? 19 : 0);
         }
     };
     std::vector<std::thread> threads;
