@@ -56,6 +56,13 @@ foreach(component IN LISTS CPACK_COMPONENTS_ALL)
             PATTERN *.md PATTERN *.svg PATTERN *.png
             PATTERN man EXCLUDE PATTERN reference.md EXCLUDE)
     endif()
+    if(component STREQUAL "dev")  # What the pages link to besides.
+        file(COPY ${sources}/examples ${sources}/CHANGELOG.md DESTINATION ${doc})
+        file(COPY ${sources}/s/README.md DESTINATION ${doc}/s)
+        file(COPY ${sources}/s/MemPool/Record.hpp DESTINATION ${doc}/s/MemPool)
+        file(COPY ${sources}/tools/README.md DESTINATION ${doc}/tools)
+        file(CREATE_LINK ../../../include ${doc}/include SYMBOLIC)
+    endif()
     set(overrides ${CMAKE_CURRENT_LIST_DIR}/lintian/${package})
     if(EXISTS ${overrides})
         file(COPY ${overrides} DESTINATION ${root}/usr/share/lintian/overrides)
