@@ -7,6 +7,7 @@
 
 #include <dlfcn.h>
 #include <fnmatch.h>
+#include <link.h>
 #include <sys/auxv.h>
 #include <unistd.h>
 #include <unwind.h>
@@ -61,36 +62,50 @@ _Unwind_Reason_Code AddFrame(_Unwind_Context* context, void* toFrames) {
     return _URC_NO_REASON;
 }
 
-// Whether a function passes memory on, by its name or by a pattern of the user.
-bool IsWrapper(const Channel& channel, const char* function) {
-    if (Trace::PassesOn(function)) { return true; }
+// Whether a function passes memory on, by its exported name or by a pattern of the user. Finding
+// the name takes long.
+bool IsWrapper(const Channel& channel, std::uint64_t returnAddress) {
+    Dl_info info = {};
+    if (dladdr(Pointer(returnAddress - 1), &info) == 0 || info.dli_sname == nullptr) {
+        return false;
+    }
+    if (Trace::PassesOn(info.dli_sname)) { return true; }
     const char* pattern = channel.skipped;
-    while (*pattern != '\0' && fnmatch(pattern, function, 0) != 0) {
+    while (*pattern != '\0' && fnmatch(pattern, info.dli_sname, 0) != 0) {
         pattern += std::strlen(pattern) + 1;
     }
     return *pattern != '\0';
 }
 
-// The path of a file. For the program itself the loader only knows the name by which it was
-// started.
-void FindPath(const Dl_info& info, char* path, std::size_t size) {
-    Dl_info program = {};
-    const std::uint64_t entry = getauxval(AT_ENTRY);
-    const bool isProgram =
-        dladdr(Pointer(entry), &program) != 0 && program.dli_fbase == info.dli_fbase;
+// The file that was loaded around an address. Finding it takes neither a lock nor a symbol.
+struct Loaded {
+    explicit Loaded(const void* address) {
+        dl_find_object found = {};
+        if (_dl_find_object(const_cast<void*>(address), &found) == 0) {
+            base = found.dlfo_map_start;
+            name = found.dlfo_link_map->l_name;
+        }
+    }
+
+    const void* base = nullptr;  // Null if there is none.
+    const char* name = "";       // Empty for the program itself.
+};
+
+void FindPath(const Loaded& loaded, char* path, std::size_t size) {
+    const bool isProgram = loaded.base == Loaded(Pointer(getauxval(AT_ENTRY))).base;
     const ssize_t found = isProgram ? readlink("/proc/self/exe", path, size - 1) : -1;
     if (found >= 0) {
         path[found] = '\0';
     } else {
-        std::strncpy(path, info.dli_fname, size - 1);
+        std::strncpy(path, loaded.name, size - 1);
         path[size - 1] = '\0';
     }
 }
 
-std::uint32_t FindModule(Channel& channel, const Dl_info& info) {
+std::uint32_t FindModule(Channel& channel, const Loaded& loaded) {
     char path[sizeof(Module::path)];
-    FindPath(info, path, sizeof(path));
-    const auto base = reinterpret_cast<std::uint64_t>(info.dli_fbase);
+    FindPath(loaded, path, sizeof(path));
+    const auto base = reinterpret_cast<std::uint64_t>(loaded.base);
     // A signal handler that has interrupted the holder of the lock gives up.
     for (int tries = 0; channel.modulesLock.exchange(1) != 0; ++tries) {
         if (tries == 1000000) { return 0; }
@@ -132,14 +147,11 @@ bool Enter(Channel& channel, const Frame& frame, std::uint64_t frameSize) {
         return false;
     }
     if (state != Caller::Unknown) { return state == Caller::Passed; }
-    Dl_info info = {};
-    const bool isKnown = dladdr(Pointer(frame.address - 1), &info) != 0;
-    caller.module = isKnown ? FindModule(channel, info) : 0;
-    const bool isWrapper =
-        channel.by == By::Caller && info.dli_sname != nullptr && IsWrapper(channel, info.dli_sname);
+    const Loaded loaded(Pointer(frame.address - 1));
+    caller.module = loaded.base != nullptr ? FindModule(channel, loaded) : 0;
     const bool isPassed =
-        frameSize != 0 &&
-        (channel.by == By::Stack || (isKnown && (isWrapper || Trace::IsRuntime(info.dli_fname))));
+        frameSize != 0 && (channel.by == By::Stack || Trace::IsRuntime(loaded.name) ||
+                           (channel.by == By::Caller && IsWrapper(channel, frame.address)));
     caller.frameSize = frameSize;
     caller.state.store(isPassed ? Caller::Passed : Caller::Final, std::memory_order_release);
     return isPassed;
