@@ -4,7 +4,7 @@
 
 cmake_minimum_required(VERSION 3.25)
 
-foreach(package CLI11 ZLIB GTest benchmark Boost Lua SQLite3 LibXml2 Duktape Mruby mimalloc nlohmann_json fmt D3 zstd LibDw)
+foreach(package CLI11 ZLIB GTest benchmark Boost Lua SQLite3 LibXml2 Duktape Mruby mimalloc nlohmann_json fmt D3 zstd LibDw LibIberty)
     list(APPEND hidden -DCMAKE_DISABLE_FIND_PACKAGE_${package}=ON)
 endforeach()
 set(options OBR_MEMPOOL_EXAMPLES OBR_MEMPOOL_TOOLS OBR_MEMPOOL_TESTS OBR_MEMPOOL_BENCH)

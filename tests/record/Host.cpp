@@ -215,6 +215,24 @@ __attribute__((noinline)) void ThirdCaller() {
 __attribute__((noinline)) void FourthCaller(std::size_t size) {
     Keep(alloca(size));
     FirstCaller();
+// Names as in Rust. Two of them are the same without their arguments.
+__attribute__((noinline)) void Node() __asm__("_RNvNtC4demo5parse4node");
+__attribute__((noinline)) void GrowBytes() __asm__("_RINvC4demo4growhE");
+__attribute__((noinline)) void GrowWords() __asm__("_RINvC4demo4growmE");
+__attribute__((noinline)) void Step() __asm__("_RNvXC4demoNtB2_4TreeNtB2_4Walk4step");
+void Node() {
+    Keep(std::malloc(70001));
+}
+void GrowBytes() {
+    Keep(std::malloc(70002));
+}
+void GrowWords() {
+    Keep(std::malloc(70003));
+}
+void Step() {
+    Keep(std::malloc(70004));
+}
+
 }
 
 int main(int argc, char** argv) {
@@ -252,3 +270,9 @@ int main(int argc, char** argv) {
     }
     return 0;
 }
+    if (what == "names") {
+        Node();
+        GrowBytes();
+        GrowWords();
+        Step();
+    }

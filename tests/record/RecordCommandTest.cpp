@@ -218,6 +218,15 @@ TEST(Record, WaitsForRoom) {
                             "kill -KILL $!; until grep done out; do sleep 0.01; done"),
               "done\n");
 }
+TEST(Record, NamesFunctionsOfRust) {
+    const auto names = Record("names", "--by caller").numBlocks;
+    for (const char* name :
+         {"demo::parse::node", "demo::grow", "demo::grow#2", "<demo::Tree as demo::Walk>::step"}) {
+        EXPECT_THAT(
+            names, testing::Contains(testing::Key(testing::StartsWith(std::string(name) + "+0x"))));
+    }
+}
+
 
 TEST(Record, PassesAnInterruptOnOnce) {
     Shell::Output("ln -sf " HOST " Host");

@@ -7,6 +7,7 @@
 #include <memory>
 #include <string>
 #include <unordered_map>
+#include <vector>
 
 #include "record/Channel.hpp"
 
@@ -20,15 +21,27 @@ std::string NameOf(const Module& module);
 class Symbols {
 public:
     // "function+0x1f (file)" for a return address, "function+0x1f (file, source.c:12)" where there
-    // is debug information, or "file+0x1234" where the function has no name.
+    // is debug information, or "file+0x1234" where the function has no name. Names are without
+    // template arguments; further functions with the same name are "function#2" and so on.
     std::string Name(const Module& module, std::uint64_t address);
 
 private:
-    using File = std::unique_ptr<Dwfl, void (*)(Dwfl*)>;
+    struct Function {
+        std::uint64_t start;
+        std::uint64_t size;  // 0 if it is unknown.
+        int rank;            // Of functions at the same address, the one with the highest counts.
+        const char* name;
+    };
+    struct File {
+        std::unique_ptr<Dwfl, void (*)(Dwfl*)> handle;
+        std::vector<Function> functions;  // By address.
+    };
 
-    Dwfl* Open(const Module& module);
+    const File& Open(const Module& module);
+    std::string Distinct(const std::string& shortened, const std::string& symbol);
 
     std::unordered_map<const Module*, File> files;
+    std::unordered_map<std::string, std::vector<std::string>> symbolsOf;  // By shortened names.
 };
 
 }  // namespace Recorder

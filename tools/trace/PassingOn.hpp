@@ -27,7 +27,7 @@ inline bool IsRuntime(const char* path) {
 // one of the C++ or Rust library.
 inline bool PassesOn(const char* function) {
     for (const char* start : {"_Zn", "_ZSt", "_ZNSt", "_ZNKSt", "_ZN9__gnu_cxx", "operator new",
-                              "std::", "__gnu_cxx::", "alloc::", "core::"}) {
+                              "std::", "__gnu_cxx::", "alloc::", "core::", "<alloc::", "<core::"}) {
         if (std::strncmp(function, start, std::strlen(start)) == 0) { return true; }
     }
     for (const char* part : {"malloc", "calloc", "realloc", "memalign", "strdup", "strndup"}) {
