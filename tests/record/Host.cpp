@@ -133,6 +133,18 @@ void Exec(const char* self) {
     execl(self, self, "callers", nullptr);
 }
 
+// Becomes itself so many times, while other threads allocate.
+void Execs(const char* self, int number) {
+    if (number == 0) { return; }
+    for (int index = 0; index != 3; ++index) {
+        std::thread([] {
+            while (true) { Use(16); }
+        }).detach();
+    }
+    usleep(2000);
+    execl(self, self, "execs", std::to_string(number - 1).c_str(), nullptr);
+}
+
 void Load() {
     void* const library = dlopen("libz.so.1", RTLD_NOW);
     if (library == nullptr) { std::abort(); }
@@ -203,18 +215,6 @@ void SecondCaller() {
     Keep(strdup(text.c_str()));
 }
 
-// A function that passes memory on.
-extern "C" __attribute__((noinline)) void* pass_Alloc(std::size_t size) {
-    return Keep(std::malloc(size));
-}
-template <typename>
-__attribute__((noinline)) void ThirdCaller() {
-    Keep(pass_Alloc(70001));
-}
-
-__attribute__((noinline)) void FourthCaller(std::size_t size) {
-    Keep(alloca(size));
-    FirstCaller();
 // Names as in Rust. Two of them are the same without their arguments.
 __attribute__((noinline)) void Node() __asm__("_RNvNtC4demo5parse4node");
 __attribute__((noinline)) void GrowBytes() __asm__("_RINvC4demo4growhE");
@@ -233,6 +233,18 @@ void Step() {
     Keep(std::malloc(70004));
 }
 
+// A function that passes memory on.
+extern "C" __attribute__((noinline)) void* pass_Alloc(std::size_t size) {
+    return Keep(std::malloc(size));
+}
+template <typename>
+__attribute__((noinline)) void ThirdCaller() {
+    Keep(pass_Alloc(70001));
+}
+
+__attribute__((noinline)) void FourthCaller(std::size_t size) {
+    Keep(alloca(size));
+    FirstCaller();
 }
 
 int main(int argc, char** argv) {
@@ -244,6 +256,7 @@ int main(int argc, char** argv) {
     if (what == "vfork") { VFork(); }
     if (what == "spawn") { Spawn(argv[0]); }
     if (what == "exec") { Exec(argv[0]); }
+    if (what == "execs") { Execs(argv[0], std::atoi(argv[2])); }
     if (what == "load") { Load(); }
     if (what == "signals") { Signals(); }
     if (what == "spin") { Spin(); }
@@ -256,6 +269,12 @@ int main(int argc, char** argv) {
         FirstCaller();
         SecondCaller();
         ThirdCaller<std::vector<int>>();
+    }
+    if (what == "names") {
+        Node();
+        GrowBytes();
+        GrowWords();
+        Step();
     }
     if (what == "alloca") {
         for (const std::size_t size : {100U, 3000U}) { FourthCaller(size); }
@@ -270,9 +289,3 @@ int main(int argc, char** argv) {
     }
     return 0;
 }
-    if (what == "names") {
-        Node();
-        GrowBytes();
-        GrowWords();
-        Step();
-    }

@@ -3,6 +3,9 @@
 
 #include <MemPool>
 
+#include <unistd.h>
+
+#include <csignal>
 #include <new>
 #include <string>
 
@@ -18,7 +21,19 @@ struct Derived : Mgr {
     using Mgr::Mgr;
 };
 
-int main() {
+// With nobody to drain the channel, which fills with events of two slots. They are not at even
+// places.
+void Fill() {
+    Mgr pool("pool");
+    kill(getppid(), SIGSTOP);
+    for (int count = 0; count != 300000; ++count) { pool.Free(pool.Alloc(8)); }
+}
+
+int main(int argc, char**) {
+    if (argc > 1) {
+        Fill();
+        return 0;
+    }
     NUV_OBR_MEMPOOL_ON(true);
     Mgr pool("pool");
     void* const block = pool.Alloc(10);

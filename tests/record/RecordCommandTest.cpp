@@ -88,10 +88,62 @@ TEST(Record, KeepsTheOrderOfThreads) {
     EXPECT_GT(recorded.numEvents, 160000U);
 }
 
-TEST(Record, LeavesChildrenAlone) {
-    EXPECT_EQ(Record("fork").story, "+70000 +70001 -70001 +70003 -70003 ");
-    EXPECT_EQ(Record("vfork").story, "+70000 +70001 -70001 ");
-    EXPECT_EQ(Record("spawn").story, "+70000 +70001 -70001 ");
+TEST(Record, LeavesChildrenAloneAndCountsThem) {
+    Shell::Output("ln -sf " HOST " Host");
+    const auto record = [](const std::string& command) {
+        const std::string text = Shell::Output(MEMPOOL " record -o trace " + command);
+        EXPECT_THAT(text, ContainsRegex("^mempool: .* \\([0-9.]+ s of processor time\\); 'mempool "
+                                        "record --children' records them\n$"));
+        return text.substr(9, text.find(" not recorded") - 9) + ": " + ReadTrace("trace").story;
+    };
+    EXPECT_EQ(record("./Host fork"),
+              "./Host has started 1 child process, which was: +70000 +70001 -70001 +70003 -70003 ");
+    EXPECT_EQ(record("./Host vfork"),
+              "./Host has started 1 child process (sh), which was: +70000 +70001 -70001 ");
+    EXPECT_EQ(record("./Host spawn"),
+              "./Host has started 1 child process (sh), which was: +70000 +70001 -70001 ");
+    EXPECT_EQ(record("bash -c './Host exit; /usr/bin/true; ls >/dev/null; ls >/dev/null'"),
+              "bash has started 4 child processes (Host, true, ls), which were: ");
+    EXPECT_EQ(Shell::Output(MEMPOOL " record -o trace sh -c './Host spin; true' 2>&1 | grep -c ' "
+                                    "(0[.][1-9]. s of'"),
+              "1\n");
+}
+
+TEST(Record, KeepsTheTracesOfChildrenApart) {
+    Shell::Output("ln -sf " HOST " Host");
+    const auto record = [](const std::string& command) {
+        EXPECT_EQ(Shell::Output("rm -f trace*; " MEMPOOL " record --children -o trace " + command),
+                  "");
+        std::multimap<std::string, std::string> stories;
+        std::istringstream files(Shell::Output("ls | grep '^trace[.]' | cat"));
+        for (std::string file; std::getline(files, file);) {
+            const Recorded child = ReadTrace(file);
+            stories.emplace(child.facts.at("program"), child.story);
+        }
+        return stories;
+    };
+    const auto is = [](const std::string& program, const std::string& story) {
+        return testing::Pair(program, story);
+    };
+    const std::string exits = "+70000 +70001 -70001 ";
+    EXPECT_THAT(record("./Host fork"), testing::ElementsAre(is("./Host fork", "+70002 -70002 ")));
+    EXPECT_EQ(ReadTrace("trace").story, "+70000 +70001 -70001 +70003 -70003 ");
+    EXPECT_THAT(record("./Host spawn").count("./Host family"), 1U);
+    const auto many = record("sh -c 'for i in $(seq 100); do env -i ./Host exit & done; wait'");
+    EXPECT_THAT(many.count("./Host exit"), 100U);
+    for (const auto& [program, story] : many) {
+        EXPECT_EQ(story, program == "./Host exit" ? exits : "") << program;
+    }
+    // Of a program that cannot be recorded nothing is left, and no file is replaced.
+    EXPECT_TRUE(record("sh -c '" STATIC_HOST "; true'").empty());
+    Shell::Output("echo 'echo mine >trace.$$; exec ./Host exit' >script");
+    EXPECT_THAT(Shell::Output(MEMPOOL " record --children -o trace sh -c 'sh script; true'; "
+                                      "grep -l mine trace.*"),
+                ContainsRegex("^trace[.][0-9]+\n$"));
+    EXPECT_EQ(Shell::Output("mv $(ls trace.*.2) trace; ls trace.*.2 2>/dev/null | wc -l"), "0\n");
+    EXPECT_EQ(ReadTrace("trace").story, exits);
+    EXPECT_THAT(Shell::Output(MEMPOOL " record --children -o - true", 125),
+                HasSubstr("mempool: -: --children needs the name of a file"));
 }
 
 // The blocks of the old program are gone, and the callers are those of the new one.
@@ -99,6 +151,7 @@ TEST(Record, FollowsAProgramThatBecomesAnother) {
     const Recorded exec = Record("exec", "--by caller");
     EXPECT_THAT(exec.story, testing::StartsWith("+70000 +70001 -70001 +70000 +70001 "));
     EXPECT_THAT(exec.numBlocks, testing::Contains(testing::Key(ContainsRegex("^FirstCaller"))));
+    Record("execs 40");  // Some threads are between taking a slot and filling it.
     const auto record = [](const std::string& command, int status) {
         const std::string text = Shell::Output(MEMPOOL " record -o trace " + command, status);
         return text + ReadTrace("trace").story;
@@ -148,6 +201,12 @@ TEST(Record, NamesTheGroups) {
           "^Second::Caller\\+0x[0-9a-f]+ \\(RecordHost[,)]", "^void ThirdCaller\\(\\)\\+0x"}) {
         EXPECT_THAT(byCaller, testing::Contains(testing::Key(ContainsRegex(name))));
     }
+    const std::string after =
+        Shell::Output("objdump -d --prefix-addresses " HOST
+                      " | grep -A1 '<_Z11FirstCallerv.*call .*malloc' | "
+                      "sed -n 's/.*_Z11FirstCallerv\\(+0x[0-9a-f]*\\)>.*/\\1/p' | tail -1");
+    EXPECT_THAT(byCaller, testing::Contains(testing::Key(HasSubstr(
+                              "FirstCaller()" + after.substr(0, after.size() - 1) + " ("))));
     EXPECT_EQ(Record("callers", "--by module").numBlocks,
               (std::map<std::string, int>{{"RecordHost", 5}}));
     const auto skipped = Record("callers", "--by caller --skip no --skip '*Caller*'").numBlocks;
@@ -157,6 +216,15 @@ TEST(Record, NamesTheGroups) {
                   " record -o trace --by caller ./Stripped family");
     EXPECT_THAT(ReadTrace("trace").numBlocks,
                 testing::Contains(testing::Key(ContainsRegex("^Stripped\\+0x[0-9a-f]{1,5}$"))));
+}
+
+TEST(Record, NamesFunctionsOfRust) {
+    const auto names = Record("names", "--by caller").numBlocks;
+    for (const char* name :
+         {"demo::parse::node", "demo::grow", "demo::grow#2", "<demo::Tree as demo::Walk>::step"}) {
+        EXPECT_THAT(
+            names, testing::Contains(testing::Key(testing::StartsWith(std::string(name) + "+0x"))));
+    }
 }
 
 TEST(Record, KeepsStacks) {
@@ -202,8 +270,9 @@ TEST(Record, LeavesTheEnvironmentAsItWas) {
         ContainsRegex("^mempool: " SANITIZED_HOST " is built with AddressSanitizer[^\n]*\n$"));
     EXPECT_EQ(Shell::Output(record + "grep Sig[BI] /proc/self/status"),
               Shell::Output("grep Sig[BI] /proc/self/status"));
-    EXPECT_EQ(Shell::Output("echo in | " + record + "sh -c 'cat; echo err >&2; exit 9'", 9),
-              "in\nerr\n");
+    EXPECT_EQ(
+        Shell::Output("echo in | " + record + "sh -c 'read x; echo $x; echo err >&2; exit 9'", 9),
+        "in\nerr\n");
     EXPECT_EQ(Shell::Output(record + "-- sh -c 'echo \"$@\"' sh -o --by -- [x,y] ''"),
               "-o --by -- [x,y] \n");
 }
@@ -218,15 +287,6 @@ TEST(Record, WaitsForRoom) {
                             "kill -KILL $!; until grep done out; do sleep 0.01; done"),
               "done\n");
 }
-TEST(Record, NamesFunctionsOfRust) {
-    const auto names = Record("names", "--by caller").numBlocks;
-    for (const char* name :
-         {"demo::parse::node", "demo::grow", "demo::grow#2", "<demo::Tree as demo::Walk>::step"}) {
-        EXPECT_THAT(
-            names, testing::Contains(testing::Key(testing::StartsWith(std::string(name) + "+0x"))));
-    }
-}
-
 
 TEST(Record, PassesAnInterruptOnOnce) {
     Shell::Output("ln -sf " HOST " Host");

@@ -36,4 +36,10 @@ TEST(RecordPools, RecordsTheTraceOfTheLibraryAndMore) {
               "mempool: true has made no pool of the shared library, libObrMemPool.so\n");
 }
 
+TEST(RecordPools, WaitsForRoomForAWholeEvent) {
+    Shell::Output(MEMPOOL " record --pools -o trace " HOST
+                          " fill & sleep 1; kill -CONT $!; wait $!");
+    EXPECT_EQ(Shell::Output(MEMPOOL " text trace | grep -c '^xmpt:[af]:'"), "600000\n");
+}
+
 }  // namespace

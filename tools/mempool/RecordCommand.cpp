@@ -10,6 +10,8 @@
 #include <memory>
 #include <string>
 
+#include <fmt/format.h>
+
 #include "mempool/CommandLine.hpp"
 #include "system/Child.hpp"
 #include "system/ExitStatus.hpp"
@@ -24,7 +26,8 @@ constexpr const char* notes =
     R"(The program runs unchanged, with a recorder that is loaded before its libraries. Its standard streams
 and its exit status do not change; if a signal kills it, mempool ends by the same signal. Signals sent
 to mempool are forwarded to the program. A program that replaces this one through exec is recorded
-too; child processes are not. The trace is complete even if Ctrl-C or a crash ends the program.
+too; child processes are not, unless --children is given. The trace is complete even if Ctrl-C or a
+crash ends the program.
 
 Recorded are malloc, calloc, realloc (a release and an allocation), reallocarray, free, the aligned
 forms, and operator new and delete, which call them. An allocator that is linked into the program
@@ -40,6 +43,12 @@ itself is not recorded.
 --stacks      A group is a call stack: the innermost 32 frames, or DEPTH frames, at most 64. A stack
               ends at a function whose stack frame varies in size.
 --by module   The program's file and each of its shared libraries are a group.
+--children    Records each child process, and their children, into a file of its own: FILE with the
+              number of the process, as in mempool.trace.4711. If there is such a file, the name gets
+              a further number. A child without an event leaves no file. The trace of a child that
+              only forks begins there: blocks of its parent are not in it. Recording ends with the
+              program, even if children are still running. LD_PRELOAD and MEMPOOL_RECORD_CHANNEL stay
+              in the environment of the program, for its children to find.
 --pools       Records the pools of libObrMemPool instead of the heap, enabled or not, including
               Mgr::Clear. The program must use the shared library.
 
@@ -56,7 +65,12 @@ int Run(const Recorder::Order& order) {
     if (isatty(STDERR_FILENO) != 0) {
         std::cerr << "mempool: " << outcome.numEvents << " events of " << outcome.numThreads
                   << (outcome.numThreads == 1 ? " thread, " : " threads, ") << outcome.traceSize
-                  << " bytes in " << order.tracePath << '\n';
+                  << " bytes in " << order.tracePath;
+        if (order.children) {
+            std::cerr << "; " << outcome.numChildren << " child processes in " << order.tracePath
+                      << ".PID";
+        }
+        std::cerr << '\n';
     }
     return System::EndLike(outcome.waitStatus);
 }
@@ -99,7 +113,7 @@ void AddRecordOptions(CLI::App& subcommand, Recorder::Order& order) {
 
 Recorder::Outcome RecordAsOrdered(const Recorder::Order& order) {
     Recorder::Outcome outcome = Recorder::RecordProgram(order);
-    const auto warn = [&](const char* what) {
+    const auto warn = [&](const std::string& what) {
         std::cerr << "mempool: " << order.command.front() << ' ' << what << '\n';
     };
     if (order.pools && outcome.numEvents == 0) {
@@ -109,6 +123,18 @@ Recorder::Outcome RecordAsOrdered(const Recorder::Order& order) {
         warn(
             "has become a program that cannot be recorded: it is statically linked, or runs with "
             "other rights");
+    }
+    if (outcome.numLostChildren != 0) {
+        const bool isOne = outcome.numLostChildren == 1;
+        warn(fmt::format(
+            "has started {} child process{}{}, which {} not recorded{}", outcome.numLostChildren,
+            isOne ? "" : "es", outcome.lostNames.empty() ? "" : " (" + outcome.lostNames + ")",
+            isOne ? "was" : "were",
+            order.children
+                ? ": too many were running"
+                : fmt::format(
+                      " ({:.2f} s of processor time); 'mempool record --children' records them",
+                      outcome.lostSeconds)));
     }
     if (outcome.isAddressSanitized) {
         warn(
@@ -130,6 +156,8 @@ void AddRecord(Program& program) {
         ->type_name("FILE")
         ->capture_default_str();
     AddRecordOptions(record, *order);
+    record.add_flag("--children", order->children,
+                    "Record each child process too, in a file of its own");
     record.callback([&program, order] {
         order->command = program.command;
         if (order->command.empty()) { throw CLI::RequiredError("PROGRAM"); }

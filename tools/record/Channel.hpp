@@ -13,7 +13,7 @@
 
 namespace Recorder {
 
-// Holds the descriptor of the channel, for the recorder in the program.
+// Holds the path of the program's channel, for the recorder in the program and in its children.
 constexpr const char* channelVariable = "MEMPOOL_RECORD_CHANNEL";
 
 // From Caller on, a block's group is found on the stack.
@@ -94,16 +94,26 @@ struct Samples {
 };
 constexpr std::size_t numSampleLengths = 20;
 
+// A channel that is ready for a child process, or has been taken by one.
+struct ChildChannel {
+    std::atomic<std::int32_t> descriptor;  // In the process that drains it; 0 for no channel.
+    std::atomic<std::int32_t> pid;         // Of the child, 0 if there is none yet.
+};
+constexpr std::size_t maxChildren = 256;  // That are recorded at a time.
+
+constexpr std::size_t numChildNames = 8;
+constexpr std::size_t childNameSize = 32;
+
 struct Channel {
     // Read at every event, and rarely written.
     alignas(64) std::uint64_t magic;
     std::atomic<std::uint64_t> tail;  // Slots drained.
     By by;
     std::uint32_t depth;                     // The most frames of a stack, up to maxDepth.
-    std::int32_t pid;                        // Of the program, and of no child of it.
+    std::uint32_t recordsChildren;           // Each child takes a channel of its own.
+    std::atomic<std::int32_t> pid;           // Of the process, and of no child of it.
     std::int32_t parentPid;                  // Of the process that drains the channel.
-    std::int32_t descriptor;                 // Of the channel, in that process.
-    std::atomic<std::uint32_t> isTaken;      // Set by the program's recorder, once.
+    std::atomic<std::uint32_t> isTaken;      // Set by the recorder of each program, once.
     std::atomic<std::uint32_t> numExecs;     // How often another program has replaced this one.
     std::atomic<std::uint32_t> tailFutex;    // The low bits of the tail, to wait on.
     std::atomic<std::uint32_t> numWaiting;   // Threads that wait.
@@ -124,6 +134,14 @@ struct Channel {
     // Patterns of functions that are not callers, each ended by a 0, then an empty one.
     char skipped[1024];
 
+    // Children that are not recorded, and the files of the first programs that they executed.
+    std::atomic<std::uint32_t> numLost;
+    std::atomic<std::uint32_t> numNamed;
+    char childNames[numChildNames][childNameSize];
+
+    char command[1024];  // Of a child: its words, each ended by a 0.
+    ChildChannel children[maxChildren];
+
     // The timed calls of the allocator, by the power of two of their ticks, which include the
     // timer's.
     Samples samples[numSampleLengths];
@@ -134,7 +152,7 @@ struct Channel {
     Stack stacks[numStacks];
     std::uint16_t frames[numFrames];  // Indices of callers.
 };
-constexpr std::uint64_t channelMagic = 0x3131'4C4E'4843'504D;
+constexpr std::uint64_t channelMagic = 0x3231'4C4E'4843'504D;
 
 constexpr std::uint64_t numCalibrationEvents = 1024;
 

@@ -123,12 +123,9 @@ void Collector::WritePoolEvent(std::uint64_t& index, std::uint64_t pool, std::ui
 
 // The memory of a program is gone when another one replaces it.
 void Collector::EndPools() {
-    for (std::uint64_t pool = 0; pool != knownPools.size(); ++pool) {
-        if (knownPools[pool]) { pools.insert(pool); }
-        knownPools[pool] = false;
-    }
     for (const std::uint64_t pool : pools) {
         writer.Write({Trace::Kind::Destroyed, pool, 0, 0, {}, {}});
+        if (!isOfPools) { knownPools[pool] = false; }
     }
     pools.clear();
     symbols = {};
@@ -160,6 +157,7 @@ std::uint64_t Collector::PoolOf(std::uint64_t group, std::uint64_t thread) {
     const std::uint64_t pool = NumberOfPool(group, thread);
     if (!knownPools[pool]) {
         knownPools[pool] = true;
+        pools.insert(pool);
         writer.Write({Trace::Kind::Created, pool, 0, 0, {}, {}});
         const std::string name = NameOfPool(group, pool);
         writer.Write({Trace::Kind::Named, pool, 0, 0, {}, name});

@@ -44,7 +44,7 @@ private:
     std::unordered_map<std::uint64_t, std::string> callerNames;
     const bool isOfPools;
     std::vector<bool> knownPools;   // Groups of the heap that have a pool.
-    std::set<std::uint64_t> pools;  // Live pools of the library.
+    std::set<std::uint64_t> pools;  // These pools, or the live ones of the library.
     const std::chrono::steady_clock::time_point start = std::chrono::steady_clock::now();
     std::chrono::milliseconds nextTime{0};  // When to write the time next.
     std::uint64_t lastThread = 0;

@@ -3,6 +3,7 @@
 
 #include "record/Recorder.hpp"
 
+#include <fcntl.h>
 #include <linux/futex.h>
 #include <sys/mman.h>
 #include <sys/syscall.h>
@@ -11,6 +12,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <climits>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <ctime>
@@ -18,8 +20,6 @@
 namespace Recorder {
 
 namespace {
-
-std::atomic<bool> isSearched = false;
 
 // Removes a variable from the environment.
 void Forget(char** place) {
@@ -50,26 +50,89 @@ void RestoreEnvironment() {
     }
 }
 
-// The channel of the descriptor, if it is for this process and not taken yet; else null.
-Channel* TakeChannel(int descriptor) {
+// The channel at the path, or null. The caller releases it.
+Channel* Map(const char* path) {
+    const int descriptor = open(path, O_RDWR | O_CLOEXEC);
+    if (descriptor < 0) { return nullptr; }
     void* const memory =
         mmap(nullptr, sizeof(Channel), PROT_READ | PROT_WRITE, MAP_SHARED, descriptor, 0);
+    close(descriptor);
     if (memory == MAP_FAILED) { return nullptr; }
     auto* const channel = static_cast<Channel*>(memory);
-    if (channel->magic == channelMagic && channel->pid == getpid() &&
-        channel->isTaken.exchange(1) == 0) {
-        return channel;
-    }
+    if (channel->magic == channelMagic) { return channel; }
     munmap(memory, sizeof(Channel));
     return nullptr;
 }
 
+// Takes a channel that is ready, or the one that this process had before it executed this program.
+Channel* TakeReady(Channel& program) {
+    const std::int32_t own = getpid();
+    for (const bool isFirstTry : {true, false}) {
+        for (ChildChannel& child : program.children) {
+            std::int32_t pid = isFirstTry ? own : 0;
+            const std::int32_t descriptor = child.descriptor.load();
+            if (descriptor == 0 || !child.pid.compare_exchange_strong(pid, own)) { continue; }
+            char path[64];
+            std::snprintf(path, sizeof(path), "/proc/%d/fd/%d", program.parentPid, descriptor);
+            Channel* const channel = Map(path);
+            if (channel == nullptr) { continue; }
+            channel->pid = own;
+            if (channel->isTaken.exchange(1) == 0) { return channel; }
+            munmap(channel, sizeof(Channel));  // Of a process that had this number before.
+        }
+    }
+    return nullptr;
+}
+
+// Waits until a channel is ready, but not for long: too many children may be running.
+Channel* TakeChannelOfChild(Channel& program) {
+    constexpr int mostTries = 5000;
+    const timespec pause = {0, 1000000};
+    for (int tries = 0; tries != mostTries; ++tries) {
+        Channel* const channel = TakeReady(program);
+        if (channel != nullptr || access(channelPath, F_OK) != 0) { return channel; }
+        nanosleep(&pause, nullptr);
+    }
+    ++program.numLost;
+    return nullptr;
+}
+
+// Notes the command line of a child, which its trace has as its program.
+void NoteCommand(Channel& channel) {
+    const int file = open("/proc/self/cmdline", O_RDONLY | O_CLOEXEC);
+    std::memset(channel.command, 0, sizeof(channel.command));
+    [[maybe_unused]] const ssize_t size = read(file, channel.command, sizeof(channel.command) - 1);
+    close(file);
+}
+
+// The channel for this process, or null.
+Channel* TakeChannel() {
+    Channel* const program = Map(channelPath);
+    if (program == nullptr) { return nullptr; }
+    if (program->pid == getpid()) {
+        if (program->isTaken.exchange(1) == 0) { return program; }
+    } else if (program->recordsChildren != 0) {
+        Channel* const channel = TakeChannelOfChild(*program);
+        if (channel != nullptr) { NoteCommand(*channel); }
+        munmap(program, sizeof(Channel));
+        return channel;
+    }
+    munmap(program, sizeof(Channel));
+    return nullptr;
+}
+
 void Activate(Channel* channel) {
+    known = channel;
+    if (active != &inactive) {  // A child has the page of its parent, cleared.
+        active->channel.store(channel, std::memory_order_relaxed);
+        return;
+    }
     const auto pageSize = static_cast<std::size_t>(sysconf(_SC_PAGESIZE));
     void* const page =
         mmap(nullptr, pageSize, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
     if (page == MAP_FAILED || madvise(page, pageSize, MADV_WIPEONFORK) != 0) { return; }
     static_cast<Active*>(page)->channel.store(channel, std::memory_order_relaxed);
+    static_cast<Active*>(page)->isSearched = true;
     active = static_cast<Active*>(page);
 }
 
@@ -126,9 +189,11 @@ void TakeOver(Channel& channel) {
     }
     Put(channel, Op::Executed, nullptr, 0, 0);
     WaitForRoom(channel, head + numSlots);  // Waits until all slots before it are drained.
-    for (Caller& caller : channel.callers) {
-        caller.address.store(0);
-        caller.state.store(Caller::Unknown);
+    if (channel.by >= By::Caller) {
+        for (Caller& caller : channel.callers) {
+            caller.address.store(0);
+            caller.state.store(Caller::Unknown);
+        }
     }
     if (channel.by == By::Stack) {
         for (Stack& stack : channel.stacks) {
@@ -144,20 +209,23 @@ void TakeOver(Channel& channel) {
 }  // namespace
 
 void Attach() {
-    if (environ == nullptr || isSearched.exchange(true)) { return; }
+    const bool isChild = known != nullptr;
+    if (environ == nullptr || active->isSearched.exchange(true)) { return; }
+    if (isChild && known->recordsChildren == 0) { return; }
     const int oldErrno = errno;
-    const char* const text = std::getenv(channelVariable);
-    if (text != nullptr) {
-        const int descriptor = std::atoi(text);
-        Channel* const channel = TakeChannel(descriptor);
-        close(descriptor);
+    const char* const path = std::getenv(channelVariable);
+    if (path != nullptr && !isChild) { std::strncpy(channelPath, path, sizeof(channelPath) - 1); }
+    Channel* const channel = *channelPath == '\0' ? nullptr : TakeChannel();
+    // Children that are recorded find the recorder in the environment.
+    if (path != nullptr && (channel == nullptr || channel->recordsChildren == 0)) {
         RestoreEnvironment();
-        if (channel != nullptr) {
-            if (channel->numExecs != 0) { TakeOver(*channel); }
-            channel->timerTicks.store(TimerTicks());
-            channel->eventTicks.store(EventTicks());
-            Activate(channel);
-        }
+    }
+    if (channel != nullptr) {
+        threadState = {};
+        if (channel->numExecs != 0) { TakeOver(*channel); }
+        channel->timerTicks.store(TimerTicks());
+        channel->eventTicks.store(EventTicks());
+        Activate(channel);
     }
     errno = oldErrno;
 }
@@ -182,9 +250,9 @@ bool WaitForRoom(Channel& channel, std::uint64_t index) {
     ++channel.numWaiting;
     while (true) {
         const std::uint32_t seen = channel.tailFutex.load();
-        if (index - channel.tail.load(std::memory_order_acquire) < numSlots) { break; }
+        if (index < channel.tail.load(std::memory_order_acquire) + numSlots) { break; }
         syscall(SYS_futex, &channel.tailFutex, FUTEX_WAIT, seen, &limit, nullptr, 0);
-        if (getppid() != channel.parentPid) {
+        if (getppid() != channel.parentPid && access(channelPath, F_OK) != 0) {
             active->channel.store(nullptr, std::memory_order_relaxed);
             isDrained = false;
             break;

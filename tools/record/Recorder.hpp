@@ -14,13 +14,19 @@
 
 namespace Recorder {
 
-// On a page of its own, which the kernel clears in a child, so that no child is recorded, however
-// it is created.
+// On a page of its own, which the kernel clears in a child, so that no child fills the channel of
+// its parent, however it is created.
 struct Active {
     std::atomic<Channel*> channel;
+    std::atomic<bool> isSearched;
 };
 inline Active inactive = {};
 inline Active* active = &inactive;
+
+// Kept in a child: the path of the program's channel, and the last channel that this process or
+// its parent has filled.
+inline char channelPath[64] = "";
+inline Channel* known = nullptr;
 
 struct ThreadState {
     std::uint32_t number;     // From 1 on, in the order of their first events; 0 before that.

@@ -3,11 +3,15 @@
 
 #include "record/Session.hpp"
 
+#include <poll.h>
 #include <sys/mman.h>
+#include <sys/resource.h>
+#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <chrono>
 #include <csignal>
@@ -17,6 +21,9 @@
 #include <filesystem>
 #include <initializer_list>
 #include <iomanip>
+#include <memory>
+#include <optional>
+#include <set>
 #include <sstream>
 #include <string_view>
 
@@ -39,34 +46,6 @@ using Clock = std::chrono::steady_clock;
     throw System::Failure(System::ownFailure, what, errno);
 }
 
-// The channel's memory, which has no name and is released with its last user.
-class SharedChannel {
-public:
-    SharedChannel() : descriptor(memfd_create("mempool-record", 0)) {
-        if (!descriptor.IsOpen() || ftruncate(descriptor.Number(), sizeof(Channel)) != 0) {
-            Fail("shared memory");
-        }
-        void* const memory = mmap(nullptr, sizeof(Channel), PROT_READ | PROT_WRITE, MAP_SHARED,
-                                  descriptor.Number(), 0);
-        if (memory == MAP_FAILED) { Fail("shared memory"); }
-        channel = static_cast<Channel*>(memory);
-        channel->magic = channelMagic;
-        channel->parentPid = getpid();
-        channel->descriptor = descriptor.Number();
-    }
-    SharedChannel(const SharedChannel&) = delete;
-    SharedChannel& operator=(const SharedChannel&) = delete;
-    ~SharedChannel() { munmap(channel, sizeof(Channel)); }
-
-    Channel& operator*() const { return *channel; }
-    Channel* operator->() const { return channel; }
-    int Number() const { return descriptor.Number(); }
-
-private:
-    System::Descriptor descriptor;
-    Channel* channel = nullptr;
-};
-
 void Skip(Channel& channel, const std::vector<std::string>& patterns) {
     std::size_t used = 0;
     for (const std::string& pattern : patterns) {
@@ -78,6 +57,40 @@ void Skip(Channel& channel, const std::vector<std::string>& patterns) {
         used += size;
     }
 }
+
+// The channel's memory, which has no name and is released with its last user.
+class SharedChannel {
+public:
+    explicit SharedChannel(const Order& order)
+        : descriptor(memfd_create("mempool-record", MFD_CLOEXEC)) {
+        if (!descriptor.IsOpen() || ftruncate(descriptor.Number(), sizeof(Channel)) != 0) {
+            Fail("shared memory");
+        }
+        void* const memory = mmap(nullptr, sizeof(Channel), PROT_READ | PROT_WRITE, MAP_SHARED,
+                                  descriptor.Number(), 0);
+        if (memory == MAP_FAILED) { Fail("shared memory"); }
+        channel = static_cast<Channel*>(memory);
+        channel->magic = channelMagic;
+        channel->parentPid = getpid();
+        channel->by = order.by;
+        channel->depth = order.by == By::Stack ? order.depth : maxDepth;
+        channel->recordsChildren = order.children ? 1 : 0;
+        Skip(*channel, order.skipped);
+    }
+    SharedChannel(const SharedChannel&) = delete;
+    SharedChannel& operator=(const SharedChannel&) = delete;
+    ~SharedChannel() {
+        if (channel != nullptr) { munmap(channel, sizeof(Channel)); }
+    }
+
+    Channel& operator*() const { return *channel; }
+    Channel* operator->() const { return channel; }
+    int Number() const { return descriptor.Number(); }
+
+private:
+    System::Descriptor descriptor;
+    Channel* channel = nullptr;
+};
 
 // Receives the signals of this process one by one, where it waits, and forwards them to the
 // program.
@@ -145,7 +158,8 @@ void Prepare(const Order& order, const SharedChannel& channel, const std::string
     const char* const preloaded = std::getenv("LD_PRELOAD");
     const bool isAlone = preloaded == nullptr || *preloaded == '\0';
     setenv("LD_PRELOAD", (isAlone ? recorder : recorder + ":" + preloaded).c_str(), 1);
-    setenv(channelVariable, std::to_string(channel.Number()).c_str(), 1);
+    const std::string descriptors = "/proc/" + std::to_string(channel->parentPid) + "/fd/";
+    setenv(channelVariable, (descriptors + std::to_string(channel.Number())).c_str(), 1);
     signals.Restore();
 }
 
@@ -180,14 +194,18 @@ void WriteInfo(Trace::CompactWriter& writer, std::string_view key, const std::st
     writer.Write({Trace::Kind::Info, 0, 0, 0, key, text});
 }
 
-void WriteStart(Trace::CompactWriter& writer, const Order& order) {
-    std::string commandLine;
-    for (const std::string& word : order.command) {
-        commandLine += (commandLine.empty() ? "" : " ") + word;
-    }
-    constexpr const char* names[] = {"all", "thread", "caller", "module", "stack"};
-    WriteInfo(writer, "program", commandLine);
-    WriteInfo(writer, "by", order.pools ? "pools" : names[static_cast<std::size_t>(order.by)]);
+// The command line of a child.
+std::string CommandOf(const Channel& channel) {
+    std::string text(channel.command, sizeof(channel.command));
+    text.erase(text.find_last_not_of('\0') + 1);
+    std::replace(text.begin(), text.end(), '\0', ' ');
+    return text;
+}
+
+std::string CommandText(const std::vector<std::string>& words) {
+    std::string text;
+    for (const std::string& word : words) { text += (text.empty() ? "" : " ") + word; }
+    return text;
 }
 
 // The total of the timed calls. If there are few, a single call that was interrupted could dominate
@@ -230,7 +248,7 @@ void WriteTimes(Trace::CompactWriter& writer, const Channel& channel, double who
     const double recorder =
         seconds(events) + static_cast<double>(channel.unwindNanoseconds.load()) / 1e9;
     const double own = std::max(whole - recorder, whole / 2);
-    WriteInfo(writer, "cpu_seconds", Text(own));
+    if (whole > 0) { WriteInfo(writer, "cpu_seconds", Text(own)); }
     const TimedCalls timed(channel);
     if (timed.number >= leastCalls && whole >= leastSeconds) {
         const double allocator = seconds(timed.ticks * samplePeriod);
@@ -239,33 +257,248 @@ void WriteTimes(Trace::CompactWriter& writer, const Channel& channel, double who
     WriteInfo(writer, "threads", std::to_string(channel.numThreads));
 }
 
+// The trace of one process.
+class Recording {
+public:
+    // Opens the file, which is none of the inputs.
+    Recording(const Order& order, const std::string& path, const std::vector<std::string>& inputs,
+              const std::string& commandLine, Channel& ofChannel)
+        : channel(ofChannel),
+          file(path, inputs),
+          writer([this](std::string_view bytes) { file.Write(bytes); }),
+          collector(channel, writer, order.pools) {
+        file.KeepIfCutShort();
+        WriteProgram(commandLine);
+        constexpr const char* names[] = {"all", "thread", "caller", "module", "stack"};
+        WriteInfo(writer, "by", order.pools ? "pools" : names[static_cast<std::size_t>(order.by)]);
+    }
+
+    void WriteProgram(const std::string& commandLine) { WriteInfo(writer, "program", commandLine); }
+    bool Drain(bool atEnd = false) { return collector.Drain(atEnd); }
+    void Flush() { writer.Flush(); }
+
+    // Writes the rest. `whole` is the processor time of the process.
+    void Finish(double whole, const TickRate& rate) {
+        WriteTimes(writer, channel, whole, rate);
+        writer.Finish();
+    }
+
+    System::OutputFile& File() { return file; }
+    std::uint64_t NumEvents() const { return collector.NumEvents(); }
+
+private:
+    Channel& channel;
+    System::OutputFile file;
+    Trace::CompactWriter writer;
+    Collector collector;
+};
+
+// A child process. Nothing is written for it before its first event.
+class Child {
+public:
+    Child(const Order& ofOrder, pid_t number)
+        : order(ofOrder),
+          pid(number),
+          process(static_cast<int>(syscall(SYS_pidfd_open, number, 0))) {}
+
+    bool HasEnded() const {
+        pollfd one = {process.Number(), POLLIN, 0};
+        return !process.IsOpen() || poll(&one, 1, 0) == 1;
+    }
+
+    // Drains the channel. Throws a System::Failure if the trace cannot be written; later calls
+    // then drop the events.
+    bool Drain(Channel& channel, bool atEnd) {
+        seconds = std::max(seconds, ProcessorSeconds(pid));
+        const std::uint64_t head = channel.head.load();
+        if (channel.tail.load() == head) { return false; }
+        if (recording == nullptr) {
+            if (isLost) {
+                channel.tail.store(head);
+                return true;
+            }
+            isLost = true;
+            command = CommandOf(channel);
+            recording =
+                std::make_unique<Recording>(order, order.tracePath + "." + std::to_string(pid),
+                                            std::vector<std::string>(), command, channel);
+            isLost = false;
+        }
+        NoteProgram(channel);
+        return recording->Drain(atEnd);
+    }
+
+    // Returns whether there is a trace.
+    bool Finish(const Channel& channel, const TickRate& rate) {
+        if (recording == nullptr) { return false; }
+        NoteProgram(channel);
+        recording->Finish(seconds, rate);
+        recording->File().CommitBeside();
+        return true;
+    }
+
+    void Flush() {
+        if (recording != nullptr) { recording->Flush(); }
+    }
+
+private:
+    // The program changes if the process executes another one. The last one names the trace.
+    void NoteProgram(const Channel& channel) {
+        const std::string now = CommandOf(channel);
+        if (now != command) { recording->WriteProgram(command = now); }
+    }
+
+    const Order& order;
+    const pid_t pid;
+    const System::Descriptor process;
+    std::unique_ptr<Recording> recording;
+    std::string command;
+    double seconds = 0;
+    bool isLost = false;
+};
+
+// Keeps channels ready in that of the program, and drains those that children have taken.
+class Children {
+public:
+    Children(const Order& ofOrder, Channel& ofProgram) : order(ofOrder), program(ofProgram) {
+        Refill();
+    }
+
+    // Drains all channels. Those of processes that have ended are finished, or all of them.
+    bool Drain(const TickRate& rate, bool atEnd) {
+        bool isAny = false;
+        for (std::size_t index = 0; index != maxChildren; ++index) {
+            ChildChannel& place = program.children[index];
+            if (place.pid == 0) { continue; }
+            std::optional<SharedChannel>& channel = channels[index];
+            std::optional<Child>& child = children[index];
+            if (!child.has_value()) { child.emplace(order, place.pid.load()); }
+            const bool hasEnded = child->HasEnded();
+            bool isDrained = false;
+            Try([&] { isDrained = child->Drain(**channel, hasEnded); });
+            isAny |= isDrained;
+            if (!atEnd && (isDrained || !hasEnded)) { continue; }
+            Try([&] { number += child->Finish(**channel, rate) ? 1 : 0; });
+            child.reset();
+            place.descriptor = 0;
+            channel.reset();
+            place.pid = 0;
+        }
+        Refill();
+        return isAny;
+    }
+
+    void Flush() {
+        for (std::optional<Child>& child : children) {
+            if (child.has_value()) { child->Flush(); }
+        }
+    }
+
+    bool AreRecorded() const { return order.children; }
+    std::uint64_t Number() const { return number; }
+
+    // Throws the first failure.
+    void Check() const {
+        if (failure.has_value()) { throw System::Failure(*failure); }
+    }
+
+private:
+    static constexpr std::size_t numReady = 32;
+
+    template <typename Step>
+    void Try(Step step) {
+        try {
+            step();
+        } catch (const System::Failure& first) {
+            if (!failure.has_value()) { failure.emplace(first); }
+        }
+    }
+
+    // Makes channels until enough are ready. If one cannot be made, there may be room later.
+    void Refill() {
+        if (!order.children) { return; }
+        std::size_t ready = 0;
+        for (std::size_t index = 0; index != maxChildren && ready != numReady; ++index) {
+            ChildChannel& place = program.children[index];
+            if (place.pid != 0) { continue; }
+            if (!channels[index].has_value()) {
+                try {
+                    channels[index].emplace(order);
+                } catch (const System::Failure&) { return; }
+                place.descriptor = channels[index]->Number();
+            }
+            ++ready;
+        }
+    }
+
+    const Order& order;
+    Channel& program;
+    std::array<std::optional<SharedChannel>, maxChildren> channels;
+    std::array<std::optional<Child>, maxChildren> children;
+    std::optional<System::Failure> failure;
+    std::uint64_t number = 0;
+};
+
 bool IsRunning(pid_t program) {
     siginfo_t info = {};
     waitid(P_PID, static_cast<id_t>(program), &info, WEXITED | WNOHANG | WNOWAIT);
     return info.si_pid == 0;
 }
 
-// Drains the channel until the program ends, but does not wait for it. Flushes the trace regularly,
-// so that little is lost if this process is killed.
-void Follow(pid_t program, Collector& collector, Trace::CompactWriter& writer,
+// Drains the channels until the program ends, but does not wait for it. Flushes the traces
+// regularly, so that little is lost if this process is killed.
+void Follow(pid_t program, Recording& recording, Children& children, const TickRate& rate,
             const Signals& signals) {
     using namespace std::chrono_literals;
     constexpr auto shortest = 500us;
-    constexpr auto longest = 20ms;
+    const auto longest = children.AreRecorded() ? 2ms : 20ms;  // New children wait for channels.
     constexpr auto untilFlush = 500ms;
     std::chrono::nanoseconds pause = 0ns;
     Clock::time_point lastFlush = Clock::now();
     while (IsRunning(program)) {
         if (Clock::now() - lastFlush > untilFlush) {
-            writer.Flush();
+            recording.Flush();
+            children.Flush();
             lastFlush = Clock::now();
         }
-        pause = collector.Drain()
+        const bool isAnyOfChildren = children.Drain(rate, false);
+        pause = recording.Drain() || isAnyOfChildren
                     ? 0ns
                     : std::clamp<std::chrono::nanoseconds>(2 * pause, shortest, longest);
         signals.Wait(pause, program);
     }
-    while (collector.Drain(true)) {}
+    while (recording.Drain(true)) {}
+    // A child that is still running may not stop allocating.
+    for (int round = 0; round != 100 && children.Drain(rate, false); ++round) {}
+    children.Drain(rate, true);
+}
+
+// What is known of the children that are not recorded. `descendants` is the processor time of all.
+void DescribeLost(Outcome& outcome, const Channel& channel, double descendants) {
+    outcome.numLostChildren = channel.numLost;
+    outcome.lostSeconds = descendants;
+    std::set<std::string> names;
+    for (const auto& name : channel.childNames) {
+        if (*name != '\0' && names.insert(name).second) {
+            outcome.lostNames += (outcome.lostNames.empty() ? "" : ", ") + std::string(name);
+        }
+    }
+}
+
+double Seconds(const timeval& time) {
+    return static_cast<double>(time.tv_sec) + static_cast<double>(time.tv_usec) / 1e6;
+}
+
+// The traces of children are beside that of the program, which needs a name.
+void CheckCanRecordChildren(const std::string& path) {
+    std::error_code none;
+    if (path == "-" ||
+        (std::filesystem::exists(path, none) && !std::filesystem::is_regular_file(path, none))) {
+        throw System::Failure(System::ownFailure,
+                              path +
+                                  ": --children needs the name of a file, after which those of "
+                                  "the children are named");
+    }
 }
 
 }  // namespace
@@ -274,38 +507,38 @@ Outcome RecordProgram(const Order& order) {
     const std::string program = order.command.front();
     const std::string executed = System::CheckPreload(program, "recorded");
     const std::string recorder = FindRecorder(order.pools);
+    if (order.children) { CheckCanRecordChildren(order.tracePath); }
     const Signals signals;
-    System::OutputFile file(order.tracePath, {System::FindProgram(program), "-"});
-    file.KeepIfCutShort();
-    Trace::CompactWriter writer([&](std::string_view bytes) { file.Write(bytes); });
-    WriteStart(writer, order);
-    writer.Flush();
-    file.Check();
+    const SharedChannel channel(order);
+    Recording recording(order, order.tracePath, {System::FindProgram(program), "-"},
+                        CommandText(order.command), *channel);
+    recording.Flush();
+    recording.File().Check();
 
-    const SharedChannel channel;
-    channel->by = order.by;
-    channel->depth = order.by == By::Stack ? order.depth : maxDepth;
-    Skip(*channel, order.skipped);
-    Collector collector(*channel, writer, order.pools);
+    const auto children = std::make_unique<Children>(order, *channel);
     const TickRate rate;
     const pid_t child =
         System::Start(order.command, [&] { Prepare(order, channel, recorder, signals); });
-    Follow(child, collector, writer, signals);
-    WriteTimes(writer, *channel, ProcessorSeconds(child), rate);
+    Follow(child, recording, *children, rate, signals);
+    const double own = ProcessorSeconds(child);
+    recording.Finish(own, rate);
     Outcome outcome;
-    waitpid(child, &outcome.waitStatus, 0);
-    writer.Finish();
+    rusage all = {};
+    wait4(child, &outcome.waitStatus, 0, &all);
     if (channel->isTaken == 0 && channel->numExecs == 0) {
         throw System::Failure(System::ownFailure, program +
                                                       ": has run, but did not load the "
                                                       "recorder: nothing recorded");
     }
-    file.Commit();
+    recording.File().Commit();
+    children->Check();
     outcome.isCutByExec = channel->isTaken == 0;
     outcome.isAddressSanitized = System::IsAddressSanitized(executed);
-    outcome.numEvents = collector.NumEvents();
+    outcome.numEvents = recording.NumEvents();
     outcome.numThreads = channel->numThreads;
-    outcome.traceSize = file.Size();
+    outcome.traceSize = recording.File().Size();
+    outcome.numChildren = children->Number();
+    DescribeLost(outcome, *channel, Seconds(all.ru_utime) + Seconds(all.ru_stime) - own);
     return outcome;
 }
 

@@ -18,6 +18,7 @@ struct Order {
     unsigned int depth = 32;           // The most frames of a stack.
     std::vector<std::string> skipped;  // Patterns of functions that are not callers.
     bool pools = false;                // Records the calls of Mgr instead of the heap's.
+    bool children = false;             // Records each child in a file "tracePath.PID".
 };
 
 struct Outcome {
@@ -25,12 +26,17 @@ struct Outcome {
     std::uint64_t numEvents = 0;
     std::uint64_t numThreads = 0;
     std::uint64_t traceSize = 0;
-    bool isCutByExec = false;         // The program was replaced by one that cannot be recorded.
-    bool isAddressSanitized = false;  // The program is built with AddressSanitizer.
+    std::uint64_t numChildren = 0;      // Child processes that are recorded.
+    std::uint64_t numLostChildren = 0;  // Those of the program that are not,
+    std::string lostNames;              // some of the programs that they executed,
+    double lostSeconds = 0;             // and the processor time of all descendants.
+    bool isCutByExec = false;           // The program was replaced by one that cannot be recorded.
+    bool isAddressSanitized = false;    // The program is built with AddressSanitizer.
 };
 
 // Records the program. Signals sent to this process are forwarded to the program. Throws a
-// System::Failure before the program starts, or after its end if the trace could not be written.
+// System::Failure before the program starts, or after its end if a trace could not be written. No
+// existing file is replaced, except that of the program's trace.
 Outcome RecordProgram(const Order& order);
 
 }  // namespace Recorder

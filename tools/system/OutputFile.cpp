@@ -99,4 +99,15 @@ void OutputFile::Commit() {
     Check();
 }
 
+void OutputFile::CommitBeside() {
+    const std::string name = target;
+    const std::string first = temporary;
+    for (int number = 2; error == 0 && link(first.c_str(), target.c_str()) != 0 && errno == EEXIST;
+         ++number) {
+        target = name + "." + std::to_string(number);
+    }
+    Commit();  // Renaming does nothing if both are names of the same file.
+    unlink(first.c_str());
+}
+
 }  // namespace System

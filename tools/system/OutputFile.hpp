@@ -32,6 +32,9 @@ public:
     // The file is complete: gives it its name. Throws a Failure if that or a write has failed.
     void Commit();
 
+    // The same, but replaces no file: if there is one of that name, the name gets a number.
+    void CommitBeside();
+
     // Makes Commit keep what was written before an error, and say where.
     void KeepIfCutShort() { isKept = true; }
 
