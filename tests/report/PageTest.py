@@ -68,8 +68,17 @@ class PageTest(unittest.TestCase):
         trace = os.path.join(cls.folder.name, "trace")
         cls.page = os.path.join(cls.folder.name, "page.html")
         write_trace(trace)
-        made = subprocess.run([MEMPOOL, "report", "--json", "--html", cls.page, trace], check=True,
-                              stdout=subprocess.PIPE)
+        advice = os.path.join(cls.folder.name, "advice.json")
+        advised = subprocess.run([MEMPOOL, "advise", "--json", "--seconds", "1", trace], check=True,
+                                 stdout=subprocess.PIPE)
+        cls.advice = json.loads(advised.stdout)
+        cls.advice["plan"] = {"sentence": "Two pools.", "pools": [
+            {"groups": [HOSTILE] + list("abcd"), "blocks": 4000, "peak_bytes": 98765, "free_alls": 3,
+             "frees_replaced": 3990}]}
+        with open(advice, "w", encoding="utf-8") as out:
+            json.dump(cls.advice, out)
+        made = subprocess.run([MEMPOOL, "report", "--json", "--html", cls.page, "--advice", advice, trace],
+                              check=True, stdout=subprocess.PIPE)
         cls.json = json.loads(made.stdout)
 
         options = webdriver.ChromeOptions()
@@ -122,16 +131,16 @@ class PageTest(unittest.TestCase):
         self.assertEqual(shown["allocation_share"], "25.0 %")
 
         peak, groups = self.json["peak"], self.json["groups"]
-        share = [f"{100 * group['at_peak']['bytes'] / peak['asked']:.0f} % by {group['name']}"
-                 for group in groups[:3]]
+        share = [f"{shown_bytes(group['at_peak']['bytes'])} by {group['name']}" for group in groups[:3]]
         more = 100 * (peak["pools"] / peak["heap_chunks"] - 1)
         self.assertGreater(more, 3)
         self.assertLess(abs(peak["one_pool"] / peak["heap_chunks"] - 1), 0.03)
         self.assertEqual([text.replace("\u00a0", " ") for text in self.texts("#verdict")], [
             f"At the peak the program has requested {shown_bytes(peak['asked'])} in "
-            f"{peak['blocks']:,} blocks: {share[0]}, {share[1]} and {share[2]}. A pool for each group "
-            f"would hold {shown_bytes(peak['pools'])} for them, {more:.0f} % more than the "
-            f"heap’s {shown_bytes(peak['heap_chunks'])}; a single pool for all "
+            f"{peak['blocks']:,} blocks: {share[0]}, {share[1]} and {share[2]}."])
+        self.assertEqual(self.texts("#held-note"), [
+            f"For the blocks at the peak a pool for each group would hold {shown_bytes(peak['pools'])}, "
+            f"{more:.0f} % more than the heap’s {shown_bytes(peak['heap_chunks'])}; a single pool for all "
             f"{shown_bytes(peak['one_pool'])}, about as much as the heap."])
         large = [group for group in groups if group["at_peak"]["bytes"] >= 0.001 * peak["asked"]][:12]
         self.assertEqual(self.texts("#peak text.mark"), [group["name"] for group in large])
@@ -254,6 +263,27 @@ class PageTest(unittest.TestCase):
             "return Array.from(document.querySelectorAll('#stacks rect.frame'), one => ["
             "d3.select(one).datum().name, d3.transform(one.parentNode.getAttribute('transform'))"
             ".translate[1], Number(one.getAttribute('width'))])")}
+
+    def test_advice_is_shown(self):
+        advice, heap = self.advice, self.advice["heap"]
+        self.assertEqual(self.texts("#sentences p"), advice["sentences"])
+        self.assertEqual(self.texts("#environment"), ["\n".join(
+            f"export {name}={value}" for name, value in advice["environment"].items())])
+        rows = sorted(enumerate(advice["settings"]), key=lambda row: row[1]["ns_per_event"] * row[1]["bytes_held"])
+        named = {advice[name]: name for name in ("advised", "best", "smallest", "fastest")}
+        expected = [["heap", "", "", "", "", heap, ""]]
+        if advice["mimalloc"]:
+            expected.append(["mimalloc", "", "", "", "", advice["mimalloc"], ""])
+        expected += [[f"{row['bucket_size']:,}", f"{row['max_record_size']:,}", str(row["min_record_size"]),
+                      str(row["data_alignment"]), "kept" if row["keep_empty_buckets"] else "released", row,
+                      ", ".join(name for name in ("fastest", "smallest", "best", "advised") if advice[name] == i)]
+                     for place, (i, row) in enumerate(rows) if place < 8 or i in named]
+        self.assertEqual(self.texts("#settings-table tbody td"), [text for row in expected for text in (
+            *row[:5], f"{row[5]['ns_per_event']:.1f}", f"{row[5]['ns_per_event'] / heap['ns_per_event']:.2f}",
+            shown_bytes(row[5]["bytes_held"]), f"{row[5]['bytes_held'] / heap['bytes_held']:.2f}", row[6])])
+
+        self.assertEqual(self.texts("#plan, #plan-table tbody td"), [
+            "Two pools.", f"{HOSTILE}, a, b, c and 1 more", "4,000", "98.8 KB", "3", "3,990"])
 
     def test_groups_sort_and_filter(self):
         groups = self.json["groups"]

@@ -134,6 +134,16 @@ TEST(Report, WritesAPage) {
         data.replace(place, escape.size(), "<");
     }
     EXPECT_EQ(data + "\n", Tool("--json small"));
+    std::ofstream(Path("advice")) << R"({"sentences": ["</script>"], "settings": []})";
+    EXPECT_THAT(
+        Tool("--html - --advice advice small"),
+        HasSubstr(R"(id="advice">{"sentences":["\u003c/script>"],"settings":[]}</script>)"));
+    EXPECT_EQ(Tool("--html page.html --advice small small", 1),
+              "mempool: small: is not the output of 'mempool advise --json'\n");
+    EXPECT_EQ(Tool("--html page.html --advice lost small", 1),
+              "mempool: lost: No such file or directory\n");
+    EXPECT_EQ(Tool("--html advice --advice advice small", 1),
+              "mempool: advice: input and output are the same file\n");
     EXPECT_EQ(Tool("--html no/where small", 1), "mempool: no/where: No such file or directory\n");
     EXPECT_EQ(Tool("--html small small", 1),
               "mempool: small: input and output are the same file\n");

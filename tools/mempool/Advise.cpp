@@ -1,5 +1,7 @@
 // mempool advise: searches for the settings of the pools that suit a trace.
 
+#include "mempool/Advise.hpp"
+
 #include <cstdlib>
 #include <iostream>
 #include <memory>
@@ -119,7 +121,7 @@ int AdviseOn(const Options& options) {
                            [&](const std::string& text) { progress.Show(text); });
     progress.Clear();
     if (options.json) {
-        std::cout << JsonOf(advice).dump(2) << '\n';
+        std::cout << AdviceAsJson(advice) << '\n';
     } else {
         std::cout << reader.Name() << '\n';
         PrintBadLines(std::cout, reader.Name(), reader.Bad());
@@ -132,6 +134,10 @@ int AdviseOn(const Options& options) {
 }
 
 }  // namespace
+
+std::string AdviceAsJson(const Advise::Advice& advice) {
+    return JsonOf(advice).dump(2);
+}
 
 void AddAdvise(Program& program) {
     CLI::App& advise = *program.commandLine.add_subcommand("advise", description);

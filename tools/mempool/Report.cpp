@@ -2,13 +2,17 @@
 
 #include "mempool/Report.hpp"
 
+#include <cerrno>
 #include <cstdlib>
 #include <exception>
+#include <fstream>
 #include <iostream>
 #include <memory>
 #include <new>
 #include <stdexcept>
 #include <string>
+
+#include <nlohmann/json.hpp>
 
 #include "mempool/Print.hpp"
 #include "mempool/Program.hpp"
@@ -18,6 +22,7 @@
 #include "report/Analysis.hpp"
 #include "report/Json.hpp"
 #include "report/Page.hpp"
+#include "system/ExitStatus.hpp"
 #include "trace/OpenTrace.hpp"
 #include "trace/StepReader.hpp"
 
@@ -66,10 +71,24 @@ struct Options {
     bool folded = false;
     std::string html;  // The file of the page; "-" writes only the page, to standard output. Empty
                        // for no page.
+    std::string advice;  // The file with the advice for the page; empty for none.
 };
 
+// The JSON of an advice from its file.
+std::string ReadAdvice(const std::string& path) {
+    if (path.empty()) { return "null"; }
+    std::ifstream file(path);
+    if (!file) { throw System::Failure(EXIT_FAILURE, path, errno); }
+    const auto advice = nlohmann::ordered_json::parse(file, nullptr, false);
+    if (!advice.is_object() || !advice.contains("sentences") || !advice.contains("settings")) {
+        throw std::runtime_error(path + ": is not the output of 'mempool advise --json'");
+    }
+    return advice.dump();
+}
+
 // Returns the exit status.
-int WriteReport(Trace::StepReader& reader, const Options& options, System::OutputFile* page) {
+int WriteReport(Trace::StepReader& reader, const Options& options, const std::string& advice,
+                System::OutputFile* page) {
     CheckSettings(options.settings);
     const Report::Analysis analysis =
         AnalyseTrace(reader, options.path, options.settings, options.skipped);
@@ -77,7 +96,7 @@ int WriteReport(Trace::StepReader& reader, const Options& options, System::Outpu
         throw std::runtime_error(reader.Name() + ": has no call stacks: record it with --stacks");
     }
     if (options.html == "-") {
-        WritePage(*page, analysis);
+        WritePage(*page, analysis, advice);
         return WarnOfBrokenTrace(reader);
     }
     if (options.folded) {
@@ -88,15 +107,16 @@ int WriteReport(Trace::StepReader& reader, const Options& options, System::Outpu
         PrintAnalysis(std::cout, analysis, options.all ? Extent::All : Extent::Page);
     }
     std::cout << std::flush;
-    if (page != nullptr) { WritePage(*page, analysis); }
+    if (page != nullptr) { WritePage(*page, analysis, advice); }
     return WarnOfBrokenTrace(reader);
 }
 
 int ReportOn(const Options& options) {
     try {
         Trace::StepReader reader(options.path);
-        const auto page = OpenPage(options.html, {options.path});
-        return WriteReport(reader, options, page.get());
+        const std::string advice = ReadAdvice(options.advice);
+        const auto page = OpenPage(options.html, {options.path, options.advice});
+        return WriteReport(reader, options, advice, page.get());
     } catch (const std::bad_alloc&) {
         std::cerr << "mempool: " << options.path << ": out of memory\n";
     }
@@ -126,8 +146,9 @@ std::unique_ptr<System::OutputFile> OpenPage(const std::string& path,
     return std::make_unique<System::OutputFile>(path, inputs);
 }
 
-void WritePage(System::OutputFile& file, const Report::Analysis& analysis) {
-    file.Write(Report::MakePage(analysis));
+void WritePage(System::OutputFile& file, const Report::Analysis& analysis,
+               const std::string& advice) {
+    file.Write(Report::MakePage(analysis, advice));
     file.Commit();
 }
 
@@ -144,6 +165,11 @@ void AddReport(Program& program) {
             "--html", options->html,
             "Also write a page with charts to FILE; - writes only the page, to standard output")
         ->type_name("FILE");
+    report
+        .add_option("--advice", options->advice,
+                    "Show the advice in FILE, from 'mempool advise --json', on the page")
+        ->type_name("FILE")
+        ->needs("--html");
     report
         .add_flag("--folded", options->folded,
                   "Print the call stacks at the peak for flame graph tools")

@@ -22,7 +22,9 @@ Report::Analysis AnalyseTrace(Trace::StepReader& reader, const std::string& path
 std::unique_ptr<System::OutputFile> OpenPage(const std::string& path,
                                              const std::vector<std::string>& inputs);
 
-void WritePage(System::OutputFile& file, const Report::Analysis& analysis);
+// `advice` is the JSON of `mempool advise`, or "null".
+void WritePage(System::OutputFile& file, const Report::Analysis& analysis,
+               const std::string& advice);
 
 }  // namespace Tool
 

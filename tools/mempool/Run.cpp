@@ -15,6 +15,7 @@
 
 #include "advise/Advice.hpp"
 #include "mempool/AdviceText.hpp"
+#include "mempool/Advise.hpp"
 #include "mempool/CommandLine.hpp"
 #include "mempool/Print.hpp"
 #include "mempool/Program.hpp"
@@ -90,16 +91,17 @@ Trace::StepReader Open(const NamelessFile& trace, const Options& options) {
     return {Trace::OpenTrace(trace.Path()), options.order.command.front()};
 }
 
-void ReportOn(const NamelessFile& trace, const Options& options, System::OutputFile* page) {
+Report::Analysis ReportOn(const NamelessFile& trace, const Options& options) {
     Trace::StepReader reader = Open(trace, options);
-    const Report::Analysis analysis =
+    Report::Analysis analysis =
         AnalyseTrace(reader, trace.Path(), OBR::MemPool::PoolSettings(), {});
     std::cerr << '\n';
     PrintAnalysis(std::cerr, analysis, Extent::Short);
-    if (page != nullptr) { WritePage(*page, analysis); }
+    return analysis;
 }
 
-void AdviseOn(const NamelessFile& trace, const Options& options) {
+// Returns the advice as JSON.
+std::string AdviseOn(const NamelessFile& trace, const Options& options) {
     Trace::StepReader reader = Open(trace, options);
     const Progress progress("mempool");
     const Advise::Advice advice =
@@ -115,6 +117,7 @@ void AdviseOn(const NamelessFile& trace, const Options& options) {
         std::cerr << "\nTo try it:\n\n    " << TryCommand(advised.settings, options.order.command)
                   << '\n';
     }
+    return AdviceAsJson(advice);
 }
 
 int Run(Options options) {
@@ -128,12 +131,14 @@ int Run(Options options) {
     } catch (const System::Failure& failure) {
         throw System::Failure(failure.Status(), trace.Named(failure.what()));
     }
-    ReportOn(trace, options, page.get());
+    const Report::Analysis analysis = ReportOn(trace, options);
+    std::string advice = "null";
     try {
-        if (!outcome.isCutByExec) { AdviseOn(trace, options); }
+        if (!outcome.isCutByExec) { advice = AdviseOn(trace, options); }
     } catch (const std::exception& error) {
         std::cerr << "mempool: no advice: " << error.what() << '\n';
     }
+    if (page != nullptr) { WritePage(*page, analysis, advice); }
     return System::EndLike(outcome.waitStatus);
 }
 
@@ -145,7 +150,8 @@ void AddRun(Program& program) {
     AddCommand(program, run);
     const auto options = std::make_shared<Options>();
     AddRecordOptions(run, options->order);
-    run.add_option("--html", options->html, "Also write the report to FILE, as a page with charts")
+    run.add_option("--html", options->html,
+                   "Also write the report and the advice to FILE, as a page with charts")
         ->type_name("FILE");
     AddLayer(run, options->layer);
     AddSeconds(run, options->seconds);

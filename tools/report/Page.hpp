@@ -15,7 +15,8 @@ namespace Report {
 void CheckCanMakePage();
 
 // If there are very many groups, the page has only the largest, so that it stays below 5 MB.
-std::string MakePage(const Analysis& analysis);
+// `advice` is the JSON of `mempool advise`, or "null".
+std::string MakePage(const Analysis& analysis, const std::string& advice);
 
 // The page before and after the data, from a file that the build makes.
 std::string_view PageHead();

@@ -3,6 +3,7 @@
 "use strict";
 
 const data = JSON.parse(document.getElementById("data").textContent);
+const advice = JSON.parse(document.getElementById("advice").textContent);  // Of mempool advise, or null.
 
 // Numbers as in the text report: 1,234,567; three digits and a unit; a share in percent.
 
@@ -34,13 +35,13 @@ const sizeText = (row) =>
 const tracedPools = sum(data.groups.map((group) => group.pools));
 const colours = ["#4e79a7", "#f28e2b", "#59a14f", "#b07aa1", "#e15759", "#76b7b2", "#edc948", "#9c755f", "#ff9da7", "#9aa0a6"];
 
-// Removes template arguments and, if the name is still too long, its middle.
+// A name; if it is too long, with "<…>" for template arguments and then without its middle.
 function shortName(name, most) {
   for (let longer = ""; name.length > most && name !== longer;) {
     longer = name;
-    name = name.replace(/<[^<>]*>/g, "");
+    name = name.replace(/<[^<>]*>/g, "\0");
   }
-  const letters = Array.from(name);
+  const letters = Array.from(name.replace(/\0/g, "<…>"));
   if (letters.length <= most) { return name; }
   const tail = Math.floor((most - 1) / 2);
   return letters.slice(0, most - 1 - tail).join("") + "…" + letters.slice(-tail).join("");
@@ -49,7 +50,7 @@ function shortName(name, most) {
 // Lets a long name break at its punctuation.
 function breakable(selection) {
   selection.each(function () {
-    const parts = this.textContent.split(/(?<=[^\w\s([{<])|(?=[([{<])/);
+    const parts = this.textContent.split(/(?<=[^\w\s([{<])(?![\d\s])|(?=[([{<])/);
     this.replaceChildren(...parts.flatMap((part) => [part, document.createElement("wbr")]));
   });
 }
@@ -182,10 +183,10 @@ function heading() {
   byId("banners").selectAll("p").data(banners).enter().append("p").attr("class", "banner").text(String);
 }
 
-// "65 % of it by parse, 20 % by lex": the groups that hold most of the peak, if there are several.
+// "65.1 MB by parse, 20.0 MB by lex": the groups that hold most of the peak, if there are several.
 function holders() {
   const shares = data.groups.filter((group) => group.at_peak.bytes >= 0.05 * data.peak.asked).slice(0, 3)
-    .map((group) => `${(100 * group.at_peak.bytes / data.peak.asked).toFixed(0)} % by ${shortName(group.name, 60)}`);
+    .map((group) => `${bytes(group.at_peak.bytes)} by ${shortName(group.name, 60)}`);
   if (data.num_groups < 2 || shares.length === 0) { return ""; }
   return ": " + (shares.length > 1 ? shares.slice(0, -1).join(", ") + " and " : "") + shares[shares.length - 1];
 }
@@ -199,12 +200,13 @@ function verdict() {
   };
   const heap = `the heap’s ${bytes(peak.heap_chunks)}`;
   const text = data.blocks === 0 ? "The trace has no block." :
-    `At the peak the program has requested ${bytes(peak.asked)} in ${count(peak.blocks)} blocks${holders()}. ` +
-    (tracedPools > 1
-      ? `A pool for each group would hold ${bytes(peak.pools)} for them, ${beside(peak.pools)} ${heap}; ` +
-        `a single pool for all ${bytes(peak.one_pool)}, ${beside(peak.one_pool)} the heap.`
-      : `Pools would hold ${bytes(peak.pools)} for them, ${beside(peak.pools)} ${heap}.`);
+    `At the peak the program has requested ${bytes(peak.asked)} in ${count(peak.blocks)} blocks${holders()}.`;
   byId("verdict").text(text.replace(/(\d) /g, "$1\u00a0"));  // No line break before a unit.
+  breakable(byId("verdict"));
+  byId("held-note").text("For the blocks at the peak " + (tracedPools > 1
+    ? `a pool for each group would hold ${bytes(peak.pools)}, ${beside(peak.pools)} ${heap}; ` +
+      `a single pool for all ${bytes(peak.one_pool)}, ${beside(peak.one_pool)} the heap.`
+    : `pools would hold ${bytes(peak.pools)}, ${beside(peak.pools)} ${heap}.`));
 
   const tile = (name, path, show, note) => {
     const place = byId("tiles").append("div");
@@ -226,6 +228,48 @@ function verdict() {
     `${data.settings.min_record_size} to ${data.settings.max_record_size}, sizes rounded to ` +
     `${data.settings.data_alignment}, empty buckets ` +
     (data.settings.keep_empty_buckets ? "kept" : "released"));
+}
+
+// The advice: the verdict, the lines to set, and a row for the heap and for each of the best settings.
+
+function pools() {
+  if (advice === null) { return; }
+  byId("no-advice").attr("hidden", "");
+  byId("with-advice").attr("hidden", null);
+  byId("sentences").selectAll("p").data(advice.sentences).enter().append("p").text(String);
+  const lines = Object.keys(advice.environment).map((name) => `export ${name}=${advice.environment[name]}`);
+  byId("environment").attr("hidden", lines.length > 0 ? null : "").text(lines.join("\n"));
+  const cost = (row) => row.ns_per_event * row.bytes_held;
+  const names = advice.settings.map((row, i) =>
+    ["fastest", "smallest", "best", "advised"].filter((name) => advice[name] === i).join(", "));
+  const order = d3.range(advice.settings.length).sort((a, b) => cost(advice.settings[a]) - cost(advice.settings[b]));
+  const shown = order.filter((i, place) => place < 8 || names[i] !== "");
+  const figures = (row) => [row.ns_per_event.toFixed(1), (row.ns_per_event / advice.heap.ns_per_event).toFixed(2),
+    bytes(row.bytes_held), (row.bytes_held / advice.heap.bytes_held).toFixed(2)];
+  const others = [["heap", advice.heap], ["mimalloc", advice.mimalloc]].filter((other) => other[1] !== null);
+  table("settings-table", ["Bucket size", "Max record", "Min record", "Alignment", "Empty buckets", "ns per event",
+    "Of the heap’s", "Bytes held", "Of the heap’s", ""],
+    others.map((other) => [other[0], "", "", "", ""].concat(figures(other[1]), "")).concat(shown.map((i) => {
+      const row = advice.settings[i];
+      return [count(row.bucket_size), count(row.max_record_size), row.min_record_size, row.data_alignment,
+        row.keep_empty_buckets ? "kept" : "released"].concat(figures(row), names[i]);
+    })));
+  byId("settings-table").selectAll("tbody tr").filter((row) => String(row[9]).includes("advised")).attr("class", "advised");
+  const left = advice.settings.length - shown.length;
+  byId("settings-note").text(`The trace replayed on ${advice.layer === "mgr" ? "a bare Mgr" : advice.layer === "malloc"
+    ? "the pools that mempool try preloads" : "a Heap"}, in turns with the heap.` +
+    (left > 0 ? ` ${left} more settings were tried.` : ""));
+}
+
+// The advised plan: groups that should share a pool.
+function plan() {
+  if (advice === null || !advice.plan) { return; }
+  byId("plan-part").attr("hidden", null);
+  byId("plan").text(advice.plan.sentence);
+  const groupsOf = (pool) => pool.groups.slice(0, 4).map((name) => shortName(name, 60)).join(", ") +
+    (pool.groups.length > 4 ? ` and ${pool.groups.length - 4} more` : "");
+  table("plan-table", ["Group", "Blocks", "Peak", "Calls of FreeAll", "Frees replaced"], advice.plan.pools.map((pool) =>
+    [groupsOf(pool), count(pool.blocks), bytes(pool.peak_bytes), count(pool.free_alls), count(pool.frees_replaced)]));
 }
 
 // The groups at the peak, a bar each. Groups that are in the chart of live bytes have the same colour.
@@ -656,6 +700,8 @@ function charts() {
 
 heading();
 verdict();
+pools();
+plan();
 tables();
 groupsTable();
 unitChoice();
