@@ -12,8 +12,8 @@
 
 #include "advise/Advice.hpp"
 #include "mempool/AdviceText.hpp"
+#include "mempool/CommandLine.hpp"
 #include "mempool/Print.hpp"
-#include "mempool/Program.hpp"
 #include "mempool/Progress.hpp"
 #include "mempool/Settings.hpp"
 #include "trace/StepReader.hpp"
@@ -140,17 +140,13 @@ std::string AdviceAsJson(const Advise::Advice& advice) {
 }
 
 void AddAdvise(Program& program) {
-    CLI::App& advise = *program.commandLine.add_subcommand("advise", description);
-    advise.footer(notes);
+    Subcommand advise(program, "advise", description, notes);
     const auto options = std::make_shared<Options>();
-    advise.add_option("TRACE", options->path, "File to replay; - is standard input")
-        ->required()
-        ->type_name("");
-    advise.add_flag("--json", options->json, "Print all figures as JSON");
+    advise.AddTrace(options->path, "File to replay; - is standard input");
+    advise.AddFlag("--json", options->json, "Print all figures as JSON");
     AddLayer(advise, options->layer);
     AddSeconds(advise, options->seconds);
-    advise.callback(
-        [&program, options] { program.job = [options] { return AdviseOn(*options); }; });
+    advise.SetJob([options] { return [options] { return AdviseOn(*options); }; });
 }
 
 }  // namespace Tool

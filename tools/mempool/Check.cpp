@@ -9,6 +9,7 @@
 #include <iostream>
 #include <map>
 #include <memory>
+#include <optional>
 #include <stdexcept>
 #include <string>
 #include <string_view>
@@ -17,7 +18,6 @@
 #include <MemPoolSettings>
 
 #include "mempool/CommandLine.hpp"
-#include "mempool/Program.hpp"
 #include "system/Child.hpp"
 #include "system/Descriptor.hpp"
 #include "system/ExitStatus.hpp"
@@ -63,7 +63,7 @@ const std::map<std::string, With> checkers = {
     {"asan", With::asan}, {"valgrind", With::valgrind}, {"nothing", With::nothing}};
 
 struct Options {
-    std::string with;  // A name of `checkers`, or empty.
+    std::optional<With> with;
     unsigned int alignment = 1;
 };
 
@@ -103,7 +103,7 @@ With Choose(const Options& options, const HostFile& host, const std::string& pro
     const With fitting = host.isSanitized ? With::asan
                          : hasValgrind    ? With::valgrind
                                           : With::nothing;
-    const With with = options.with.empty() ? fitting : checkers.at(options.with);
+    const With with = options.with.value_or(fitting);
     if (with == With::asan && !host.isSanitized && !host.isScript) {
         throw std::runtime_error(program + " is not built with -fsanitize=address");
     }
@@ -168,20 +168,15 @@ void SetEnvironment(const Options& options) {
 }  // namespace
 
 void AddCheck(Program& program) {
-    CLI::App& check = *program.commandLine.add_subcommand("check", description);
-    check.footer(notes);
+    Subcommand check(program, "check", description, notes);
     constexpr OBR::MemPool::Setting alignment = OBR::MemPool::SettingTable::dataAlignment;
-    AddCommand(program, check);
+    check.AddCommand();
     const auto options = std::make_shared<Options>();
-    check.add_option("--with", options->with, "The checker that the program runs under")
-        ->type_name("CHECKER")
-        ->check(CLI::IsMember(&checkers));
-    AddNumber(check, alignment.option, options->alignment, 1, 64, alignment.help)
-        .type_name("BYTES");
-    check.callback([&program, options] {
-        const std::vector<std::string> command = program.command;
-        if (command.empty()) { throw CLI::RequiredError("PROGRAM"); }
-        program.job = [options, command]() -> int { Check(*options, command); };
+    check.AddChoice("--with", checkers, options->with, "CHECKER",
+                    "The checker that the program runs under");
+    check.AddNumber(alignment.option, options->alignment, 1, 64, alignment.help, "BYTES");
+    check.SetJob([&program, options] {
+        return [options, command = program.command]() -> int { Check(*options, command); };
     });
 }
 

@@ -8,11 +8,17 @@
 #include <numeric>
 #include <utility>
 
+#include <CLI/CLI.hpp>
+
 #include "system/ExitStatus.hpp"
 
 namespace Tool {
 
 namespace {
+
+constexpr const char* description =
+    R"(Shows where a program's memory is, what memory pools would gain, which settings suit the program,
+and its faults in the use of pools. Start with 'mempool run PROGRAM'.)";
 
 // Formats the help for users. CLI11's own format shows details of the parser.
 class Help final : public CLI::Formatter {
@@ -123,8 +129,16 @@ std::string Problem(const CLI::App& app, const CLI::ParseError& error) {
 
 }  // namespace
 
+Program::Program() : commandLine(std::make_unique<CLI::App>(description, "mempool")) {
+    commandLine->set_help_flag("-h,--help", "Print this help");
+    commandLine->set_version_flag("-V,--version", "mempool " MEMPOOL_VERSION, "Print the version");
+    commandLine->require_subcommand(1);
+}
+
+Program::~Program() = default;
+
 bool ReadCommandLine(Program& program, std::vector<std::string> words, int& status) {
-    CLI::App& app = program.commandLine;
+    CLI::App& app = *program.commandLine;
     app.add_subcommand("help", "Print the help of mempool, or of a subcommand")
         ->add_option("SUBCOMMAND")
         ->type_name("");
@@ -156,20 +170,14 @@ bool ReadCommandLine(Program& program, std::vector<std::string> words, int& stat
         } catch (const CLI::Success& success) {
             status = app.exit(success);
             return false;
-        } catch (const CLI::ParseError& error) { problem = Problem(asked, error); }
+        } catch (const CLI::ParseError& error) {
+            problem = Problem(asked, error);
+        } catch (const UsageError& error) { problem = error.what(); }
     }
     std::cerr << "mempool: " << problem << "\nSee 'mempool "
               << (sub == names.end() ? "" : first + " ") << "--help'.\n";
     status = program.failure;
     return false;
-}
-
-void AddCommand(Program& program, CLI::App& subcommand) {
-    // Only for the help: CutCommand has removed these words.
-    subcommand.add_option("PROGRAM", program.command, "The program to run and its arguments")
-        ->type_name("[ARGS...]")
-        ->expected(0, 1);
-    program.runners.push_back(&subcommand);
 }
 
 unsigned int ParseNumber(const std::string& name, const std::string& text, unsigned int smallest,
@@ -178,26 +186,95 @@ unsigned int ParseNumber(const std::string& name, const std::string& text, unsig
     const char* const end = text.data() + text.size();
     const auto result = std::from_chars(text.data(), end, number);
     if (result.ptr != end || result.ec == std::errc::invalid_argument) {
-        throw CLI::ValidationError(name, "'" + text + "' is not a number");
+        throw UsageError(name + ": '" + text + "' is not a number");
     }
     if (result.ec != std::errc() || number < smallest || number > largest) {
-        throw CLI::ValidationError(name, text + " is not between " + std::to_string(smallest) +
-                                             " and " + std::to_string(largest));
+        throw UsageError(name + ": " + text + " is not between " + std::to_string(smallest) +
+                         " and " + std::to_string(largest));
     }
     return static_cast<unsigned int>(number);
 }
 
-CLI::Option& AddNumber(CLI::App& subcommand, const std::string& name, unsigned int& place,
-                       unsigned int smallest, unsigned int largest, const std::string& help) {
-    return *subcommand
-                .add_option_function<std::string>(
-                    name,
-                    [&place, name, smallest, largest](const std::string& text) {
-                        place = ParseNumber(name, text, smallest, largest);
-                    },
-                    help)
-                ->type_name("N")
-                ->default_str(std::to_string(place));
+Subcommand::Subcommand(Program& allOfIt, const char* name, const char* description,
+                       const char* notes)
+    : program(allOfIt), app(*allOfIt.commandLine->add_subcommand(name, description)) {
+    app.footer(notes);
+}
+
+void Subcommand::AddCommand() {
+    // Only for the help: CutCommand has removed these words.
+    app.add_option("PROGRAM", program.command, "The program to run and its arguments")
+        ->type_name("[ARGS...]")
+        ->expected(0, 1);
+    program.runners.push_back(&app);
+}
+
+void Subcommand::AddTrace(std::string& path, const char* help) {
+    app.add_option("TRACE", path, help)->required()->type_name("");
+}
+
+void Subcommand::AddTraces(std::vector<std::string>& paths, const char* help) {
+    app.add_option("TRACE", paths, help)->required()->type_name("");
+}
+
+void Subcommand::AddFlag(const char* name, bool& place, const char* help) {
+    app.add_flag(name, place, help);
+}
+
+void Subcommand::AddNumber(const char* name, unsigned int& place, unsigned int smallest,
+                           unsigned int largest, const std::string& help, const char* type) {
+    const std::string option = name;
+    app.add_option_function<std::string>(
+           name,
+           [&place, option, smallest, largest](const std::string& text) {
+               place = ParseNumber(option, text, smallest, largest);
+           },
+           help)
+        ->type_name(type)
+        ->default_str(std::to_string(place));
+}
+
+void Subcommand::AddText(const char* name, std::string& place, const char* type, const char* help) {
+    app.add_option(name, place, help)->type_name(type)->capture_default_str();
+}
+
+void Subcommand::AddPatterns(const char* name, std::vector<std::string>& places, const char* help) {
+    app.add_option(name, places, help)
+        ->type_name("PATTERN")
+        ->allow_extra_args(false)
+        ->check([](const std::string& pattern) {
+            return std::string(pattern.empty() ? "the pattern is empty" : "");
+        });
+}
+
+void Subcommand::AddName(const char* name, const std::vector<std::string>& choices,
+                         const std::string& standard, const char* type, const char* help,
+                         const std::function<void(const std::string&)>& take) {
+    app.add_option_function<std::string>(name, take, help)
+        ->type_name(type)
+        ->check(CLI::IsMember(choices).description(""))
+        ->default_str(standard);
+}
+
+void Subcommand::AddOptionalValue(const char* name, const char* type, const char* help,
+                                  const std::function<void(const std::string&)>& take) {
+    app.add_option_function<std::string>(name, take, help)->type_name(type)->expected(0, 1);
+}
+
+void Subcommand::Exclude(const char* name, std::initializer_list<const char*> others) {
+    for (const char* other : others) { app.get_option(name)->excludes(app.get_option(other)); }
+}
+
+bool Subcommand::IsGiven(const std::string& option) const {
+    return app.count(option) != 0;
+}
+
+void Subcommand::SetJob(const std::function<std::function<int()>()>& prepare) {
+    const bool isRunner = !program.runners.empty() && program.runners.back() == &app;
+    app.callback([&all = program, prepare, isRunner] {
+        if (isRunner && all.command.empty()) { throw UsageError("PROGRAM is required"); }
+        all.job = prepare();
+    });
 }
 
 }  // namespace Tool

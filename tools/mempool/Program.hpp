@@ -6,15 +6,23 @@
 
 #include <cstdlib>
 #include <functional>
+#include <memory>
 #include <string>
 #include <vector>
 
-#include <CLI/CLI.hpp>
+namespace CLI {
+class App;
+}
 
 namespace Tool {
 
 struct Program {
-    CLI::App commandLine;
+    Program();
+    Program(const Program&) = delete;
+    Program& operator=(const Program&) = delete;
+    ~Program();
+
+    const std::unique_ptr<CLI::App> commandLine;
     std::function<int()> job;              // Of the chosen subcommand; returns the exit status.
     int failure = EXIT_FAILURE;            // The exit status of a failure of the subcommand itself.
     std::vector<const CLI::App*> runners;  // The subcommands that run a program.

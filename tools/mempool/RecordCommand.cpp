@@ -4,7 +4,6 @@
 
 #include <unistd.h>
 
-#include <algorithm>
 #include <iostream>
 #include <map>
 #include <memory>
@@ -77,38 +76,28 @@ int Run(const Recorder::Order& order) {
 
 }  // namespace
 
-void AddRecordOptions(CLI::App& subcommand, Recorder::Order& order) {
+void AddRecordOptions(Subcommand& subcommand, Recorder::Order& order) {
     static const std::map<std::string, Recorder::By> names = {{"all", Recorder::By::All},
                                                               {"caller", Recorder::By::Caller},
                                                               {"module", Recorder::By::Module},
                                                               {"thread", Recorder::By::Thread}};
-    CLI::Option* const by = subcommand.add_option_function<std::string>(
-        "--by", [&order](const std::string& name) { order.by = names.at(name); },
+    subcommand.AddChoice(
+        "--by", names, order.by, "GROUP",
         "What makes a group, a traced pool of its own: all, caller, module or thread");
-    by->type_name("GROUP")
-        ->check(CLI::IsMember(names).description(""))
-        ->default_str(std::find_if(names.begin(), names.end(), [&](const auto& each) {
-                          return each.second == order.by;
-                      })->first);
-    CLI::Option* const skip = subcommand.add_option(
+    subcommand.AddPatterns(
         "--skip", order.skipped,
         "Functions whose symbols match PATTERN are not callers; may be repeated");
-    skip->type_name("PATTERN")->allow_extra_args(false)->check([](const std::string& pattern) {
-        return std::string(pattern.empty() ? "the pattern is empty" : "");
-    });
-    CLI::Option* const stacks = subcommand.add_option_function<std::string>(
-        "--stacks",
+    subcommand.AddOptionalValue(
+        "--stacks", "[=DEPTH]", "Make a group of each call stack, of its innermost DEPTH frames",
         [&order](const std::string& depth) {
             order.by = Recorder::By::Stack;
             if (!depth.empty()) {
                 order.depth = ParseNumber("--stacks", depth, 1, Recorder::maxDepth);
             }
-        },
-        "Make a group of each call stack, of its innermost DEPTH frames");
-    stacks->type_name("[=DEPTH]")->expected(0, 1)->excludes(by)->excludes(skip);
-    subcommand.add_flag("--pools", order.pools, "Record the pools of libObrMemPool, not the heap")
-        ->excludes(by)
-        ->excludes(stacks);
+        });
+    subcommand.Exclude("--stacks", {"--by", "--skip"});
+    subcommand.AddFlag("--pools", order.pools, "Record the pools of libObrMemPool, not the heap");
+    subcommand.Exclude("--pools", {"--by", "--stacks"});
 }
 
 Recorder::Outcome RecordAsOrdered(const Recorder::Order& order) {
@@ -145,23 +134,18 @@ Recorder::Outcome RecordAsOrdered(const Recorder::Order& order) {
 }
 
 void AddRecord(Program& program) {
-    CLI::App& record = *program.commandLine.add_subcommand("record", description);
-    record.footer(notes);
-    AddCommand(program, record);
+    Subcommand record(program, "record", description, notes);
+    record.AddCommand();
     const auto order = std::make_shared<Recorder::Order>();
     order->tracePath = "mempool.trace";
-    record
-        .add_option("-o,--output", order->tracePath,
-                    "The trace to write, replacing the file; - is standard output")
-        ->type_name("FILE")
-        ->capture_default_str();
+    record.AddText("-o,--output", order->tracePath, "FILE",
+                   "The trace to write, replacing the file; - is standard output");
     AddRecordOptions(record, *order);
-    record.add_flag("--children", order->children,
-                    "Record each child process too, in a file of its own");
-    record.callback([&program, order] {
+    record.AddFlag("--children", order->children,
+                   "Record each child process too, in a file of its own");
+    record.SetJob([&program, order] {
         order->command = program.command;
-        if (order->command.empty()) { throw CLI::RequiredError("PROGRAM"); }
-        program.job = [order] { return Run(*order); };
+        return [order] { return Run(*order); };
     });
 }
 

@@ -3,13 +3,13 @@
 #ifndef OBR_TOOLS_MEMPOOL_RECORDCOMMAND_HPP
 #define OBR_TOOLS_MEMPOOL_RECORDCOMMAND_HPP
 
-#include "mempool/Program.hpp"
+#include "mempool/CommandLine.hpp"
 #include "record/Session.hpp"
 
 namespace Tool {
 
 // Adds the options of a recording: the groups, and whether the heap or pools are recorded.
-void AddRecordOptions(CLI::App& subcommand, Recorder::Order& order);
+void AddRecordOptions(Subcommand& subcommand, Recorder::Order& order);
 
 // Records the program. Warns on standard error if the trace is not what the user may expect.
 Recorder::Outcome RecordAsOrdered(const Recorder::Order& order);

@@ -19,7 +19,6 @@
 #include "mempool/AdviceText.hpp"
 #include "mempool/CommandLine.hpp"
 #include "mempool/Print.hpp"
-#include "mempool/Program.hpp"
 #include "mempool/Progress.hpp"
 #include "mempool/Settings.hpp"
 #include "mempool/Table.hpp"
@@ -158,39 +157,32 @@ int ReplayAll(const Options& options) {
 }
 
 // A sweep chooses its own settings, and only a sweep has --seconds.
-void CheckSweep(const CLI::App& replay, bool isSweep) {
+void CheckSweep(const Subcommand& replay, bool isSweep) {
     std::vector<std::string> others = {"--rounds", "--dbg"};
     for (const auto& row : OBR::MemPool::SettingTable::all) { others.emplace_back(row.option); }
     for (const std::string& option : others) {
-        if (isSweep && replay.count(option) != 0) { throw CLI::ExcludesError("--sweep", option); }
+        if (isSweep && replay.IsGiven(option)) { throw UsageError("--sweep excludes " + option); }
     }
-    if (!isSweep && replay.count("--seconds") != 0) {
-        throw CLI::RequiresError("--seconds", "--sweep");
-    }
+    if (!isSweep && replay.IsGiven("--seconds")) { throw UsageError("--seconds requires --sweep"); }
 }
 
 }  // namespace
 
 void AddReplay(Program& program) {
-    CLI::App& replay = *program.commandLine.add_subcommand("replay", description);
-    replay.footer(notes);
+    Subcommand replay(program, "replay", description, notes);
     const auto options = std::make_shared<Options>();
-    replay
-        .add_option("TRACE", options->paths,
-                    "Files to replay, one after the other; - is standard input")
-        ->required()
-        ->type_name("");
+    replay.AddTraces(options->paths, "Files to replay, one after the other; - is standard input");
     AddLayer(replay, options->layer);
     AddSettings(replay, options->settings);
-    AddNumber(replay, "--rounds", options->rounds, 1, 1000000, "Timed replays of each side");
-    replay.add_flag("--dbg", options->dbg, "Print the report of each pool at the peak");
-    replay.add_flag("--sweep", options->sweep,
-                    "Try many settings instead of one, and print a table of them");
+    replay.AddNumber("--rounds", options->rounds, 1, 1000000, "Timed replays of each side");
+    replay.AddFlag("--dbg", options->dbg, "Print the report of each pool at the peak");
+    replay.AddFlag("--sweep", options->sweep,
+                   "Try many settings instead of one, and print a table of them");
     AddSeconds(replay, options->seconds);
-    replay.callback([&program, &replay, options] {
+    replay.SetJob([replay, options] {
         CheckSweep(replay, options->sweep);
         TakeEnvironment(replay, options->settings);
-        program.job = [options] { return ReplayAll(*options); };
+        return [options] { return ReplayAll(*options); };
     });
 }
 

@@ -14,8 +14,8 @@
 
 #include <nlohmann/json.hpp>
 
+#include "mempool/CommandLine.hpp"
 #include "mempool/Print.hpp"
-#include "mempool/Program.hpp"
 #include "mempool/Progress.hpp"
 #include "mempool/ReportText.hpp"
 #include "mempool/Settings.hpp"
@@ -153,37 +153,28 @@ void WritePage(System::OutputFile& file, const Report::Analysis& analysis,
 }
 
 void AddReport(Program& program) {
-    CLI::App& report = *program.commandLine.add_subcommand("report", description);
-    report.footer(notes);
+    Subcommand report(program, "report", description, notes);
     const auto options = std::make_shared<Options>();
-    report.add_option("TRACE", options->path, "File to report on; - is standard input")
-        ->required()
-        ->type_name("");
-    report.add_flag("--json", options->json, "Print all figures as JSON");
-    report
-        .add_option(
-            "--html", options->html,
-            "Also write a page with charts to FILE; - writes only the page, to standard output")
-        ->type_name("FILE");
-    report
-        .add_option("--advice", options->advice,
-                    "Show the advice in FILE, from 'mempool advise --json', on the page")
-        ->type_name("FILE")
-        ->needs("--html");
-    report
-        .add_flag("--folded", options->folded,
-                  "Print the call stacks at the peak for flame graph tools")
-        ->excludes("--json");
-    report
-        .add_option("--skip", options->skipped,
-                    "Functions that match PATTERN are not callers of stacks; may be repeated")
-        ->type_name("PATTERN")
-        ->allow_extra_args(false);
-    report.add_flag("--all", options->all, "Print every size and every group");
+    report.AddTrace(options->path, "File to report on; - is standard input");
+    report.AddFlag("--json", options->json, "Print all figures as JSON");
+    report.AddText(
+        "--html", options->html, "FILE",
+        "Also write a page with charts to FILE; - writes only the page, to standard output");
+    report.AddText("--advice", options->advice, "FILE",
+                   "Show the advice in FILE, from 'mempool advise --json', on the page");
+    report.AddFlag("--folded", options->folded,
+                   "Print the call stacks at the peak for flame graph tools");
+    report.Exclude("--folded", {"--json"});
+    report.AddPatterns("--skip", options->skipped,
+                       "Functions that match PATTERN are not callers of stacks; may be repeated");
+    report.AddFlag("--all", options->all, "Print every size and every group");
     AddSettings(report, options->settings);
-    report.callback([&program, &report, options] {
+    report.SetJob([report, options] {
+        if (report.IsGiven("--advice") && !report.IsGiven("--html")) {
+            throw UsageError("--advice requires --html");
+        }
         TakeEnvironment(report, options->settings);
-        program.job = [options] { return ReportOn(*options); };
+        return [options] { return ReportOn(*options); };
     });
 }
 

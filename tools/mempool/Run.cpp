@@ -18,7 +18,6 @@
 #include "mempool/Advise.hpp"
 #include "mempool/CommandLine.hpp"
 #include "mempool/Print.hpp"
-#include "mempool/Program.hpp"
 #include "mempool/Progress.hpp"
 #include "mempool/RecordCommand.hpp"
 #include "mempool/Report.hpp"
@@ -145,20 +144,17 @@ int Run(Options options) {
 }  // namespace
 
 void AddRun(Program& program) {
-    CLI::App& run = *program.commandLine.add_subcommand("run", description);
-    run.footer(notes);
-    AddCommand(program, run);
+    Subcommand run(program, "run", description, notes);
+    run.AddCommand();
     const auto options = std::make_shared<Options>();
     AddRecordOptions(run, options->order);
-    run.add_option("--html", options->html,
-                   "Also write the report and the advice to FILE, as a page with charts")
-        ->type_name("FILE");
+    run.AddText("--html", options->html, "FILE",
+                "Also write the report and the advice to FILE, as a page with charts");
     AddLayer(run, options->layer);
     AddSeconds(run, options->seconds);
-    run.callback([&program, options] {
+    run.SetJob([&program, options] {
         options->order.command = program.command;
-        if (program.command.empty()) { throw CLI::RequiredError("PROGRAM"); }
-        program.job = [options] { return Run(*options); };
+        return [options] { return Run(*options); };
     });
 }
 

@@ -8,8 +8,6 @@
 
 #include <MemPoolSettings>
 
-#include "mempool/CommandLine.hpp"
-
 namespace Tool {
 
 namespace {
@@ -19,24 +17,23 @@ const std::map<std::string, Replay::Layer> layers = {
 
 }  // namespace
 
-void AddSettings(CLI::App& subcommand, OBR::MemPool::PoolSettings& settings) {
+void AddSettings(Subcommand& subcommand, OBR::MemPool::PoolSettings& settings) {
     for (const OBR::MemPool::Setting& row : OBR::MemPool::SettingTable::all) {
         if (row.IsFlag()) {
-            subcommand.add_flag(row.option, settings.*row.flag, row.help);
+            subcommand.AddFlag(row.option, settings.*row.flag, row.help);
             continue;
         }
         const std::string bounds =
             ", " + std::to_string(row.smallest) + " to " + std::to_string(row.largest);
-        AddNumber(subcommand, row.option, settings.*row.size, row.smallest, row.largest,
-                  row.help + bounds)
-            .type_name("BYTES");
+        subcommand.AddNumber(row.option, settings.*row.size, row.smallest, row.largest,
+                             row.help + bounds, "BYTES");
     }
 }
 
-void TakeEnvironment(const CLI::App& subcommand, OBR::MemPool::PoolSettings& settings) {
+void TakeEnvironment(const Subcommand& subcommand, OBR::MemPool::PoolSettings& settings) {
     for (const OBR::MemPool::Setting& row : OBR::MemPool::SettingTable::all) {
         const char* const value = std::getenv(row.variable);
-        if (value == nullptr || *value == '\0' || subcommand.count(row.option) != 0) { continue; }
+        if (value == nullptr || *value == '\0' || subcommand.IsGiven(row.option)) { continue; }
         const unsigned int number = ParseNumber(row.variable, value, row.smallest, row.largest);
         if (row.IsFlag()) {
             settings.*row.flag = number != 0;
@@ -46,13 +43,9 @@ void TakeEnvironment(const CLI::App& subcommand, OBR::MemPool::PoolSettings& set
     }
 }
 
-void AddLayer(CLI::App& subcommand, Replay::Layer& layer) {
-    subcommand
-        .add_option("--layer", layer,
-                    "What serves the blocks instead of malloc: heap, malloc or mgr")
-        ->type_name("LAYER")
-        ->transform(CLI::Transformer(layers))
-        ->default_str(NameOf(layer));
+void AddLayer(Subcommand& subcommand, Replay::Layer& layer) {
+    subcommand.AddChoice("--layer", layers, layer, "LAYER",
+                         "What serves the blocks instead of malloc: heap, malloc or mgr");
 }
 
 const char* NameOf(Replay::Layer layer) {
@@ -60,8 +53,8 @@ const char* NameOf(Replay::Layer layer) {
     return std::find_if(layers.begin(), layers.end(), isIt)->first.c_str();
 }
 
-void AddSeconds(CLI::App& subcommand, unsigned int& seconds) {
-    AddNumber(subcommand, "--seconds", seconds, 1, 100000, "Approximate time of the search");
+void AddSeconds(Subcommand& subcommand, unsigned int& seconds) {
+    subcommand.AddNumber("--seconds", seconds, 1, 100000, "Approximate time of the search");
 }
 
 void CheckSettings(const OBR::MemPool::PoolSettings& settings) {

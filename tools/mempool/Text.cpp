@@ -7,7 +7,7 @@
 #include <memory>
 #include <string>
 
-#include "mempool/Program.hpp"
+#include "mempool/CommandLine.hpp"
 #include "trace/Event.hpp"
 #include "trace/OpenTrace.hpp"
 #include "trace/TextWriter.hpp"
@@ -65,13 +65,10 @@ int PrintTrace(const std::string& path) {
 }  // namespace
 
 void AddText(Program& program) {
-    CLI::App& text = *program.commandLine.add_subcommand("text", description);
-    text.footer(notes);
+    Subcommand text(program, "text", description, notes);
     const auto path = std::make_shared<std::string>();
-    text.add_option("TRACE", *path, "The file to print; - is standard input")
-        ->required()
-        ->type_name("");
-    text.callback([&program, path] { program.job = [path] { return PrintTrace(*path); }; });
+    text.AddTrace(*path, "The file to print; - is standard input");
+    text.SetJob([path] { return [path] { return PrintTrace(*path); }; });
 }
 
 }  // namespace Tool

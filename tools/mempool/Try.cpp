@@ -9,7 +9,6 @@
 #include <nlohmann/json.hpp>
 
 #include "mempool/CommandLine.hpp"
-#include "mempool/Program.hpp"
 #include "mempool/Progress.hpp"
 #include "mempool/Settings.hpp"
 #include "mempool/Table.hpp"
@@ -122,23 +121,20 @@ int Try(const Options& options) {
 }  // namespace
 
 void AddTry(Program& program) {
-    CLI::App& sub = *program.commandLine.add_subcommand("try", description);
-    sub.footer(notes);
-    AddCommand(program, sub);
+    Subcommand sub(program, "try", description, notes);
+    sub.AddCommand();
     const auto options = std::make_shared<Options>();
-    AddNumber(sub, "--rounds", options->order.rounds, 1, 1000, "Measured runs of each side");
+    sub.AddNumber("--rounds", options->order.rounds, 1, 1000, "Measured runs of each side");
     AddSettings(sub, options->order.settings);
-    sub.add_option("--stdin", options->order.input, "The program's standard input")
-        ->type_name("FILE");
-    sub.add_flag("--json", options->json,
-                 "Print the figures as JSON on standard output, and the output of the program on "
-                 "standard error");
-    sub.callback([&program, &sub, options] {
+    sub.AddText("--stdin", options->order.input, "FILE", "The program's standard input");
+    sub.AddFlag("--json", options->json,
+                "Print the figures as JSON on standard output, and the output of the program on "
+                "standard error");
+    sub.SetJob([&program, sub, options] {
         options->order.command = program.command;
         options->order.showsOnErrors = options->json;
-        if (program.command.empty()) { throw CLI::RequiredError("PROGRAM"); }
         TakeEnvironment(sub, options->order.settings);
-        program.job = [options] { return Try(*options); };
+        return [options] { return Try(*options); };
     });
 }
 

@@ -18,10 +18,6 @@
 
 namespace {
 
-constexpr const char* description =
-    R"(Shows where a program's memory is, what memory pools would gain, which settings suit the program,
-and its faults in the use of pools. Start with 'mempool run PROGRAM'.)";
-
 // A standard stream that is closed would become the first file that is opened. In its place comes
 // one that cannot be written, and that the programs that are run do not inherit.
 void OccupyStandardStreams() {
@@ -43,13 +39,6 @@ bool IsOutputWritten() {
 }
 
 int RunCommandLine(Tool::Program& program, std::vector<std::string> words) {
-    CLI::App& app = program.commandLine;
-    app.name("mempool");
-    app.description(description);
-    app.set_help_flag("-h,--help", "Print this help");
-    app.set_version_flag("-V,--version", "mempool " MEMPOOL_VERSION, "Print the version");
-    app.require_subcommand(1);
-
     Tool::AddRun(program);
     Tool::AddTry(program);
     Tool::AddRecord(program);
