@@ -16,7 +16,7 @@ namespace Tool {
 
 namespace {
 
-constexpr const char* description =
+constexpr const char* purpose =
     R"(Shows where a program's memory is, what memory pools would gain, which settings suit the program,
 and its faults in the use of pools. Start with 'mempool run PROGRAM'.)";
 
@@ -129,7 +129,7 @@ std::string Problem(const CLI::App& app, const CLI::ParseError& error) {
 
 }  // namespace
 
-Program::Program() : commandLine(std::make_unique<CLI::App>(description, "mempool")) {
+Program::Program() : commandLine(std::make_unique<CLI::App>(purpose, "mempool")) {
     commandLine->set_help_flag("-h,--help", "Print this help");
     commandLine->set_version_flag("-V,--version", "mempool " MEMPOOL_VERSION, "Print the version");
     commandLine->require_subcommand(1);
