@@ -62,16 +62,20 @@ TEST(Recording, CountsTheStepsAboveItsLimit) {
 }
 
 TEST(Recording, MergesGroupsButNoPools) {
-    Replay::Recording heap = Record("@c:P\n@a:P:X:64\n@c:Q\n@a:Q:Y:8\n@c:R\n@f:Q:Y:\n");
+    const std::string groups = "@i:by:caller\n@c:P\n@a:P:X:64\n@c:Q\n@a:Q:Y:8\n";
+    Replay::Recording heap = Record(groups + "@c:R\n@f:Q:Y:\n");
     Replay::MergePools(heap);
     EXPECT_EQ(heap.pools.size(), 1U);
     EXPECT_EQ(heap.steps.size(), 4U);
     EXPECT_EQ(heap.peakSteps, 3U);
     for (const Trace::Step& step : heap.steps) { EXPECT_EQ(step.pool, 0U); }
-    Replay::Recording pools = Record("@c:P\n@a:P:X:64\n@c:Q\n@a:Q:Y:8\n@x:Q\n");
-    Replay::MergePools(pools);
-    EXPECT_EQ(pools.pools.size(), 2U);
-    EXPECT_EQ(pools.steps.size(), 5U);
+    const std::string lines = "@c:P\n@a:P:X:64\n@c:Q\n@a:Q:Y:8\n";
+    for (const std::string& real :
+         {lines, "@i:by:pools\n" + lines, groups + "@x:Q\n", groups + "@d:Q\n"}) {
+        Replay::Recording pools = Record(real);
+        Replay::MergePools(pools);
+        EXPECT_EQ(pools.pools.size(), 2U) << real;
+    }
 }
 
 // The pools are clocked twice, the heap twice more for what it frees at the end of a pool.

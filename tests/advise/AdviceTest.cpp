@@ -1,8 +1,10 @@
 // An advice from the trace to the text.
 
 #include <cstdlib>
+#include <optional>
 #include <sstream>
 #include <string>
+#include <vector>
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -31,14 +33,65 @@ std::string Verdict(const Advise::Advice& advice) {
 }
 
 TEST(Advice, IsForOnePoolOrForThoseOfTheTrace) {
-    const auto bytes = [](bool mergesGroups, Replay::Layer layer = Replay::Layer::Heap) {
-        Trace::StepReader reader(ReadLines(Lines("@c:P\n@a:P:X:24\n@c:Q\n@a:Q:Y:24\n")), "trace");
-        const auto advice =
-            Advise::TakeAdvice(reader, {layer, mergesGroups, 1}, [](const std::string&) {});
+    const auto bytes = [](const std::string& by, Replay::Layer layer = Replay::Layer::Heap) {
+        Trace::StepReader reader(
+            ReadLines(Lines("@i:by:" + by + "\n@c:P\n@a:P:X:24\n@c:Q\n@a:Q:Y:24\n")), "trace");
+        const auto advice = Advise::TakeAdvice(reader, {layer, 1}, [](const std::string&) {});
         return advice.findings.settings.at(0).figures.bytes;
     };
-    EXPECT_NEAR(bytes(false), 2 * bytes(true), 300);
-    EXPECT_GT(bytes(true, Replay::Layer::Malloc), bytes(true) + 300000) << "With the preload.";
+    EXPECT_NEAR(bytes("pools"), 2 * bytes("caller"), 300);
+    EXPECT_GT(bytes("all", Replay::Layer::Malloc), bytes("caller") + 300000) << "With the preload.";
+}
+
+TEST(Advice, KnowsWhatTheTraceSaysAboutTheProgram) {
+    Replay::Recording recording;
+    recording.steps.resize(7);
+    recording.numLeftOut = 5;
+    const Advise::Program program =
+        Advise::ProgramOf(recording, {{"allocation_share", "0.25"}, {"by", "all"}});
+    EXPECT_EQ(program.numEvents, 7U);
+    EXPECT_EQ(program.numLeftOut, 5U);
+    EXPECT_EQ(program.allocationShare, std::optional(0.25));
+    EXPECT_EQ(Advise::ProgramOf(recording, {}).allocationShare, std::nullopt);
+}
+
+TEST(Advice, HasAPlanForGroupsThatDieTogether) {
+#ifdef OBR_MEMPOOL_CHECKS
+    GTEST_SKIP() << "The checks take longer than what a plan saves.";
+#endif
+    std::string lines = "@i:by:caller\n@c:P\n@n:P:tree\n@c:Q\n@n:Q:log\n@a:Q:X:24\n";
+    for (const char kind : {'a', 'f'}) {
+        for (int block = 100000; block < 120000; ++block) {
+            lines += std::string("@") + kind + ":P:0000000000" + std::to_string(block) +
+                     (kind == 'a' ? ":24\n" : ":\n");
+        }
+    }
+    Advise::Advice advice;
+    for (int attempt = 0; attempt < 5 && !advice.plan.has_value(); ++attempt) {
+        Trace::StepReader reader(ReadLines(Lines(lines)), "trace");
+        advice = Advise::TakeAdvice(reader, {Replay::Layer::Malloc, 1}, [](const std::string&) {});
+    }
+    ASSERT_TRUE(advice.plan.has_value());
+    EXPECT_EQ(advice.plan->pools.at(0).groups, std::vector<std::string>{"tree"});
+    EXPECT_LT(advice.plan->figures.time, advice.plan->onePool.time);
+    EXPECT_LT(advice.plan->onePool.bytes, advice.plan->heap.bytes + 300000)
+        << "A Heap, not the preloaded library.";
+}
+
+TEST(Advice, PrintsAPlan) {
+    Advise::Advice advice = Advice(2500);
+    advice.plan = Advise::Plan{
+        {{{"a", "b\n", "c", "d", "e"}, 3000, 12345, 2, 2000, 77}, {{"f"}, 9, 8, 1, 7, 6}},
+        {},
+        {},
+        {},
+        {},
+        "A pool ..."};
+    EXPECT_THAT(Verdict(advice),
+                HasSubstr("\n\nA pool ...\n   Pool 1: one FreeAll for each 1,000 blocks, 2 in all, "
+                          "the first at event 77, drops 2,000 of 3,000 blocks; peak 12.3 KB\n"
+                          "      a\n      b\\n\n      c\n      d\n      and 1 more\n"
+                          "   Pool 2: one FreeAll, at event 6, drops 7 of 9 blocks; peak 8 B \n"));
 }
 
 TEST(Advice, IsPrintedWithLinesToPasteIfPoolsHelp) {

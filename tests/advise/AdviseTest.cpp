@@ -57,7 +57,7 @@ TEST(Advise, TextFiguresVerdictAndEnvironmentAgree) {
     EXPECT_EQ(keys, (std::set<std::string>{"layer", "events", "events_left_out", "heap", "settings",
                                            "fastest", "smallest", "advised", "best", "verdict",
                                            "price", "sentences", "environment", "allocation_share",
-                                           "mimalloc", "stopped"}));
+                                           "mimalloc", "stopped", "plan"}));
     EXPECT_EQ(advice["layer"], "heap");
     EXPECT_EQ(advice["events"], 6001);
     EXPECT_EQ(advice["events_left_out"], 0);

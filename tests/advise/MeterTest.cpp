@@ -4,15 +4,18 @@
 #include <unistd.h>
 
 #include <csignal>
+#include <fstream>
 #include <iostream>
 #include <new>
 #include <string>
+#include <vector>
 
 #include <gtest/gtest.h>
 #include <MemPool>
 
 #include "advise/ForkedMeter.hpp"
 #include "advise/Space.hpp"
+#include "replay/Clock.hpp"
 #include "system/Interruption.hpp"
 
 using Advise::InChild;
@@ -75,6 +78,14 @@ TEST(ForkedMeter, ReplaysWithTheGivenSettings) {
     EXPECT_NEAR(held(65450, 64), 3 * 65500 + 500, 1500) << "128 bytes a block.";
     EXPECT_FALSE(meter.Time(OBR::MemPool::PoolSettings{20, 1000, 8, 4, false}).figure)
         << "No pool has these settings.";
+    Replay::Recording few = recording;  // As a plan would have them.
+    few.steps.resize(101);
+    few.peakSteps = 101;
+    const Advise::Planned planned = {&few, {4010, 500, 8, 4, false}};
+    EXPECT_LT(*meter.Held(planned).figure, 15000);
+    EXPECT_LT(*meter.Time(planned).figure, *meter.Time(planned.settings).figure / 2)
+        << "Per event of the whole recording.";
+    EXPECT_TRUE(Advise::ForkedMeter(recording, Replay::Layer::Mgr, 0).IsStopped());
     recording.steps.resize(2);  // So few that one measurement replays them many times.
     Advise::ForkedMeter brief(recording, Replay::Layer::Mgr, 60);
     for (const Advise::Side& side : {Advise::Side(), Advise::Side(OBR::MemPool::PoolSettings())}) {
@@ -88,6 +99,26 @@ TEST(ForkedMeter, ReplaysWithTheGivenSettings) {
     EXPECT_TRUE(meter.IsStopped());
     EXPECT_EQ(OBR::MemPool::PoolSettings::OfProcess().bucketSize, before.bucketSize);
     EXPECT_FALSE(OBR::MemPool::NUV_OBR_MEMPOOL_ON());
+}
+
+TEST(Clock, CountsTheTimeOfTheSystemToo) {
+    const auto used = [](const timeval& time) {
+        return 1e9 * static_cast<double>(time.tv_sec) + 1e3 * static_cast<double>(time.tv_usec);
+    };
+    rusage before = {};
+    rusage after = {};
+    getrusage(RUSAGE_SELF, &before);
+    const double start = Replay::ProcessorNanoseconds();
+    std::vector<char> buffer(1 << 20);
+    std::ifstream zeros("/dev/zero", std::ios::binary);
+    zeros.rdbuf()->pubsetbuf(nullptr, 0);
+    do {
+        zeros.read(buffer.data(), static_cast<std::streamsize>(buffer.size()));
+        getrusage(RUSAGE_SELF, &after);
+    } while (used(after.ru_stime) < used(before.ru_stime) + 5e7);
+    const double system = used(after.ru_stime) - used(before.ru_stime);
+    const double user = used(after.ru_utime) - used(before.ru_utime);
+    EXPECT_NEAR(Replay::ProcessorNanoseconds() - start, system + user, 2e7);
 }
 
 }  // namespace

@@ -145,7 +145,7 @@ TEST(Verdict, SaysWhenMimallocHelpsMore) {
     const std::vector<Advise::Measured> pools = {{{}, {8, 0.1, 1000, 9}}};
     EXPECT_TRUE(helps({6, 0.1, 1000, 9}, pools));
     EXPECT_TRUE(helps({6, 0.1, 1000, 9}, {}));
-    EXPECT_FALSE(helps({6, 0.1, 1000, 2}, pools)) << "Of two rounds.";
+    EXPECT_FALSE(helps({6, 0.1, 900, 2}, pools)) << "Of two rounds.";
     EXPECT_FALSE(helps({6, 0.1, 1100, 9}, pools)) << "At a price.";
     EXPECT_FALSE(helps({6, 2.1, 1000, 9}, pools)) << "Within the spread.";
 }

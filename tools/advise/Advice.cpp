@@ -1,16 +1,37 @@
 #include "advise/Advice.hpp"
 
 #include <cstddef>
+#include <functional>
+#include <future>
 #include <stdexcept>
 
 #include <fmt/format.h>
 
 #include "advise/ForkedMeter.hpp"
 #include "advise/Search.hpp"
-#include "replay/Recording.hpp"
 #include "system/Interruption.hpp"
 
 namespace Advise {
+
+namespace {
+
+// The share of the time that the search takes if there are pools to measure after it.
+constexpr double shareOfSearch = 0.5;
+
+// In another thread, for the reason why ReadRecording uses one.
+Proposal ProposeInThread(const Replay::Recording& recording) {
+    if (!recording.hasGroups) { return {}; }
+    return std::async(std::launch::async, ProposePools, std::cref(recording)).get();
+}
+
+}  // namespace
+
+Program ProgramOf(const Replay::Recording& recording,
+                  const std::map<std::string, std::string>& facts) {
+    const auto share = facts.find("allocation_share");
+    return {recording.steps.size(), recording.numLeftOut,
+            share == facts.end() ? std::nullopt : ShareOf(share->second)};
+}
 
 Advice TakeAdvice(Trace::StepReader& reader, const Question& question,
                   const std::function<void(const std::string&)>& show) {
@@ -20,23 +41,41 @@ Advice TakeAdvice(Trace::StepReader& reader, const Question& question,
     if (recording.peakBlocks == 0) {
         throw std::runtime_error(reader.Name() + ": no block was allocated");
     }
-    if (question.mergesGroups) { Replay::MergePools(recording); }
+    const Proposal proposal = ProposeInThread(recording);
+    Replay::MergePools(recording);
 
     Advice advice;
     advice.layer = question.layer;
-    advice.program.numEvents = recording.steps.size();
-    advice.program.numLeftOut = recording.numLeftOut;
-    const auto share = reader.Facts().find("allocation_share");
-    if (share != reader.Facts().end()) { advice.program.allocationShare = ShareOf(share->second); }
+    advice.program = ProgramOf(recording, reader.Facts());
     const System::Interruption interruption;
     constexpr double mostOfTime = 1.4;  // After that no measurement is waited for.
+    const double searchSeconds = (proposal.pools.empty() ? 1 : shareOfSearch) * question.seconds;
     ForkedMeter meter(recording, question.layer, mostOfTime * question.seconds);
-    advice.findings = Search(meter, question.seconds, [&](std::size_t numTried) {
+    advice.findings = Search(meter, searchSeconds, [&](std::size_t numTried) {
         show(fmt::format("{} settings tried, {:.0f} s of about {}", numTried, meter.Elapsed(),
                          question.seconds));
     });
     advice.isStopped = System::Interruption::Signal() != 0;
     advice.verdict = Judge(advice.findings, advice.program);
+    if (proposal.pools.empty() || meter.IsStopped()) { return advice; }
+
+    show(fmt::format("{} pools for blocks that die together", proposal.pools.size()));
+    OBR::MemPool::PoolSettings settings;
+    if (advice.verdict.advised.has_value()) {
+        settings = advice.findings.settings[*advice.verdict.advised].settings;
+    }
+    // The preloaded library has one pool and no FreeAll.
+    const Replay::Layer layer =
+        question.layer == Replay::Layer::Malloc ? Replay::Layer::Heap : question.layer;
+    const double rest = question.seconds - meter.Elapsed();
+    ForkedMeter planMeter(recording, layer, rest + (mostOfTime - 1) * question.seconds);
+    advice.plan = MeasurePlan(proposal, settings, advice.program, planMeter, rest);
+    if (!advice.plan.has_value() && planMeter.IsStopped()) {
+        advice.verdict.sentences.emplace_back(
+            "The blocks of some groups die together; more --seconds allow measuring pools for "
+            "them.");
+    }
+    advice.isStopped = System::Interruption::Signal() != 0;
     return advice;
 }
 

@@ -4,11 +4,15 @@
 #define OBR_TOOLS_ADVISE_ADVICE_HPP
 
 #include <functional>
+#include <map>
+#include <optional>
 #include <string>
 
 #include "advise/Figures.hpp"
+#include "advise/Plan.hpp"
 #include "advise/Verdict.hpp"
 #include "replay/Layer.hpp"
+#include "replay/Recording.hpp"
 #include "trace/StepReader.hpp"
 
 namespace Advise {
@@ -18,14 +22,18 @@ struct Advice {
     Program program;
     Findings findings;
     Verdict verdict;
-    bool isStopped = false;  // By the user, before the search was done.
+    std::optional<Plan> plan;  // None if several pools gain nothing over one.
+    bool isStopped = false;    // By the user, before the search was done.
 };
 
 struct Question {
     Replay::Layer layer = Replay::Layer::Heap;
-    bool mergesGroups = false;  // One pool for all groups of a recorded heap.
-    double seconds = 30;        // The approximate time of the search.
+    double seconds = 30;  // The approximate time of the search.
 };
+
+// From the part of the trace that is replayed, and its facts.
+Program ProgramOf(const Replay::Recording& recording,
+                  const std::map<std::string, std::string>& facts);
 
 // Reads the trace and searches; from then on, SIGINT and SIGTERM end the search. Calls `show` with
 // a line of progress from time to time. Throws a std::runtime_error if the trace has no allocation.

@@ -36,4 +36,18 @@ double Spread(const std::vector<double>& values) {
     return Quantile(values, 0.75) - Quantile(values, 0.25);
 }
 
+Figures FiguresOfHeap(const std::vector<double>& times, double bytes) {
+    const double time = Quantile(times, 0.5);
+    std::vector<double> ratios = {1};
+    for (std::size_t i = 2; i < times.size(); ++i) {
+        ratios.push_back(2 * times[i - 1] / (times[i - 2] + times[i]));
+    }
+    return {time, time * Spread(ratios), bytes, static_cast<unsigned int>(times.size())};
+}
+
+Figures FiguresOf(const std::vector<double>& ratios, double bytes, double heapTime) {
+    return {heapTime * Quantile(ratios, 0.5), heapTime * Spread(ratios), bytes,
+            static_cast<unsigned int>(ratios.size())};
+}
+
 }  // namespace Advise

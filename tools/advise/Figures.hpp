@@ -57,6 +57,13 @@ double Quantile(std::vector<double> values, double share);
 // From the lower to the upper quartile.
 double Spread(const std::vector<double>& values);
 
+// The figures of the heap, from its times in order. Its spread is that of the ratios of successive
+// times.
+Figures FiguresOfHeap(const std::vector<double>& times, double bytes);
+
+// The figures of another side, from the ratios of its times to those of the heap beside them.
+Figures FiguresOf(const std::vector<double>& ratios, double bytes, double heapTime);
+
 }  // namespace Advise
 
 #endif

@@ -140,18 +140,20 @@ ForkedMeter::ForkedMeter(const Replay::Recording& replayed, Replay::Layer measur
 }
 
 Outcome ForkedMeter::Time(const Side& side) {
-    return Run(side, [&](Replay::Layer replayed) {
+    return Run(side, [&](const Replay::Recording& replayed, Replay::Layer on) {
         double total = 0;
         for (unsigned int replay = 0; replay < numReplays; ++replay) {
-            total += Replay::NanosecondsPerEvent(recording, replayed);
+            total += Replay::NanosecondsPerEvent(replayed, on);
         }
-        return total / numReplays;
+        // A plan has fewer steps for the same events.
+        return total / numReplays * static_cast<double>(replayed.steps.size()) /
+               static_cast<double>(recording.steps.size());
     });
 }
 
 Outcome ForkedMeter::Held(const Side& side) {
-    return Run(side, [&](Replay::Layer replayed) {
-        return static_cast<double>(Replay::BytesHeld(recording, replayed));
+    return Run(side, [](const Replay::Recording& replayed, Replay::Layer on) {
+        return static_cast<double>(Replay::BytesHeld(replayed, on));
     });
 }
 
@@ -163,8 +165,10 @@ bool ForkedMeter::IsStopped() const {
     return System::Interruption::Signal() != 0 || Elapsed() > mostSeconds;
 }
 
-Outcome ForkedMeter::Run(const Side& side, const std::function<double(Replay::Layer)>& work) {
-    const auto* const settings = std::get_if<OBR::MemPool::PoolSettings>(&side);
+Outcome ForkedMeter::Run(const Side& side, const Work& work) {
+    const auto* const planned = std::get_if<Planned>(&side);
+    const auto* const settings =
+        planned != nullptr ? &planned->settings : std::get_if<OBR::MemPool::PoolSettings>(&side);
     const bool isHeap = std::holds_alternative<Malloc>(side);
     const Replay::Layer replayed = settings != nullptr ? layer
                                    : isHeap            ? Replay::Layer::System
@@ -173,7 +177,7 @@ Outcome ForkedMeter::Run(const Side& side, const std::function<double(Replay::La
     Outcome outcome = InChild(
         [&] {
             if (settings != nullptr) { Replay::UsePools(*settings); }
-            return work(replayed);
+            return work(planned != nullptr ? *planned->recording : recording, replayed);
         },
         isHeap ? limitOfHeap : std::max(leastLimit, mostOfHeapTime * heapSeconds),
         [this] { return IsStopped(); });

@@ -34,7 +34,8 @@ public:
     bool IsStopped() const override;
 
 private:
-    Outcome Run(const Side& side, const std::function<double(Replay::Layer)>& work);
+    using Work = std::function<double(const Replay::Recording&, Replay::Layer)>;
+    Outcome Run(const Side& side, const Work& work);
 
     const Replay::Recording& recording;
     const Replay::Layer layer;

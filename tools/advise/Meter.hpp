@@ -10,12 +10,19 @@
 
 #include <MemPoolSettings>
 
+#include "replay/Recording.hpp"
+
 namespace Advise {
 
-// What is replayed: the C library's malloc, mimalloc, or pools with these settings.
+// What is replayed: the C library's malloc, mimalloc, pools with these settings, or the pools of a
+// plan with these settings, from a recording of their own.
 struct Malloc {};
 struct Mimalloc {};
-using Side = std::variant<Malloc, Mimalloc, OBR::MemPool::PoolSettings>;
+struct Planned {
+    const Replay::Recording* recording;
+    OBR::MemPool::PoolSettings settings;
+};
+using Side = std::variant<Malloc, Mimalloc, OBR::MemPool::PoolSettings, Planned>;
 
 // The figure of a replay, or why there is none.
 struct Outcome {

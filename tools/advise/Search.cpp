@@ -219,33 +219,16 @@ private:
                     aim);
     }
 
-    Figures FiguresOf(const std::vector<double>& ratios, double bytes) const {
-        const double heapTime = Quantile(heapTimes, 0.5);
-        return {heapTime * Quantile(ratios, 0.5), heapTime * Spread(ratios), bytes,
-                static_cast<unsigned int>(ratios.size())};
-    }
-
-    // The spread of the heap is that of the ratios of successive times, like that of the settings.
-    Figures FiguresOfHeap() const {
-        std::vector<double> ratios = {1};
-        for (std::size_t i = 2; i < heapTimes.size(); ++i) {
-            ratios.push_back(2 * heapTimes[i - 1] / (heapTimes[i - 2] + heapTimes[i]));
-        }
-        Figures figures = FiguresOf(ratios, heapBytes);
-        figures.time = Quantile(heapTimes, 0.5);
-        figures.rounds = static_cast<unsigned int>(heapTimes.size());
-        return figures;
-    }
-
     Findings Finish() const {
-        Findings findings{FiguresOfHeap(), {}, {}, givenUp};
+        Findings findings{FiguresOfHeap(heapTimes, heapBytes), {}, {}, givenUp};
+        const auto figuresOf = [&](const Candidate& each) {
+            return FiguresOf(each.ratios, each.bytes, findings.heap.time);
+        };
         for (const std::size_t i : Alive()) {
-            const Candidate& each = candidates[i];
-            findings.settings.push_back({SettingsOf(i), FiguresOf(each.ratios, each.bytes)});
+            findings.settings.push_back({SettingsOf(i), figuresOf(candidates[i])});
         }
         if (mimalloc.has_value() && !candidates[*mimalloc].ratios.empty()) {
-            const Candidate& other = candidates[*mimalloc];
-            findings.mimalloc = FiguresOf(other.ratios, other.bytes);
+            findings.mimalloc = figuresOf(candidates[*mimalloc]);
         }
         return findings;
     }

@@ -76,7 +76,8 @@ public:
         if (findings.mimalloc.has_value()) {
             const Figures& other = *findings.mimalloc;
             const double pools = verdict.advised.has_value() ? BothRatio(Of(*verdict.advised)) : 1;
-            verdict.isMimallocBetter = isFree(other) && gains(other) &&
+            verdict.isMimallocBetter = other.rounds >= leastRounds && isFree(other) &&
+                                       gains(other) &&
                                        (1 + other.spread / other.time) * BothRatio(other) < pools;
         }
         verdict.sentences = SentencesOf(verdict);

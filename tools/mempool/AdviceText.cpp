@@ -12,6 +12,8 @@
 #include <fmt/ostream.h>
 
 #include "advise/Space.hpp"
+#include "mempool/Readable.hpp"
+#include "mempool/SafeText.hpp"
 #include "mempool/Table.hpp"
 
 namespace Tool {
@@ -79,6 +81,41 @@ std::string Quoted(const std::string& word) {
     return quoted + "'";
 }
 
+void PrintLinesToPaste(std::ostream& out, const Advice& advice) {
+    const Measured& advised = advice.findings.settings[*advice.verdict.advised];
+    out << '\n';
+    for (const auto& [name, value] : Advise::EnvironmentOf(advised.settings)) {
+        fmt::print(out, "    export {}={}\n", name, value);
+    }
+    const std::vector<std::string> code = Advise::CodeOf(advised.settings, advice.layer);
+    if (!code.empty()) { out << "\nor, in code:\n\n"; }
+    for (const std::string& line : code) { fmt::print(out, "    {}\n", line); }
+}
+
+void PrintPlan(std::ostream& out, const Advise::Plan& plan) {
+    constexpr std::size_t mostNames = 4;
+    constexpr std::size_t nameBytes = 90;
+    out << '\n' << plan.sentence << '\n';
+    for (std::size_t i = 0; i < plan.pools.size(); ++i) {
+        const Advise::PlannedPool& pool = plan.pools[i];
+        const std::string each =
+            pool.numFreeAlls == 1
+                ? ","
+                : fmt::format(" for each {} blocks, {} in all, the first",
+                              Count(pool.numReplaced / pool.numFreeAlls), Count(pool.numFreeAlls));
+        fmt::print(out, "   Pool {}: one FreeAll{} at event {}, drops {} of {} blocks; peak {}\n",
+                   i + 1, each, Count(pool.firstFreeAll), Count(pool.numReplaced),
+                   Count(pool.numBlocks), Bytes(pool.peakBytes));
+        const std::size_t numNames = std::min(pool.groups.size(), mostNames);
+        for (std::size_t name = 0; name < numNames; ++name) {
+            fmt::print(out, "      {}\n", ShortName(SafeText(pool.groups[name]), nameBytes));
+        }
+        if (numNames < pool.groups.size()) {
+            fmt::print(out, "      and {} more\n", pool.groups.size() - numNames);
+        }
+    }
+}
+
 }  // namespace
 
 void PrintTable(std::ostream& out, const Advice& advice, bool all) {
@@ -127,15 +164,8 @@ void PrintTable(std::ostream& out, const Advice& advice, bool all) {
 
 void PrintVerdict(std::ostream& out, const Advice& advice) {
     for (const std::string& sentence : advice.verdict.sentences) { out << sentence << '\n'; }
-    if (!advice.verdict.advised.has_value()) { return; }
-    const Measured& advised = advice.findings.settings[*advice.verdict.advised];
-    out << '\n';
-    for (const auto& [name, value] : Advise::EnvironmentOf(advised.settings)) {
-        fmt::print(out, "    export {}={}\n", name, value);
-    }
-    const std::vector<std::string> code = Advise::CodeOf(advised.settings, advice.layer);
-    if (!code.empty()) { out << "\nor, in code:\n\n"; }
-    for (const std::string& line : code) { fmt::print(out, "    {}\n", line); }
+    if (advice.verdict.advised.has_value()) { PrintLinesToPaste(out, advice); }
+    if (advice.plan.has_value()) { PrintPlan(out, *advice.plan); }
 }
 
 std::string TryCommand(const OBR::MemPool::PoolSettings& settings,

@@ -15,7 +15,8 @@ namespace Tool {
 // the best and those that are named.
 void PrintTable(std::ostream& out, const Advise::Advice& advice, bool all);
 
-// Prints the verdict in words, and the lines to paste if pools would help.
+// Prints the verdict in words, the lines to paste if pools would help, and the plan if there is
+// one.
 void PrintVerdict(std::ostream& out, const Advise::Advice& advice);
 
 // The command line of `mempool try` with these settings, for a shell. It has no option for a

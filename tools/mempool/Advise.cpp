@@ -46,6 +46,10 @@ advised       The settings that the verdict is about, with lines to paste: the b
 the program   'mempool record' estimates which share of its time its allocation calls take; recordings
               of one program differ by up to 30 % of it. What changes less than 1 % of the program's
               time is neither a gain nor a price.
+plan          From groups, as of 'mempool record --by caller', a plan of up to five pools: groups whose
+              blocks die together share a pool, so that one FreeAll replaces their frees, and all
+              other blocks share another. There is one if it gains more than the spread over the heap
+              and over one pool for all.
 mimalloc      Replayed too where it is installed. The verdict says so if it gains more than the pools.
 --seconds     Replays end at 1.4 times this at the latest. Ctrl-C or SIGTERM ends the search at once,
               and what was measured is printed.
@@ -72,21 +76,47 @@ void AddFigures(nlohmann::ordered_json& object, const Advise::Figures& figures) 
     object["bytes_held"] = static_cast<std::int64_t>(figures.bytes);
 }
 
+nlohmann::ordered_json JsonOf(const OBR::MemPool::PoolSettings& settings) {
+    nlohmann::ordered_json object;
+    for (const auto& row : OBR::MemPool::SettingTable::all) {
+        const unsigned int value = row.In(settings);
+        if (row.IsFlag()) {
+            object[row.key] = value != 0;
+        } else {
+            object[row.key] = value;
+        }
+    }
+    return object;
+}
+
+nlohmann::ordered_json JsonOf(const Advise::Plan& plan) {
+    nlohmann::ordered_json object = {{"sentence", plan.sentence},
+                                     {"pools", nlohmann::ordered_json::array()},
+                                     {"settings", JsonOf(plan.settings)}};
+    for (const Advise::PlannedPool& pool : plan.pools) {
+        object["pools"].push_back({{"groups", pool.groups},
+                                   {"blocks", pool.numBlocks},
+                                   {"peak_bytes", pool.peakBytes},
+                                   {"free_alls", pool.numFreeAlls},
+                                   {"first_free_all", pool.firstFreeAll},
+                                   {"frees_replaced", pool.numReplaced}});
+    }
+    AddFigures(object["planned"], plan.figures);
+    AddFigures(object["one_pool"], plan.onePool);
+    AddFigures(object["heap"], plan.heap);
+    return object;
+}
+
 nlohmann::ordered_json JsonOf(const Advise::Advice& advice) {
     using nlohmann::ordered_json;
-    const auto& [layer, program, findings, verdict, isStopped] = advice;
+    const auto& [layer, program, findings, verdict, plan, isStopped] = advice;
     ordered_json heap;
     AddFigures(heap, findings.heap);
     ordered_json mimalloc;
     if (findings.mimalloc.has_value()) { AddFigures(mimalloc, *findings.mimalloc); }
     ordered_json settings = ordered_json::array();
     for (const Advise::Measured& each : findings.settings) {
-        ordered_json& row = settings.emplace_back();
-        for (const auto& setting : OBR::MemPool::SettingTable::all) {
-            const unsigned int value = setting.In(each.settings);
-            row[setting.key] = setting.IsFlag() ? ordered_json(value != 0) : ordered_json(value);
-        }
-        AddFigures(row, each.figures);
+        AddFigures(settings.emplace_back(JsonOf(each.settings)), each.figures);
     }
     ordered_json environment = ordered_json::object();
     if (verdict.advised.has_value()) {
@@ -110,6 +140,7 @@ nlohmann::ordered_json JsonOf(const Advise::Advice& advice) {
             {"price", verdict.Price()},
             {"sentences", verdict.sentences},
             {"environment", environment},
+            {"plan", plan.has_value() ? JsonOf(*plan) : ordered_json()},
             {"allocation_share", OrNull(program.allocationShare)}};
 }
 
@@ -117,7 +148,7 @@ int AdviseOn(const Options& options) {
     Trace::StepReader reader(options.path);
     const Progress progress(reader.Name());
     const Advise::Advice advice =
-        Advise::TakeAdvice(reader, {options.layer, false, 0. + options.seconds},
+        Advise::TakeAdvice(reader, {options.layer, 0. + options.seconds},
                            [&](const std::string& text) { progress.Show(text); });
     progress.Clear();
     if (options.json) {
@@ -136,7 +167,7 @@ int AdviseOn(const Options& options) {
 }  // namespace
 
 std::string AdviceAsJson(const Advise::Advice& advice) {
-    return JsonOf(advice).dump(2);
+    return JsonOf(advice).dump(2, ' ', false, nlohmann::json::error_handler_t::replace);
 }
 
 void AddAdvise(Program& program) {

@@ -40,10 +40,11 @@ NUV_OBR_MEMPOOL_TRACE=1, plain or compressed by gzip. In a text, only lines with
 Settings without an option on the command line come from their environment variables, such as
 NUV_OBR_MEMPOOL_BUCKET_SIZE.
 
-pool          --layer heap: an OBR::MemPool::Heap for each traced pool, with blocks aligned to 8
-              bytes. mgr: an OBR::MemPool::Mgr for each, with blocks aligned to 4 bytes or less.
-              malloc: the library that 'mempool try' preloads, with one Heap for all, blocks aligned
-              to 16 bytes, and larger blocks from the C library.
+pool          --layer heap: an OBR::MemPool::Heap for each pool of the program, or one for all groups
+              of a recorded heap, with blocks aligned to 8 bytes. mgr: the same with
+              OBR::MemPool::Mgr, and blocks aligned to 4 bytes or less. malloc: the library that
+              'mempool try' preloads, with one Heap for all, blocks aligned to 16 bytes, and larger
+              blocks from the C library.
 heap          operator new[] and delete[]. Blocks that a pool drops are freed one by one; that time
               does not count at the end of a pool. A replay does not write to blocks.
 the peak      The moment with the most requested bytes.
@@ -79,8 +80,9 @@ void AddRow(Table& table, const char* label, double pool, double heap, int digit
 int Compare(const std::string& path, const Options& options) {
     Trace::StepReader reader(path);
     const Progress progress(reader.Name());
-    const Replay::Recording recording = Replay::ReadRecording(
+    Replay::Recording recording = Replay::ReadRecording(
         reader, [&](auto position) { progress.Show(fmt::format("line {}", position)); });
+    Replay::MergePools(recording);
     if (recording.steps.empty()) { throw std::runtime_error(reader.Name() + ": no event"); }
 
     constexpr double unlimited = std::numeric_limits<double>::infinity();
@@ -125,7 +127,7 @@ int Sweep(const std::string& path, const Options& options) {
     Trace::StepReader reader(path);
     const Progress progress(reader.Name());
     const Advise::Advice advice =
-        Advise::TakeAdvice(reader, {options.layer, false, 0. + options.seconds},
+        Advise::TakeAdvice(reader, {options.layer, 0. + options.seconds},
                            [&](const std::string& text) { progress.Show(text); });
     progress.Clear();
     std::cout << reader.Name() << '\n';

@@ -13,9 +13,9 @@
 #include <fmt/format.h>
 
 #include "mempool/Print.hpp"
+#include "mempool/Readable.hpp"
 #include "mempool/SafeText.hpp"
 #include "mempool/Table.hpp"
-#include "trace/CutText.hpp"
 
 namespace Tool {
 
@@ -23,26 +23,6 @@ namespace {
 
 using Report::Analysis;
 using Report::Tally;
-
-// 1234567 as 1,234,567.
-std::string Count(std::uint64_t number) {
-    std::string text = std::to_string(number);
-    for (std::size_t end = text.size(); end > 3; end -= 3) { text.insert(end - 3, ","); }
-    return text;
-}
-
-// Three digits and a unit, which is a power of 1000.
-std::string Bytes(std::uint64_t bytes) {
-    constexpr std::array units = {"B ", "KB", "MB", "GB", "TB", "PB", "EB"};
-    auto value = static_cast<double>(bytes);
-    std::size_t unit = 0;
-    while (value >= 999.5 && unit + 1 < units.size()) {
-        value /= 1000;
-        ++unit;
-    }
-    const int digits = unit == 0 || value >= 99.95 ? 0 : value >= 9.995 ? 1 : 2;
-    return fmt::format("{:.{}f} {}", value, digits, units.at(unit));
-}
 
 std::string Percent(std::uint64_t part, std::uint64_t whole) {
     if (whole == 0) { return "-"; }
@@ -57,17 +37,6 @@ std::uint64_t ShortLived(const Tally& tally) {
 std::string Fact(const Analysis& analysis, const char* key) {
     const auto fact = analysis.facts.find(key);
     return fact == analysis.facts.end() ? "" : SafeText(fact->second);
-}
-
-// A name; if it is too long, without template arguments, and then without its middle.
-std::string ShortName(std::string name, std::size_t bytes) {
-    while (name.size() > bytes) {
-        const std::size_t end = name.find('>');
-        const std::size_t begin = end == std::string::npos ? end : name.rfind('<', end);
-        if (begin == std::string::npos) { break; }
-        name.erase(begin, end + 1 - begin);
-    }
-    return Trace::CutText(name, bytes);
 }
 
 // Two columns without headings: a label and a text.

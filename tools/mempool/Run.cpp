@@ -43,8 +43,8 @@ report' and 'mempool advise' for its trace to standard error. The program's own 
 do not change. If recording fails or the page cannot be written, the status is 125, 126 or 127, as of
 'mempool record'. The trace is in a file without a name in TMPDIR or /tmp, and is gone at the end.
 
-The report is by caller by default. The advice is for one pool for all groups, by default on the
-library that 'mempool try' preloads, and ends with the command line that tries it.
+The report is by caller by default. The advice is by default on the library that 'mempool try'
+preloads, and ends with the command line that tries it.
 
 Ctrl-C ends the program, and mempool reports on what was recorded. During the search for settings it
 ends the search, and mempool prints what was measured.
@@ -104,7 +104,7 @@ std::string AdviseOn(const NamelessFile& trace, const Options& options) {
     Trace::StepReader reader = Open(trace, options);
     const Progress progress("mempool");
     const Advise::Advice advice =
-        Advise::TakeAdvice(reader, {options.layer, !options.order.pools, 0. + options.seconds},
+        Advise::TakeAdvice(reader, {options.layer, 0. + options.seconds},
                            [&](const std::string& text) { progress.Show(text); });
     progress.Clear();
     std::cerr << '\n';

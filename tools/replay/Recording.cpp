@@ -11,6 +11,16 @@ namespace Replay {
 
 namespace {
 
+// Whether the pools of the trace are groups that `mempool record` has made of a heap. Pools that
+// are cleared or destroyed are real, whatever the trace says.
+bool HasGroups(const Trace::StepReader& reader, const std::vector<Trace::Step>& steps) {
+    const auto by = reader.Facts().find("by");
+    return by != reader.Facts().end() && by->second != "pools" &&
+           std::none_of(steps.begin(), steps.end(), [](const Trace::Step& step) {
+               return step.kind == Trace::Kind::Cleared || step.kind == Trace::Kind::Destroyed;
+           });
+}
+
 class Recorder {
 public:
     explicit Recorder(std::size_t max) : maxSteps(max) {}
@@ -97,7 +107,9 @@ Recording ReadRecording(Trace::StepReader& reader,
             recorder.Add(step, reader.Blocks());
             if (number % interval == 0) { atEvent(reader.Position()); }
         }
-        return recorder.Finish(reader.Blocks());
+        Recording recording = recorder.Finish(reader.Blocks());
+        recording.hasGroups = HasGroups(reader, recording.steps);
+        return recording;
     };
     // In another thread, which has an arena of its own in the C library: the heap of the calling
     // thread, which a replay uses, stays as fresh as that of a new program.
@@ -105,11 +117,8 @@ Recording ReadRecording(Trace::StepReader& reader,
 }
 
 void MergePools(Recording& recording) {
+    if (!recording.hasGroups) { return; }
     std::vector<Trace::Step>& steps = recording.steps;
-    const auto drops = [](const Trace::Step& step) {
-        return step.kind == Trace::Kind::Cleared || step.kind == Trace::Kind::Destroyed;
-    };
-    if (recording.pools.size() < 2 || std::any_of(steps.begin(), steps.end(), drops)) { return; }
     std::size_t kept = 0;
     std::size_t keptToPeak = 0;
     for (std::size_t i = 0; i < steps.size(); ++i) {
@@ -121,7 +130,8 @@ void MergePools(Recording& recording) {
     }
     steps.resize(kept);
     recording.peakSteps = keptToPeak;
-    recording.pools.resize(1);
+    recording.pools.resize(std::min<std::size_t>(recording.pools.size(), 1));
+    recording.hasGroups = false;
 }
 
 }  // namespace Replay

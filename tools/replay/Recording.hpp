@@ -20,6 +20,7 @@ struct Recording {
     std::vector<Trace::Step> steps;
     std::vector<std::uint32_t> dropped;  // Indices of blocks.
     std::vector<Trace::Pool> pools;      // Each pool ever created.
+    bool hasGroups = false;              // They are groups of a recorded heap, not real pools.
     std::uint32_t numBlocks = 0;         // All indices of blocks are below this.
 
     std::uint64_t numLeftOut = 0;  // Steps after the last one that was kept.
@@ -40,8 +41,7 @@ Recording ReadRecording(Trace::StepReader& reader,
                         const std::function<void(std::uint64_t position)>& atEvent,
                         std::size_t maxSteps = std::numeric_limits<std::size_t>::max());
 
-// Merges all pools into one, as if the recording had no groups. Does nothing if a pool is cleared
-// or destroyed: then these are real pools, not groups of a heap.
+// Merges the groups of a heap into one pool. Leaves real pools as they are.
 void MergePools(Recording& recording);
 
 }  // namespace Replay

@@ -27,18 +27,19 @@ public:
     void Release() { ++current; }
 
     // Called at the next allocation and at the end, with the number of live blocks of the group.
-    void End(std::uint64_t numLive) {
+    // Returns the number of blocks that one Clear would drop in place of the run, or 0.
+    std::uint64_t End(std::uint64_t numLive) {
+        const std::uint64_t cleared = current >= 2 && numLive == 0 ? current : 0;
         if (current >= 2) {
             ++numRuns;
             together += current;
             byLength[LengthBin(current)] += current;
             longest = std::max(longest, current);
-            if (numLive == 0) {
-                ++numClears;
-                clearable += current;
-            }
         }
+        if (cleared != 0) { ++numClears; }
+        clearable += cleared;
         current = 0;
+        return cleared;
     }
 
     // Adds the runs of another group, all of which have ended.
