@@ -16,6 +16,8 @@
 #include "Folder.hpp"
 
 using testing::HasSubstr;
+using testing::Not;
+using testing::StartsWith;
 
 namespace {
 
@@ -70,6 +72,14 @@ TEST(Run, EndsAsTheProgramDoes) {
     const Ended interrupted = Mempool("sleep 20; exit $?", "timeout --foreground -s INT 1");
     EXPECT_EQ(interrupted.status, 124);
     EXPECT_THAT(interrupted.errors, HasSubstr("   program               sleep 20\n"));
+    const Ended cut = Mempool("sh -c 'exec " STATIC_HOST "'");
+    EXPECT_THAT(cut.errors, HasSubstr("   SIZES"));
+    EXPECT_THAT(cut.errors, Not(HasSubstr("   Events: ")));
+    const Ended full = Mempool(
+        "sh -c 'prlimit --fsize=400 --pid $PPID; "
+        "exec awk \"BEGIN { while (++i < 99999) a[i] = i }\"'");
+    EXPECT_EQ(full.status, 125);
+    EXPECT_THAT(full.errors, StartsWith("mempool: " + FolderPath() + "/traces/mempool."));
 }
 
 TEST(Run, RunsNothingIfThePageCannotBeWritten) {

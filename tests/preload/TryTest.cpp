@@ -16,13 +16,14 @@
 using nlohmann::json;
 using testing::HasSubstr;
 using testing::Not;
+using testing::StartsWith;
 
 namespace {
 
 // What is written on the standard output; the errors are in a file.
-std::string Try(const std::string& arguments, int exitStatus = 0) {
+std::string Try(const std::string& arguments, int exitStatus = 0, const std::string& under = "") {
     const std::string command =
-        MEMPOOL " try --rounds 2 " + arguments + " 2>" + FolderPath() + "/errors";
+        under + MEMPOOL " try --rounds 2 " + arguments + " 2>" + FolderPath() + "/errors";
     std::FILE* const tool = popen(command.c_str(), "r");
     std::string text;
     for (int c = std::fgetc(tool); c != EOF; c = std::fgetc(tool)) { text += static_cast<char>(c); }
@@ -70,6 +71,12 @@ TEST(Try, SaysWhereTheOutputDiffers) {
         Try("--json --bucket-size 2010 -- sh -c 'echo $LD_PRELOAD $NUV_OBR_MEMPOOL_BUCKET_SIZE'"));
     EXPECT_EQ(own["same_output"], false);
     EXPECT_EQ(own["verdict"], "differs");
+    EXPECT_THAT(own["sentences"][0].get<std::string>(), HasSubstr("output or exit status"));
+    for (const char* program :
+         {"echo $LD_PRELOAD >&2", "head -c 99999 /dev/zero; echo $LD_PRELOAD"}) {
+        const json other = json::parse(Try(std::string("--json -- sh -c '") + program + "'"));
+        EXPECT_EQ(other["same_output"], false) << program;
+    }
     EXPECT_TRUE(json::parse(Try("--json sh -c 'echo $$'"))["same_output"].is_null());
     const json status = json::parse(Try("--json -- sh -c 'test -z \"$LD_PRELOAD\"'"));
     EXPECT_EQ(status["same_output"], false) << "The exit status counts too.";
@@ -81,21 +88,37 @@ TEST(Try, SaysWhereTheOutputDiffers) {
 // Each of two rounds begins with another side. Lines of mimalloc count only if they are wrong.
 TEST(Try, SetsTheEnvironmentOfEachRun) {
     setenv("LD_PRELOAD", ":", 1);
-    Try("-- sh -c 'echo ${LD_PRELOAD##*/} $NUV_OBR_MEMPOOL_ON | grep -v mimalloc.so.2::$ >>" +
+    setenv("NUV_OBR_MEMPOOL_BUCKET_SIZE", "2010", 1);
+    Try("-- sh -c 'echo ${LD_PRELOAD##*/} $NUV_OBR_MEMPOOL_ON $NUV_OBR_MEMPOOL_BUCKET_SIZE | "
+        "grep -v mimalloc.so.2::.2010$ >>" +
         FolderPath() + "/runs; true'");
     unsetenv("LD_PRELOAD");
-    EXPECT_EQ(Content("runs"), ":\nlibMallocOnPools.so:: 1\n:\n:\nlibMallocOnPools.so:: 1\n");
+    unsetenv("NUV_OBR_MEMPOOL_BUCKET_SIZE");
+    EXPECT_EQ(Content("runs"),
+              ": 2010\nlibMallocOnPools.so:: 1 2010\n: 2010\n"
+              ": 2010\nlibMallocOnPools.so:: 1 2010\n");
 }
 
 TEST(Try, EndsAsTheProgramDoes) {
-    EXPECT_EQ(Try("sh -c 'echo once; exit 3'", 3), "once\n");
+    EXPECT_EQ(Try("sh -c 'echo once; echo wrong >&2; exit 3'", 3), "once\n");
+    EXPECT_THAT(Errors(), StartsWith("wrong\n\n"));
     EXPECT_THAT(Errors(), HasSubstr("\n   Rounds: 2\n"));
     EXPECT_THAT(Errors(), HasSubstr("\n   pools "));
     Try("sh -c 'kill $$'; exit $?", 128 + 15);
     Try("/nowhere/program", 127);
+    Try(STATIC_HOST, 126);
     Try("--bucket-size 100 true", 125);
     EXPECT_THAT(Errors(), HasSubstr("mempool: no pool can have these settings: "));
     Try("--stdin /nowhere true", 125);
+}
+
+TEST(Try, StopsInAnyRun) {
+    const std::string none = "mempool: stopped before the end of the first round\n";
+    Try("sleep 20", 128 + 2, "timeout --foreground --preserve-status -s INT 1 ");
+    EXPECT_EQ(Errors(), none);
+    // The second run on malloc is the last one of the first round.
+    Try("sh -c 'test -n \"$LD_PRELOAD\" || mkdir " + FolderPath() + "/first || kill -INT $PPID'");
+    EXPECT_THAT(Errors(), HasSubstr(none));
 }
 
 }  // namespace

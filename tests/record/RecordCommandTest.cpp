@@ -337,7 +337,7 @@ TEST(Record, RefusesWhatCannotBeRecorded) {
     const std::string record = MEMPOOL " record ";
     Shell::Output(
         "ln -sf " HOST
-        " Host; echo >plain; mkdir -p folder; "
+        " Host; echo >plain; mkdir -p folder; echo >folder/tool; "
         "printf '#!/lost/sh\\n' >inner; printf '#!./inner\\n' >script; chmod +x inner script");
     const auto refused = [&](const std::string& command, int status) {
         return Shell::Output(record + command, status);
@@ -347,6 +347,8 @@ TEST(Record, RefusesWhatCannotBeRecorded) {
               "mempool: ./lost/it: No such file or directory\n");
     EXPECT_EQ(refused("-o trace ./plain", 126), "mempool: ./plain: Permission denied\n");
     EXPECT_EQ(refused("-o trace ./folder", 126), "mempool: ./folder: Is a directory\n");
+    EXPECT_EQ(Shell::Output("PATH=folder:$PATH " + record + "-o trace tool", 126),
+              "mempool: tool: Permission denied\n");
     EXPECT_EQ(refused("-o trace ./script", 127),
               "mempool: ./script: /lost/sh: No such file or directory\n");
     EXPECT_EQ(refused("-o lost/trace ./Host", 125),
