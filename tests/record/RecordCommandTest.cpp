@@ -322,7 +322,7 @@ TEST(Record, WritesTheTraceWholeOrNotAtAll) {
     EXPECT_EQ(ReadTrace("link").story, "+70000 +70001 -70001 ");
     EXPECT_EQ(Shell::Output("umask 027; " MEMPOOL " record -o new true; stat -c %a new"), "640\n");
     // What was written before a write fails is kept. The program lowers the limit on files.
-    EXPECT_THAT(Shell::Output(MEMPOOL " record -o cut sh -c 'prlimit --fsize=4000 --pid $PPID; "
+    EXPECT_THAT(Shell::Output(MEMPOOL " record -o cut sh -c 'prlimit --fsize=1000 --pid $PPID; "
                                       "sleep 0.6; exec ./Host threads'",
                               125),
                 ContainsRegex("^mempool: cut: File too large; what was written before that is in "
