@@ -93,10 +93,10 @@ TEST(Plan, PutsLifetimesThatNestIntoOnePool) {
     const Replay::Recording& planned = proposal.recording;
     EXPECT_EQ(Left(planned), Left(heap.recording));
     // Two pools are created for six groups, and a run of 150 becomes one step.
-    EXPECT_EQ(planned.steps.size(), heap.recording.steps.size() - 4 - 3 * 149);
+    EXPECT_EQ(planned.steps.size(), heap.recording.steps.size() - 4 - 3 * std::size_t{149});
     EXPECT_EQ(planned.peakBytes, 10 * (150 + 4 + 400U)) << "At the end of the last run.";
     EXPECT_EQ(planned.peakBlocks, 150 + 4 + 400U);
-    EXPECT_EQ(planned.peakSteps, planned.steps.size() - 1 - 10 * 4);
+    EXPECT_EQ(planned.peakSteps, planned.steps.size() - 1 - 10 * std::size_t{4});
     EXPECT_GT(Replay::BytesHeld(planned, Replay::Layer::Heap), 5540);
     EXPECT_GT(Replay::NanosecondsPerEvent(planned, Replay::Layer::Heap), 0);
 }
