@@ -15,6 +15,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <ctime>
+#include <fstream>
 #include <new>
 #include <string>
 #include <thread>
@@ -260,7 +261,10 @@ int main(int argc, char** argv) {
     if (what == "load") { Load(); }
     if (what == "signals") { Signals(); }
     if (what == "spin") { Spin(); }
-    if (what == "allocate") { Allocate(); }
+    if (what == "allocate") {
+        Allocate();
+        std::ofstream("ticks") << std::clock();
+    }
     if (what == "stop") { Stop(); }
     if (what == "interrupts") { CountInterrupts(); }
     if (what == "run") { Run(); }

@@ -21,12 +21,17 @@ struct Derived : Mgr {
     using Mgr::Mgr;
 };
 
-// With nobody to drain the channel, which fills with events of two slots. They are not at even
-// places.
+// With nobody to drain the channel, which fills with events of two slots. One of a single slot is
+// among them, so that half of the last one has room.
 void Fill() {
+    NUV_OBR_MEMPOOL_ON(true);
     Mgr pool("pool");
+    usleep(100000);  // All events so far are drained.
     kill(getppid(), SIGSTOP);
-    for (int count = 0; count != 300000; ++count) { pool.Free(pool.Alloc(8)); }
+    for (int count = 0; count != 300000; ++count) {
+        if (count == 100000) { pool.Clear(); }
+        pool.Free(pool.Alloc(8));
+    }
 }
 
 int main(int argc, char**) {
