@@ -94,7 +94,7 @@ TEST(Report, IsAPageUnlessAllIsRequested) {
     EXPECT_THAT(page, HasSubstr("\n   1.00 MB  ")) << "999,600 bytes.";
     EXPECT_THAT(page, HasSubstr("SIZES WITH MOST BLOCKS (6 of 51)"));
     EXPECT_THAT(page, HasSubstr("\n   blocks  3.9 %  5.9 %  94.1 %\n"));
-    EXPECT_THAT(page, HasSubstr("  149nnnnnnnnnnnnnn...nnnnnnnn-the-end\n"));
+    EXPECT_THAT(page, HasSubstr("  149<..>nnnnnnnnnn...nnnnnnnn-the-end\n"));
     const std::string all = Tool("--all many");
     EXPECT_THAT(all, HasSubstr("149" + longName + "\n"));
     EXPECT_THAT(all, HasSubstr("100" + longName + "\n"));

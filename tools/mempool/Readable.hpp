@@ -34,13 +34,16 @@ inline std::string Bytes(std::uint64_t bytes) {
     return fmt::format("{:.{}f} {}", value, digits, units.at(unit));
 }
 
-// A name; if it is too long, without template arguments, and then without its middle.
+// A name; if it is too long, with "<..>" for template arguments, and then without its middle.
 inline std::string ShortName(std::string name, std::size_t bytes) {
     while (name.size() > bytes) {
         const std::size_t end = name.find('>');
         const std::size_t begin = end == std::string::npos ? end : name.rfind('<', end);
         if (begin == std::string::npos) { break; }
-        name.erase(begin, end + 1 - begin);
+        name.replace(begin, end + 1 - begin, 1, '\0');
+    }
+    for (std::size_t place = 0; (place = name.find('\0', place)) != std::string::npos;) {
+        name.replace(place, 1, "<..>");
     }
     return Trace::CutText(name, bytes);
 }
