@@ -9,7 +9,7 @@ for job in "$@"; do
     case $job in
         build) packages+=(g++ cmake ninja-build libcli11-dev) ;;
         tools) packages+=(zlib1g-dev libzstd-dev libdw-dev libiberty-dev libfmt-dev nlohmann-json3-dev) ;;
-        test) packages+=(liblua5.4-dev lua5.4 libsqlite3-dev sqlite3 libxml2-dev duktape-dev libexpat1-dev libgmock-dev zlib1g-dev libzstd-dev libdw-dev libiberty-dev libfmt-dev nlohmann-json3-dev libjs-d3 chromium chromium-driver python3-selenium python3-pil clang libclang-rt-14-dev binutils pkg-config gdb pandoc python3 valgrind) ;;
+        test) packages+=(liblua5.4-dev lua5.4 libsqlite3-dev sqlite3 libxml2-dev duktape-dev libexpat1-dev libgmock-dev zlib1g-dev libzstd-dev libdw-dev libiberty-dev libfmt-dev nlohmann-json3-dev libjs-d3 chromium chromium-driver python3-selenium python3-pil clang libclang-rt-14-dev lld binutils pkg-config gdb pandoc python3 valgrind) ;;
         lint) packages+=(git clang-format clang-tidy shellcheck) ;;
         package) packages+=(git dpkg-dev file lintian mmdebstrap) ;;
         docs) packages+=(doxygen) ;;

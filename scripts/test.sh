@@ -16,8 +16,9 @@ esac
 
 step "Packages"
 scripts/install-packages.sh build test
-# No part may be missing here, and no test with it.
-options=(-DOBR_MEMPOOL_EXAMPLES=ON -DOBR_MEMPOOL_TOOLS=ON -DOBR_MEMPOOL_TESTS=ON)
+# No part may be missing here, and no test with it. lld links sanitized programs in a quarter of the time.
+options=(-DOBR_MEMPOOL_EXAMPLES=ON -DOBR_MEMPOOL_TOOLS=ON -DOBR_MEMPOOL_TESTS=ON
+    -DCMAKE_EXE_LINKER_FLAGS=-fuse-ld=lld)
 for preset in "${presets[@]}"; do
     build "$preset"
 done
