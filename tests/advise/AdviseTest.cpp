@@ -90,9 +90,9 @@ TEST(Advise, TextFiguresVerdictAndEnvironmentAgree) {
 }
 
 TEST(Advise, PrintsWhatItHasWhenItIsStopped) {
-    const std::string path = TraceFile("long", Blocks("", 100000));  // Takes far longer.
+    const std::string path = TraceFile("long", Blocks("", 300000));  // Takes longer.
     const json advice = json::parse(
-        Command("timeout -s TERM 6 " MEMPOOL " advise --json --seconds 60 " + path, 124));
+        Command("timeout -s TERM 8 " MEMPOOL " advise --json --seconds 60 " + path, 124));
     EXPECT_EQ(advice["stopped"], true);
     EXPECT_GE(advice["settings"].size(), 1U);
 }
