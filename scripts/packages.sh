@@ -14,7 +14,7 @@ mkdir -p "$top"
 
 # The bare Debian has what the programs and the tools need. It is made while the packages are built, and
 # kept for the next run.
-inRoot=(g++ clang cmake make pkg-config gdb libdw1)
+inRoot=(g++ clang cmake make pkg-config gdb libdw1 libfmt9)
 isBare=true
 [ "$(id -u)" -eq 0 ] || isBare=false
 if $isBare && [ "$(cat "$top/root.made" 2>/dev/null)" != "${inRoot[*]}" ]; then
