@@ -71,6 +71,9 @@ TEST(Advice, HasAPlanForGroupsThatDieTogether) {
         Trace::StepReader reader(ReadLines(Lines(lines)), "trace");
         advice = Advise::TakeAdvice(reader, {Replay::Layer::Malloc, 1}, [](const std::string&) {});
     }
+    Trace::StepReader again(ReadLines(Lines(lines)), "trace");
+    EXPECT_FALSE(
+        Advise::TakeAdvice(again, {Replay::Layer::Malloc, 1, false}, [](const auto&) {}).plan);
     ASSERT_TRUE(advice.plan.has_value());
     EXPECT_EQ(advice.plan->pools.at(0).groups, std::vector<std::string>{"tree"});
     EXPECT_LT(advice.plan->figures.time, advice.plan->onePool.time);

@@ -41,7 +41,7 @@ Advice TakeAdvice(Trace::StepReader& reader, const Question& question,
     if (recording.peakBlocks == 0) {
         throw std::runtime_error(reader.Name() + ": no block was allocated");
     }
-    const Proposal proposal = ProposeInThread(recording);
+    const Proposal proposal = question.hasPlan ? ProposeInThread(recording) : Proposal();
     Replay::MergePools(recording);
 
     Advice advice;

@@ -29,6 +29,7 @@ struct Advice {
 struct Question {
     Replay::Layer layer = Replay::Layer::Heap;
     double seconds = 30;  // The approximate time of the search.
+    bool hasPlan = true;  // Whether a plan of pools is wanted too.
 };
 
 // From the part of the trace that is replayed, and its facts.

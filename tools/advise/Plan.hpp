@@ -47,8 +47,8 @@ struct Plan {
 Proposal ProposePools(const Replay::Recording& recorded);
 
 // Measures the proposal in turns with one pool that has these settings and with the heap, for so
-// many seconds. The plan has the same settings, or others that suit it better. There is none if it
-// gains nothing over one pool or nothing over the heap.
+// many seconds. The pools of the plan have the same settings, and keep empty buckets. There is none
+// if it gains nothing over one pool or nothing over the heap.
 std::optional<Plan> MeasurePlan(const Proposal& proposal,
                                 const OBR::MemPool::PoolSettings& settings, const Program& program,
                                 Meter& meter, double seconds);

@@ -48,8 +48,8 @@ the program   'mempool record' estimates which share of its time its allocation 
               time is neither a gain nor a price.
 plan          From groups, as of 'mempool record --by caller', a plan of up to five pools: groups whose
               blocks die together share a pool, so that one FreeAll replaces their frees, and all
-              other blocks share another. There is one if it gains more than the spread over the heap
-              and over one pool for all.
+              other blocks share another, and all keep their empty buckets. There is one if it gains
+              more over the heap, and over one pool for all, than its median varies.
 mimalloc      Replayed too where it is installed. The verdict says so if it gains more than the pools.
 --seconds     Replays end at 1.4 times this at the latest. Ctrl-C or SIGTERM ends the search at once,
               and what was measured is printed.

@@ -127,7 +127,7 @@ int Sweep(const std::string& path, const Options& options) {
     Trace::StepReader reader(path);
     const Progress progress(reader.Name());
     const Advise::Advice advice =
-        Advise::TakeAdvice(reader, {options.layer, 0. + options.seconds},
+        Advise::TakeAdvice(reader, {options.layer, 0. + options.seconds, false},
                            [&](const std::string& text) { progress.Show(text); });
     progress.Clear();
     std::cout << reader.Name() << '\n';
