@@ -11,7 +11,8 @@ Bucket* Bucket::Create(Group* parent, std::uint32_t bucketSize, std::uint32_t re
     const std::uint32_t totalRecs = RecsWithin(bucketSize, recSize);
     const std::uint32_t size = firstOffset + totalRecs * recSize;
 
-    auto* const bucket = static_cast<Bucket*>(::operator new[](baseDistance + size));
+    char* const block = static_cast<char*>(::operator new[](shift + baseDistance + size));
+    auto* const bucket = reinterpret_cast<Bucket*>(block + shift);
     bucket->parent = parent;
     bucket->next1 = nullptr;
     bucket->prev1 = nullptr;
@@ -40,7 +41,7 @@ void Bucket::Destroy(Bucket* bucket) {
     bucket->next2 = nullptr;
     bucket->prev2 = nullptr;
     KeepStores(bucket);
-    ::operator delete[](bucket);
+    ::operator delete[](reinterpret_cast<char*>(bucket) - shift);
 }
 
 }  // namespace OBR::MemPool

@@ -25,7 +25,9 @@ using SizeCounts = std::map<std::uint32_t, std::uint32_t>;
 
 // Invariants: used + numFree == TotalRecs(), size == 2 + TotalRecs() * recSize, and the free list
 // that starts at freeHead has numFree records.
-class Bucket {
+//
+// Packed, since a shifted bucket lies 4 bytes beside the multiples of 8.
+class __attribute__((packed, aligned(4))) Bucket {
 public:
     // In the order of memory. Reports and gdb read them as they are.
     Group* parent;           // The group that owns the bucket; null once it is destroyed.
@@ -39,6 +41,11 @@ public:
     std::uint16_t numFree;   // Free records. recsBase is the address of this field.
 
     static constexpr std::uint32_t baseDistance = 46;  // From the bucket's address to recsBase.
+
+    // Bytes from the start of the heap block to the bucket. It is 0, and a heap block the bucket
+    // alone, unless a program that contains the library sets it, while it has no bucket. With 12
+    // the data of all records whose size is a multiple of 16 lie at multiples of 16.
+    static inline std::uint32_t shift = 0;
 
     Bucket() = delete;
 

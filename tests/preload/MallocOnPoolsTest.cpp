@@ -86,13 +86,17 @@ TEST(MallocOnPoolsTest, ServesEverySize) {
     EXPECT_EQ(Realloc(none, 0), nullptr);
     free(nullptr);
     EXPECT_EQ(malloc_usable_size(nullptr), 0U);
-    // Up to the largest record of 1000 bytes. The bytes before a block show where it came from.
-    void* const inPool = Malloc(984);
+    // Up to the largest record of 1000 bytes, in multiples of 16. The bytes before a block show
+    // where it came from.
+    void* const inPool = Malloc(988);
     EXPECT_NE(static_cast<std::uint32_t*>(inPool)[-1], 0U);
-    void* const beyond = Malloc(985);
+    void* const beyond = Malloc(989);
     EXPECT_EQ(static_cast<std::uint32_t*>(beyond)[-1], 0U);
     free(inPool);
     free(beyond);
+    void* const small = Malloc(12);
+    EXPECT_EQ(malloc_usable_size(small), 12U) << "16 bytes in all.";
+    free(small);
 }
 
 TEST(MallocOnPoolsTest, ClearsAndRefuses) {

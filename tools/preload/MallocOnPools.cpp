@@ -3,8 +3,9 @@
 //     LD_PRELOAD=.../libMallocOnPools.so NUV_OBR_MEMPOOL_BUCKET_SIZE=65450 perl ...
 //
 // It replaces the malloc family. Blocks up to the largest record come from one Heap, aligned to 16
-// bytes as malloc promises. Larger ones come from the C library, which can grow them in place. The
-// settings are those of the environment, with two exceptions: pools are on, unless
+// bytes as malloc promises: see Replay::MallocHeap. Larger ones come from the C library, which can
+// grow them in place, and so do those that need more alignment. The settings are those of the
+// environment, with two exceptions: pools are on, unless
 // NUV_OBR_MEMPOOL_ON disables them (then all blocks come from the C library), and there is no
 // trace. MALLOC_ON_POOLS_REPORT=FILE appends the pool's report to FILE when a process exits.
 //
@@ -12,11 +13,11 @@
 // Programs with threads work, but all of them share that lock.
 //
 // Whose block? A block of the C library has its size in the 8 bytes before it, so that the 4 bytes
-// directly before it are 0 below 4 GB, and never look like what a Heap writes there. A Heap thus
-// refuses such a block after one look, even if it was allocated before this library was ready, in
-// another thread, or by the C library itself.
+// directly before it are 0 below 4 GB, and never look like the header of a record. This holds even
+// for a block that was allocated before this library was ready, in another thread, or by the C
+// library itself.
 
-#include <MemPoolHeap>
+#include <MemPoolSettings>
 
 #include <dlfcn.h>
 #include <pthread.h>
@@ -37,16 +38,18 @@
 #include <mutex>
 #include <new>
 
-#include "replay/Layer.hpp"
+#include "replay/MallocHeap.hpp"
+
+#define SLOW_PATH __attribute__((noinline))
 
 // The C library's own functions, by names that no library replaces.
 // NOLINTBEGIN(bugprone-reserved-identifier)
 extern "C" {
-void* __libc_malloc(std::size_t size);
-void* __libc_calloc(std::size_t count, std::size_t size);
-void* __libc_realloc(void* block, std::size_t size);
-void* __libc_memalign(std::size_t alignment, std::size_t size);
-void __libc_free(void* block);
+void* __libc_malloc(std::size_t size) noexcept;
+void* __libc_calloc(std::size_t count, std::size_t size) noexcept;
+void* __libc_realloc(void* block, std::size_t size) noexcept;
+void* __libc_memalign(std::size_t alignment, std::size_t size) noexcept;
+void __libc_free(void* block) noexcept;
 
 // Where this library begins and where its code ends.
 extern char __ehdr_start __attribute__((visibility("hidden")));
@@ -56,55 +59,62 @@ extern char etext __attribute__((visibility("hidden")));
 
 namespace {
 
-using OBR::MemPool::Heap;
+using OBR::MemPool::Bucket;
+using Replay::MallocHeap;
 
-using Replay::alignmentOfMalloc;
-
-Heap* heap = nullptr;  // Lives from the start-up to the end of the process, after all exit steps.
+// Lives from the start-up to the end of the process, after all exit steps.
+MallocHeap* heap = nullptr;
 
 // Blocks of fewer bytes than this come from the heap. 0 while the heap must not be used: before the
 // start-up, while it prints its report, and while its exception is thrown to the caller.
 std::atomic<std::size_t> limit{0};
-std::size_t usualLimit = 0;  // What it is otherwise.
 
 std::recursive_mutex mutex;  // A report, and an exception, give blocks back on their way.
 
-// Does it while no other thread is in the heap.
+// Does it while no other thread is in the heap. Actions are passed by value, in registers.
 template <typename Action>
-auto Alone(const Action& action) {
-    if (__libc_single_threaded != 0) { return action(); }
+SLOW_PATH auto WithLock(Action action) noexcept {
     const std::lock_guard<std::recursive_mutex> lock(mutex);
     return action();
 }
+template <typename Action>
+auto Alone(Action action) noexcept {
+    return __libc_single_threaded == 0 ? WithLock(action) : action();
+}
 
-void* Fail(int error) {
+bool IsBelowLimit(std::size_t size) {
+    return size < limit.load(std::memory_order_relaxed);
+}
+
+// Null for a block of the C library.
+Bucket* BucketOf(void* block) {
+    return heap == nullptr || block == nullptr ? nullptr : MallocHeap::BucketOf(block);
+}
+
+SLOW_PATH void* Fail(int error) {
     errno = error;
     return nullptr;
 }
 
-// A block of the heap; null, with the reason in errno, if there is no memory.
-void* Take(std::size_t size, std::size_t alignment) {
-    return Alone([&]() -> void* {
+// A block of the heap; null, with the reason in errno, if there is no memory. This and the next are
+// not inline, so that malloc and free only decide and jump.
+SLOW_PATH void* Take(std::size_t size) noexcept {
+    return Alone([size]() -> void* {
         try {
-            return heap->Allocate(size, alignment);
+            return heap->Allocate(size);
         } catch (const std::bad_alloc&) {
-            limit = usualLimit;
+            limit = heap->Limit();
             return Fail(ENOMEM);
         }
     });
 }
 
-// 0 for what is no block of the heap.
-std::size_t Usable(void* block) {
-    return heap == nullptr ? 0 : Alone([&] { return heap->UsableSize(block); });
+SLOW_PATH void GiveBack(void* block, Bucket* bucket) noexcept {
+    Alone([block, bucket] { MallocHeap::Free(block, bucket); });
 }
 
 void* Aligned(std::size_t alignment, std::size_t size) {
-    alignment = std::max(alignment, alignmentOfMalloc);
-    if (alignment <= 4096 && size + alignment - alignmentOfMalloc < limit) {
-        return Take(size, alignment);
-    }
-    return __libc_memalign(alignment, size);
+    return alignment <= Replay::alignmentOfMalloc ? malloc(size) : __libc_memalign(alignment, size);
 }
 
 bool IsPowerOfTwo(std::size_t number) {
@@ -134,7 +144,7 @@ __attribute__((constructor)) void StartUp() {
     if (std::getenv("NUV_OBR_MEMPOOL_ON") != nullptr && !NUV_OBR_MEMPOOL_ON()) { return; }
     NUV_OBR_MEMPOOL_TRACE(false);  // Writing a line may allocate, which would be traced again.
     try {
-        heap = new Heap("malloc", Replay::HeapSettingsOf(OBR::MemPool::PoolSettings::OfProcess()));
+        heap = new MallocHeap(PoolSettings::OfProcess());
     } catch (const std::exception& error) {
         std::fprintf(stderr, "MallocOnPools: %s\n", error.what());
         std::_Exit(1);
@@ -144,8 +154,7 @@ __attribute__((constructor)) void StartUp() {
     pthread_atfork([] { mutex.lock(); }, [] { mutex.unlock(); },
                    [] { ::new (&mutex) std::recursive_mutex; });
 
-    usualLimit = Replay::MallocLimit(NUV_OBR_MEMPOOL_MAX_RECORD_SIZE());
-    limit = usualLimit;
+    limit = heap->Limit();
 }
 
 __attribute__((destructor)) void Report() {
@@ -158,7 +167,7 @@ __attribute__((destructor)) void Report() {
     heap->Report();
     std::cout.rdbuf(output);
     if (!file.flush()) { std::fprintf(stderr, "MallocOnPools: cannot write %s\n", name); }
-    limit = usualLimit;
+    limit = heap->Limit();
 }
 
 }  // namespace
@@ -183,37 +192,37 @@ void operator delete(void* block, std::size_t) noexcept {
 extern "C" {
 
 void* malloc(std::size_t size) noexcept {
-    return size < limit.load(std::memory_order_relaxed) ? Take(size, alignmentOfMalloc)
-                                                        : __libc_malloc(size);
+    return IsBelowLimit(size) ? Take(size) : __libc_malloc(size);
 }
 
 void free(void* block) noexcept {
-    const bool isOfHeap = heap != nullptr && Alone([block] { return heap->Free(block); });
-    if (!isOfHeap) { __libc_free(block); }
+    Bucket* const bucket = BucketOf(block);
+    return bucket == nullptr ? __libc_free(block) : GiveBack(block, bucket);
 }
 
 void* calloc(std::size_t count, std::size_t size) noexcept {
     std::size_t bytes = 0;
     if (__builtin_mul_overflow(count, size, &bytes)) { return Fail(ENOMEM); }
-    if (bytes >= limit.load(std::memory_order_relaxed)) { return __libc_calloc(count, size); }
-    void* const block = Take(bytes, alignmentOfMalloc);
+    if (!IsBelowLimit(bytes)) { return __libc_calloc(count, size); }
+    void* const block = Take(bytes);
     return block == nullptr ? nullptr : std::memset(block, 0, bytes);
 }
 
 // A block that shrinks stays in its place, unless less than half of it would be used.
 void* realloc(void* block, std::size_t size) noexcept {
     if (block == nullptr) { return malloc(size); }
-    const std::size_t usable = Usable(block);
-    if (usable == 0) { return __libc_realloc(block, size); }
+    Bucket* const bucket = BucketOf(block);
+    if (bucket == nullptr) { return __libc_realloc(block, size); }
     if (size == 0) {
-        free(block);
+        GiveBack(block, bucket);
         return nullptr;
     }
+    const std::size_t usable = bucket->DataSize();
     if (size <= usable && size >= usable / 2) { return block; }
     void* const moved = malloc(size);
     if (moved == nullptr) { return size <= usable ? block : nullptr; }
     std::memcpy(moved, block, std::min(size, usable));
-    free(block);
+    GiveBack(block, bucket);
     return moved;
 }
 
@@ -245,8 +254,7 @@ void* aligned_alloc(std::size_t alignment, std::size_t size) noexcept {
 
 std::size_t malloc_usable_size(void* block) noexcept {
     if (block == nullptr) { return 0; }
-    const std::size_t usable = Usable(block);
-    if (usable != 0) { return usable; }
+    if (const Bucket* const bucket = BucketOf(block)) { return bucket->DataSize(); }
     if (usableSizeOfLibrary == nullptr) { FindUsableSize(); }
     return usableSizeOfLibrary(block);
 }

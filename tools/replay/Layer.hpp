@@ -23,16 +23,25 @@ enum class Layer : std::uint8_t {
 
 constexpr std::size_t alignmentOfMalloc = 16;
 
-// The preloaded library serves blocks of fewer bytes than this from its Heap. The others come from
-// the C library. A record has up to 16 bytes more than its block, for the header and the alignment.
-constexpr std::size_t MallocLimit(std::size_t maxRecordSize) {
-    return maxRecordSize < 2 * alignmentOfMalloc
-               ? 0
-               : ((maxRecordSize - alignmentOfMalloc) & ~std::size_t{7}) + 1;
-}
+// The sizes of the records from which the preloaded library serves malloc: see MallocHeap.
+struct MallocRecords {
+    OBR::MemPool::PoolSettings settings;       // Of the Heap.
+    std::size_t mask = alignmentOfMalloc - 1;  // The sizes are multiples of mask + 1.
+    std::size_t limit = 0;                     // Blocks of so many bytes come from the C library.
 
-// The settings as a layer uses them: a Heap rounds the data alignment up to a multiple of 4.
+    explicit constexpr MallocRecords(const OBR::MemPool::PoolSettings& wanted) : settings(wanted) {
+        while (mask + 1 < wanted.dataAlignment) { mask = 2 * mask + 1; }
+        settings.dataAlignment = OBR::MemPool::recordOverhead;
+        settings.minRecordSize =
+            OBR::MemPool::RoundUp(wanted.minRecordSize, static_cast<unsigned int>(mask + 1));
+        const std::size_t largest = wanted.maxRecordSize & ~mask;
+        if (largest != 0) { limit = largest - OBR::MemPool::recordOverhead + 1; }
+    }
+};
+
+// The settings as a layer uses them. A Heap rounds the data alignment up to a multiple of 4.
 inline OBR::MemPool::PoolSettings InLayer(OBR::MemPool::PoolSettings settings, Layer layer) {
+    if (layer == Layer::Malloc) { return MallocRecords(settings).settings; }
     if (layer != Layer::Mgr) {
         settings.dataAlignment = OBR::MemPool::RoundUp(settings.dataAlignment, 4);
     }

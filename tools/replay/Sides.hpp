@@ -16,6 +16,7 @@
 
 #include "replay/Clock.hpp"
 #include "replay/Layer.hpp"
+#include "replay/MallocHeap.hpp"
 #include "replay/Mimalloc.hpp"
 #include "replay/Recording.hpp"
 
@@ -51,15 +52,19 @@ private:
 class MallocPool {
 public:
     void* Allocate(std::size_t size) {
-        return size < limit ? heap.Allocate(size, alignmentOfMalloc) : ::operator new[](size);
+        return size < heap.Limit() ? heap.Allocate(size) : ::operator new[](size);
     }
     void Free(void* block) {
-        if (!heap.Free(block)) { ::operator delete[](block); }
+        OBR::MemPool::Bucket* const bucket = MallocHeap::BucketOf(block);
+        if (bucket == nullptr) {
+            ::operator delete[](block);
+        } else {
+            MallocHeap::Free(block, bucket);
+        }
     }
 
 private:
-    OBR::MemPool::Heap heap{"malloc", HeapSettingsOf(OBR::MemPool::PoolSettings::OfProcess())};
-    const std::size_t limit = MallocLimit(OBR::MemPool::NUV_OBR_MEMPOOL_MAX_RECORD_SIZE());
+    MallocHeap heap{OBR::MemPool::PoolSettings::OfProcess()};
 };
 
 class SystemHeap {
