@@ -12,8 +12,10 @@
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
+#include <fstream>
 #include <new>
 #include <random>
+#include <string>
 #include <thread>
 #include <vector>
 
@@ -150,6 +152,22 @@ TEST(MallocOnPoolsTest, TakesBlocksOfTheCLibrary) {
     block = Realloc(block, 4000);
     EXPECT_TRUE(Holds(block, 40, 7));
     free(block);
+}
+
+// The pages that only the start-up of the library uses, 300 KB, do not stay.
+TEST(MallocOnPoolsTest, TakesLittleMemoryItself) {
+    std::ifstream maps("/proc/self/smaps");
+    bool isOfLibrary = false;
+    int kilobytes = 0;
+    for (std::string line; std::getline(maps, line);) {
+        if (line.find('-') < line.find(' ')) {
+            isOfLibrary = line.find("MallocOnPools.so") != std::string::npos;
+        } else if (isOfLibrary && line.rfind("Rss:", 0) == 0) {
+            kilobytes += std::stoi(line.substr(4));
+        }
+    }
+    EXPECT_GT(kilobytes, 0);
+    EXPECT_LT(kilobytes, 400);
 }
 
 TEST(MallocOnPoolsTest, ThreadsAndTheirChildrenShareIt) {

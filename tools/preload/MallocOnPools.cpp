@@ -121,14 +121,6 @@ bool IsPowerOfTwo(std::size_t number) {
     return number != 0 && (number & (number - 1)) == 0;
 }
 
-using UsableSizeOfLibrary = std::size_t (*)(void*);
-UsableSizeOfLibrary usableSizeOfLibrary = nullptr;
-
-void FindUsableSize() {
-    usableSizeOfLibrary =
-        reinterpret_cast<UsableSizeOfLibrary>(dlsym(RTLD_NEXT, "malloc_usable_size"));
-}
-
 // Forgets which pages of this library are in use, as the start-up of the C++ library uses most of
 // them and nothing else does. Those that are used again come back.
 void DropPages() {
@@ -136,15 +128,11 @@ void DropPages() {
     madvise(&__ehdr_start, static_cast<std::size_t>(end - &__ehdr_start), MADV_DONTNEED);
 }
 
-// After the start-up of the library, which reads the environment.
-__attribute__((constructor)) void StartUp() {
-    using namespace OBR::MemPool;  // NOLINT(google-build-using-namespace)
-    FindUsableSize();
-    DropPages();
-    if (std::getenv("NUV_OBR_MEMPOOL_ON") != nullptr && !NUV_OBR_MEMPOOL_ON()) { return; }
-    NUV_OBR_MEMPOOL_TRACE(false);  // Writing a line may allocate, which would be traced again.
+void BuildHeap() {
+    // Writing a line may allocate, which would be traced again.
+    OBR::MemPool::NUV_OBR_MEMPOOL_TRACE(false);
     try {
-        heap = new MallocHeap(PoolSettings::OfProcess());
+        heap = new MallocHeap(OBR::MemPool::PoolSettings::OfProcess());
     } catch (const std::exception& error) {
         std::fprintf(stderr, "MallocOnPools: %s\n", error.what());
         std::_Exit(1);
@@ -155,6 +143,14 @@ __attribute__((constructor)) void StartUp() {
                    [] { ::new (&mutex) std::recursive_mutex; });
 
     limit = heap->Limit();
+}
+
+// After the start-up of the library, which reads the environment.
+__attribute__((constructor)) void StartUp() {
+    const bool isOff =
+        std::getenv("NUV_OBR_MEMPOOL_ON") != nullptr && !OBR::MemPool::NUV_OBR_MEMPOOL_ON();
+    if (!isOff) { BuildHeap(); }
+    DropPages();
 }
 
 __attribute__((destructor)) void Report() {
@@ -255,7 +251,8 @@ void* aligned_alloc(std::size_t alignment, std::size_t size) noexcept {
 std::size_t malloc_usable_size(void* block) noexcept {
     if (block == nullptr) { return 0; }
     if (const Bucket* const bucket = BucketOf(block)) { return bucket->DataSize(); }
-    if (usableSizeOfLibrary == nullptr) { FindUsableSize(); }
+    static const auto usableSizeOfLibrary =
+        reinterpret_cast<std::size_t (*)(void*)>(dlsym(RTLD_NEXT, "malloc_usable_size"));
     return usableSizeOfLibrary(block);
 }
 
