@@ -47,11 +47,12 @@ TEST(Advice, KnowsWhatTheTraceSaysAboutTheProgram) {
     Replay::Recording recording;
     recording.steps.resize(7);
     recording.numLeftOut = 5;
-    const Advise::Program program =
-        Advise::ProgramOf(recording, {{"allocation_share", "0.25"}, {"by", "all"}});
+    const Advise::Program program = Advise::ProgramOf(
+        recording, {{"allocation_share", "0.25"}, {"allocation_share_error", "0.125"}});
     EXPECT_EQ(program.numEvents, 7U);
     EXPECT_EQ(program.numLeftOut, 5U);
     EXPECT_EQ(program.allocationShare, std::optional(0.25));
+    EXPECT_EQ(program.shareError, std::optional(0.125));
     EXPECT_EQ(Advise::ProgramOf(recording, {}).allocationShare, std::nullopt);
 }
 

@@ -54,10 +54,11 @@ TEST(Advise, TextFiguresVerdictAndEnvironmentAgree) {
 
     std::set<std::string> keys;
     for (const auto& [key, value] : advice.items()) { keys.insert(key); }
-    EXPECT_EQ(keys, (std::set<std::string>{"layer", "events", "events_left_out", "heap", "settings",
-                                           "fastest", "smallest", "advised", "best", "verdict",
-                                           "price", "sentences", "environment", "allocation_share",
-                                           "mimalloc", "stopped", "plan"}));
+    EXPECT_EQ(keys,
+              (std::set<std::string>{"layer", "events", "events_left_out", "heap", "settings",
+                                     "fastest", "smallest", "advised", "best", "verdict", "price",
+                                     "sentences", "environment", "allocation_share",
+                                     "allocation_share_error", "mimalloc", "stopped", "plan"}));
     EXPECT_EQ(advice["layer"], "heap");
     EXPECT_EQ(advice["events"], 6001);
     EXPECT_EQ(advice["events_left_out"], 0);

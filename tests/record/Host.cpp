@@ -171,6 +171,14 @@ void Allocate() {
     for (int count = 0; count != 1000000; ++count) { Use(200); }
 }
 
+// Most of the time is in a few calls, which clear large blocks.
+void Clear() {
+    mallopt(M_MMAP_THRESHOLD, 32 << 20);
+    mallopt(M_TRIM_THRESHOLD, 64 << 20);
+    for (int count = 0; count != 20000; ++count) { Use(200); }
+    for (int count = 0; count != 20; ++count) { std::free(Keep(std::calloc(1, 16 << 20))); }
+}
+
 // With nobody to drain the channel, which fills.
 void Stop() {
     kill(getppid(), SIGSTOP);
@@ -265,6 +273,7 @@ int main(int argc, char** argv) {
         Allocate();
         std::ofstream("ticks") << std::clock();
     }
+    if (what == "clear") { Clear(); }
     if (what == "stop") { Stop(); }
     if (what == "interrupts") { CountInterrupts(); }
     if (what == "run") { Run(); }

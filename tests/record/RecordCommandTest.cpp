@@ -252,6 +252,10 @@ TEST(Record, EstimatesTheShareOfTheAllocations) {
     // Half of the time is the recorder's, which does not count.
     EXPECT_GT(share, 0.1);
     EXPECT_LT(share, 0.9);
+    const double error = std::stod(allocate.facts.at("allocation_share_error"));
+    EXPECT_GT(error, 0.25 * share);
+    EXPECT_LT(error, 2 * share);
+    EXPECT_GT(std::stod(Record("clear").facts.at("allocation_share")), 0.5) << "In few calls.";
     EXPECT_GE(allocate.numEvents, 2000000U);
     const auto cpuSeconds = std::stod(allocate.facts.at("cpu_seconds"));
     const double whole = std::stod(Shell::FileBytes("ticks")) / CLOCKS_PER_SEC;

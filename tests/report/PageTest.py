@@ -28,7 +28,7 @@ def write_trace(path):
                           for i, name in enumerate(names[1:])]
     with open(path, "w", encoding="utf-8") as out:
         for key, value in (("program", "demo <i>"), ("by", "stack"), ("threads", "2"),
-                           ("cpu_seconds", "1.5"), ("allocation_share", "0.25")):
+                           ("cpu_seconds", "1.5"), ("allocation_share", "0.25"), ("allocation_share_error", "0.05")):
             out.write(f"xmpt:i:{key}:{value}\n")
         for pool, name in enumerate(stacks):
             out.write(f"xmpt:c:{pool:016x}\nxmpt:n:{pool:016x}:{name}\n")
@@ -129,6 +129,7 @@ class PageTest(unittest.TestCase):
             part = self.json[part] if part == key else self.json[part]["blocks"]
             self.assertEqual(shown[key], shown_percent(part, self.json["blocks"]))
         self.assertEqual(shown["allocation_share"], "25.0 %")
+        self.assertIn("estimated, +/- 5.0 %", self.browser.page_source)
 
         peak, groups = self.json["peak"], self.json["groups"]
         share = [f"{shown_bytes(group['at_peak']['bytes'])} by {group['name']}" for group in groups[:3]]

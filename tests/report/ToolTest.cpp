@@ -46,7 +46,8 @@ std::string Tool(const std::string& arguments, int exitStatus = 0) {
 // could be taken for something else, and a bad line.
 const char* const trace =
     "output of the program\n"
-    "xmpt:i:program:demo --fast\nxmpt:i:by:caller\nxmpt:i:allocation_share:0.25\n"
+    "xmpt:i:program:demo "
+    "--fast\nxmpt:i:by:caller\nxmpt:i:allocation_share:0.25\nxmpt:i:allocation_share_error:0.05\n"
     "xmpt:i:threads:2\nxmpt:i:foreign_frees:3\nxmpt:i:cpu_seconds:1.5\n"
     "xmpt:c:0000000000000001\nxmpt:n:0000000000000001:nodes\n"
     "xmpt:c:0000000000000002\n"

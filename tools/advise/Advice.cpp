@@ -28,9 +28,12 @@ Proposal ProposeInThread(const Replay::Recording& recording) {
 
 Program ProgramOf(const Replay::Recording& recording,
                   const std::map<std::string, std::string>& facts) {
-    const auto share = facts.find("allocation_share");
-    return {recording.steps.size(), recording.numLeftOut,
-            share == facts.end() ? std::nullopt : ShareOf(share->second)};
+    const auto share = [&](const char* key) {
+        const auto fact = facts.find(key);
+        return fact == facts.end() ? std::nullopt : ShareOf(fact->second);
+    };
+    return {recording.steps.size(), recording.numLeftOut, share("allocation_share"),
+            share("allocation_share_error")};
 }
 
 Advice TakeAdvice(Trace::StepReader& reader, const Question& question,

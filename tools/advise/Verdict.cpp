@@ -18,8 +18,6 @@ namespace {
 constexpr double leastBytes = 0.01;
 // The smallest difference in the time of the whole program that is noticed.
 constexpr double leastTime = 0.01;
-// How far off the estimated share can be: two recordings of one program differ by up to as much.
-constexpr double errorOfShare = 0.3;
 // With fewer events there is nothing to gain.
 constexpr std::uint64_t leastEvents = 1000;
 
@@ -168,9 +166,11 @@ private:
 
     // What the allocation calls take, which is known.
     std::string Share() const {
-        const double share = *program.allocationShare;
-        return fmt::format("Allocation calls take an estimated {} (+/- {}) of the program's time",
-                           Percent(share), Percent(share * errorOfShare));
+        const std::string error = program.shareError.has_value()
+                                      ? fmt::format(" (+/- {})", Percent(*program.shareError))
+                                      : "";
+        return fmt::format("Allocation calls take an estimated {}{} of the program's time",
+                           Percent(*program.allocationShare), error);
     }
 
     const Figures& Of(std::size_t index) const { return findings.settings[index].figures; }

@@ -18,9 +18,10 @@ namespace Advise {
 
 // What the trace says about the program.
 struct Program {
-    std::uint64_t numEvents = 0;            // Replayed events.
-    std::uint64_t numLeftOut = 0;           // Later events, above the limit.
-    std::optional<double> allocationShare;  // Of its processor time, an estimate.
+    std::uint64_t numEvents = 0;                 // Replayed events.
+    std::uint64_t numLeftOut = 0;                // Later events, above the limit.
+    std::optional<double> allocationShare = {};  // Of its processor time, an estimate,
+    std::optional<double> shareError = {};       // and how far off that can be.
 };
 
 // The effect of pools on the time or the bytes of the program. None if the difference is within the

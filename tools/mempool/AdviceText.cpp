@@ -129,9 +129,11 @@ void PrintTable(std::ostream& out, const Advice& advice, bool all) {
         return cost(a) < cost(b);
     });
 
-    const auto& [numEvents, numLeftOut, share] = advice.program;
-    fmt::print(out, "   Events: {}", numEvents);
-    if (numLeftOut != 0) { fmt::print(out, ", the first of {}", numEvents + numLeftOut); }
+    const Advise::Program& program = advice.program;
+    fmt::print(out, "   Events: {}", program.numEvents);
+    if (program.numLeftOut != 0) {
+        fmt::print(out, ", the first of {}", program.numEvents + program.numLeftOut);
+    }
     out << '\n';
     Table table({{"bucket\nsize"},
                  {"max\nrecord"},

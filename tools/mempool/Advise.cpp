@@ -43,9 +43,9 @@ at a price    No settings gain without a price, but some gain more than they cos
               is less than that of the heap.
 advised       The settings that the verdict is about, with lines to paste: the best, if they gain
               anything; else settings at a price, chosen in the same way.
-the program   'mempool record' estimates which share of its time its allocation calls take; recordings
-              of one program differ by up to 30 % of it. What changes less than 1 % of the program's
-              time is neither a gain nor a price.
+the program   'mempool record' estimates which share of its time its allocation calls take, and how far
+              off that can be. What changes less than 1 % of the program's time is neither a gain nor a
+              price.
 plan          From groups, as of 'mempool record --by caller', a plan of up to five pools: groups whose
               blocks die together share a pool, so that one FreeAll replaces their frees, and all
               other blocks share another, and all keep their empty buckets. There is one if it gains
@@ -141,7 +141,8 @@ nlohmann::ordered_json JsonOf(const Advise::Advice& advice) {
             {"sentences", verdict.sentences},
             {"environment", environment},
             {"plan", plan.has_value() ? JsonOf(*plan) : ordered_json()},
-            {"allocation_share", OrNull(program.allocationShare)}};
+            {"allocation_share", OrNull(program.allocationShare)},
+            {"allocation_share_error", OrNull(program.shareError)}};
 }
 
 int AdviseOn(const Options& options) {

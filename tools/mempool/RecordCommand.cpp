@@ -53,7 +53,8 @@ itself is not recorded.
 
 Facts in the trace, which 'mempool text' prints: program, by, cpu_seconds (without the recorder's own
 part), allocation_share (the share of that time that allocation calls take, estimated from samples),
-threads, foreign_frees (blocks freed by another thread than the one that allocated them).
+allocation_share_error (how far off that can be), threads, foreign_frees (blocks freed by another
+thread than the one that allocated them).
 
 Exit status: the program's own; 125 if recording fails, 126 if the program cannot be run or recorded
 (it is statically linked or runs with other rights), 127 if it is not found.

@@ -58,7 +58,12 @@ void PrintFacts(std::ostream& out, const Analysis& analysis) {
     add("processor time", "", "cpu_seconds", " s");
     double share = 0;
     if (std::istringstream(Fact(analysis, "allocation_share")) >> share) {
-        facts.AddRow("allocation calls", fmt::format("{:.1f} % of it", 100 * share));
+        double error = 0;
+        const bool isKnown =
+            !!(std::istringstream(Fact(analysis, "allocation_share_error")) >> error);
+        facts.AddRow("allocation calls",
+                     fmt::format("{:.1f} % of it{}", 100 * share,
+                                 isKnown ? fmt::format(" (+/- {:.1f} %)", 100 * error) : ""));
     }
     facts.Write(out);
 }

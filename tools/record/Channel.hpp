@@ -142,9 +142,10 @@ struct Channel {
     char command[1024];  // Of a child: its words, each ended by a 0.
     ChildChannel children[maxChildren];
 
-    // The timed calls of the allocator, by the power of two of their ticks, which include the
-    // timer's.
+    // The timed calls of the allocator for small blocks, by the power of two of their ticks, which
+    // include the timer's.
     Samples samples[numSampleLengths];
+    Samples large;  // All calls for large blocks.
 
     alignas(64) Slot slots[numSlots];
     Caller callers[numCallers];
@@ -152,12 +153,16 @@ struct Channel {
     Stack stacks[numStacks];
     std::uint16_t frames[numFrames];  // Indices of callers.
 };
-constexpr std::uint64_t channelMagic = 0x3231'4C4E'4843'504D;
+constexpr std::uint64_t channelMagic = 0x3331'4C4E'4843'504D;
 
 constexpr std::uint64_t numCalibrationEvents = 1024;
 
-// One call in so many is timed, on average.
+// Of the calls for small blocks one in so many is timed, on average.
 constexpr std::uint32_t samplePeriod = 64;
+
+// A block of so many bytes or more is large. Its calls are rare, but one of them can take as long
+// as millions of others: glibc then merges all the small blocks that were freed.
+constexpr std::size_t largeSize = 1024;
 
 }  // namespace Recorder
 

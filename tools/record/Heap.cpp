@@ -121,7 +121,7 @@ inline void RecordAllocated(Channel& channel, const void* block, std::size_t siz
 template <typename Call>
 __attribute__((noinline)) void* AllocateTimed(Channel& channel, std::size_t size,
                                               const CallSite& site, Call call) {
-    Sample sample(channel);
+    Sample sample(channel, size >= largeSize);
     sample.EnterAllocator();
     void* const block = call();
     sample.LeaveAllocator();
@@ -135,14 +135,14 @@ inline __attribute__((always_inline)) void* Allocate(std::size_t size, const Cal
                                                      Call call) {
     Channel* const channel = OpenChannel();
     if (channel == nullptr) { return call(); }
-    if (IsSampled()) { return AllocateTimed(*channel, size, site, call); }
+    if (size >= largeSize || IsSampled()) { return AllocateTimed(*channel, size, site, call); }
     void* const block = call();
     RecordAllocated(*channel, block, size, site);
     return block;
 }
 
-__attribute__((noinline)) void FreeTimed(Channel& channel, void* block) {
-    Sample sample(channel);
+__attribute__((noinline)) void FreeTimed(Channel& channel, void* block, bool isLarge) {
+    Sample sample(channel, isLarge);
     Put(channel, Op::Released, block, 0, 0);
     sample.EnterAllocator();
     next.Free(block);
@@ -217,7 +217,8 @@ RECORDER_API void free(void* block) noexcept {
     if (block == nullptr || IsEarly(block) || !IsReady()) { return; }
     Channel* const channel = OpenChannel();
     if (channel == nullptr) { return next.Free(block); }
-    if (IsSampled()) { return FreeTimed(*channel, block); }
+    const bool isLarge = next.UsableSize(block) >= largeSize;
+    if (isLarge || IsSampled()) { return FreeTimed(*channel, block, isLarge); }
     Put(*channel, Op::Released, block, 0, 0);
     next.Free(block);
 }

@@ -103,7 +103,7 @@ Next<void(void*)> nextClear("_ZN3OBR7MemPool3Mgr5ClearEv");
 template <typename Call>
 inline __attribute__((always_inline)) auto Timed(Channel& channel, Call call) {
     if (!IsSampled()) { return call(); }
-    Sample sample(channel);
+    Sample sample(channel, false);
     sample.EnterAllocator();
     const auto result = call();
     sample.LeaveAllocator();

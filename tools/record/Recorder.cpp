@@ -263,9 +263,14 @@ bool WaitForRoom(Channel& channel, std::uint64_t index) {
     return isDrained;
 }
 
-// A call in which the thread is interrupted seems to take very long. The counted ticks are limited.
+// A call for a small block that seems to take very long was interrupted. The length is limited.
 void Sample::End() {
     constexpr std::uint64_t longest = (std::uint64_t{1} << numSampleLengths) - 1;
+    if (isLarge) {
+        channel.large.number.fetch_add(1, std::memory_order_relaxed);
+        channel.large.ticks.fetch_add(inside, std::memory_order_relaxed);
+        return;
+    }
     ThreadState& state = threadState;
     state.isWarm = !state.isWarm;
     if (state.isWarm) { return; }

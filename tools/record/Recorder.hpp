@@ -91,8 +91,8 @@ inline void Put(Channel& channel, Op op, const void* block, std::uint64_t size,
     }
 }
 
-// Whether this call is timed. Two calls in a row are timed, and the second one counts: the first
-// warms the cache for the timing code, which rarely runs.
+// Whether this call for a small block is timed. Two calls in a row are timed, and the second one
+// counts: the first warms the cache for the timing code, which rarely runs.
 inline bool IsSampled() {
     if (__builtin_expect(threadState.countdown != 0, 1)) {
         --threadState.countdown;
@@ -105,7 +105,7 @@ inline bool IsSampled() {
 // program's code, and costs a fraction of what a clock would show.
 class Sample {
 public:
-    explicit Sample(Channel& toChannel) : channel(toChannel) {}
+    Sample(Channel& toChannel, bool ofLarge) : channel(toChannel), isLarge(ofLarge) {}
     Sample(const Sample&) = delete;
     Sample& operator=(const Sample&) = delete;
     ~Sample() { End(); }
@@ -117,6 +117,7 @@ private:
     void End();
 
     Channel& channel;
+    const bool isLarge;
     std::uint64_t entered = 0;
     std::uint64_t inside = 0;
 };

@@ -34,12 +34,15 @@ struct ProcessorTime {
     void Renew(pid_t process);
 
     double seconds = 0;
+    // The part of the time in which its first thread ran while it could have run. The rest of the
+    // time another process had the processor.
+    double partRunning = 1;
 };
 
 void WriteInfo(Trace::CompactWriter& writer, std::string_view key, const std::string& text);
 
-// Writes the processor time, the estimated share of the allocation calls, and the number of
-// threads.
+// Writes the processor time, the estimated share of the allocation calls and its error, and the
+// number of threads.
 void WriteTimes(Trace::CompactWriter& writer, const Channel& channel, const ProcessorTime& time,
                 const TickRate& rate);
 

@@ -66,8 +66,8 @@ Json FactValue(const std::map<std::string, std::string>& facts, const char* key)
 
 void AddFacts(Json& json, const Analysis& analysis) {
     json["trace"] = analysis.trace;
-    for (const char* key :
-         {"program", "by", "cpu_seconds", "allocation_share", "threads", "foreign_frees"}) {
+    for (const char* key : {"program", "by", "cpu_seconds", "allocation_share",
+                            "allocation_share_error", "threads", "foreign_frees"}) {
         json[key] = FactValue(analysis.facts, key);
     }
     // The name of a program may be a number.

@@ -222,7 +222,8 @@ function verdict() {
   // Rows of four, or of five.
   byId("tiles").classed("many", typeof data.allocation_share === "number");
   if (typeof data.allocation_share === "number") {
-    tile("Time in allocation calls", "allocation_share", (share) => percent(share, 1), "of the processor time, estimated");
+    tile("Time in allocation calls", "allocation_share", (share) => percent(share, 1), "of the processor time, estimated" +
+      (typeof data.allocation_share_error === "number" ? `, +/- ${percent(data.allocation_share_error, 1)}` : ""));
   }
   byId("settings").text(`buckets of ${data.settings.bucket_size} bytes, records of ` +
     `${data.settings.min_record_size} to ${data.settings.max_record_size}, sizes rounded to ` +
