@@ -256,6 +256,15 @@ __attribute__((noinline)) void FourthCaller(std::size_t size) {
     FirstCaller();
 }
 
+// Passes memory on, but its name is not exported.
+__attribute__((noinline)) static void* LocalAlloc(std::size_t size) __asm__("local_alloc");
+static void* LocalAlloc(std::size_t size) {
+    return Keep(std::malloc(size));
+}
+__attribute__((noinline)) void FifthCaller() {
+    Keep(LocalAlloc(70001));
+}
+
 int main(int argc, char** argv) {
     const std::string what = argc > 1 ? argv[1] : "";
     if (what == "family") { Family(); }
@@ -288,6 +297,11 @@ int main(int argc, char** argv) {
         GrowBytes();
         GrowWords();
         Step();
+    }
+    if (what == "local") {
+        FifthCaller();
+        usleep(200000);  // Until mempool has named the function.
+        for (int count = 0; count != 2; ++count) { FifthCaller(); }
     }
     if (what == "alloca") {
         for (const std::size_t size : {100U, 3000U}) { FourthCaller(size); }

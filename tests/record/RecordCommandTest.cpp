@@ -199,7 +199,7 @@ TEST(Record, NamesTheGroups) {
     ASSERT_EQ(byCaller.size(), 5U);
     for (const char* name :
          {"^FirstCaller\\(\\)\\+0x[0-9a-f]+ \\(RecordHost[,)]",
-          "^Second::Caller\\+0x[0-9a-f]+ \\(RecordHost[,)]", "^void ThirdCaller\\(\\)\\+0x"}) {
+          "^Second::Caller\\+0x[0-9a-f]+ \\(RecordHost[,)]", "^ThirdCaller\\(\\)\\+0x"}) {
         EXPECT_THAT(byCaller, testing::Contains(testing::Key(ContainsRegex(name))));
     }
     const std::string after =
@@ -213,6 +213,9 @@ TEST(Record, NamesTheGroups) {
     const auto skipped = Record("callers", "--by caller --skip no --skip '*Caller*'").numBlocks;
     EXPECT_THAT(skipped, testing::Contains(testing::Key(ContainsRegex("^main\\+0x"))));
     EXPECT_THAT(skipped, testing::Not(testing::Contains(testing::Key(HasSubstr("Caller()")))));
+    const auto local = Record("local", "--by caller").numBlocks;
+    EXPECT_THAT(local, testing::Contains(testing::Pair(ContainsRegex("^local_alloc"), 1)));
+    EXPECT_THAT(local, testing::Contains(testing::Pair(ContainsRegex("^FifthCaller"), 2)));
     Shell::Output("strip -o Stripped " HOST "; " MEMPOOL
                   " record -o trace --by caller ./Stripped family");
     EXPECT_THAT(ReadTrace("trace").numBlocks,
@@ -232,11 +235,11 @@ TEST(Record, KeepsStacks) {
     const auto isStack = [](const std::string& pattern) {
         return testing::Contains(testing::Key(ContainsRegex(pattern)));
     };
-    const std::string third = ";main\\+[^;]*;void ThirdCaller\\(\\)\\+[^;]*;pass_Alloc\\+[^;]*$";
+    const std::string third = ";main\\+[^;]*;ThirdCaller\\(\\)\\+[^;]*;pass_Alloc\\+[^;]*$";
     EXPECT_THAT(Record("callers", "--stacks").numBlocks, isStack("^_start\\+.*" + third));
     const auto cut = Record("exec", "--stacks=2").numBlocks;
     EXPECT_THAT(cut, isStack("^main\\+[^;]*;FirstCaller\\(\\)\\+[^;]*$"));
-    EXPECT_THAT(cut, isStack("^void ThirdCaller\\(\\)\\+[^;]*;pass_Alloc\\+[^;]*$"));
+    EXPECT_THAT(cut, isStack("^ThirdCaller\\(\\)\\+[^;]*;pass_Alloc\\+[^;]*$"));
     EXPECT_THAT(Record("alloca", "--stacks").numBlocks,
                 isStack("^FourthCaller\\([^;]*;FirstCaller\\(\\)\\+[^;]*$"));
 }

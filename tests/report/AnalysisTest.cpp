@@ -391,7 +391,7 @@ TEST(Analysis, ComparesOnePoolWithThoseOfTheGroups) {
 // A caller's stacks are one pool, as if the recording had been by caller.
 TEST(Analysis, JoinsTheStacksOfACaller) {
     const std::vector<std::pair<std::string, std::string>> stacks = {
-        {"main+0x1 (p);parse+0x2 (p);void std::list::add(int)+0x3 (p)", "parse+0x2 (p)"},
+        {"main+0x1 (p);parse+0x2 (p);std::list::add(int)+0x3 (p)", "parse+0x2 (p)"},
         {"main+0x1 (p);parse+0x2 (p);xmalloc+0x8 (p);p+0x44 (libc.so.6)", "parse+0x2 (p)"},
         {"main+0x1 (p);parse+0x9 (p, p.c:3);operator new(unsigned long)+0x3 (q)",
          "parse+0x9 (p, p.c:3)"},
@@ -421,9 +421,9 @@ TEST(Analysis, JoinsTheStacksOfACaller) {
     for (const char* held : {"asked", "pools", "heap"}) {
         EXPECT_EQ(json["most"][held], plain["most"][held]) << held;
     }
-    EXPECT_EQ(json["groups"][2]["stack"],
-              (std::vector<std::string>{"main+0x1 (p)", "parse+0x2 (p)",
-                                        "void std::list::add(int)+0x3 (p)"}));
+    EXPECT_EQ(
+        json["groups"][2]["stack"],
+        (std::vector<std::string>{"main+0x1 (p)", "parse+0x2 (p)", "std::list::add(int)+0x3 (p)"}));
     EXPECT_EQ(json["stacks"][0]["frames"],
               (std::vector<std::string>{"main+0x1 (p)", "xmalloc+0x8 (p)"}));
     EXPECT_EQ(json["stacks"][3]["bytes"], 108);

@@ -35,10 +35,12 @@ itself is not recorded.
 -o -          The trace goes to standard output, and the program's standard output to standard error.
 --by caller   A group is a call site: the first return address outside of the C and C++ run-time
               libraries and of functions that only pass memory on, with the name of the function if
-              the file has symbols. A function passes memory on if its exported symbol contains
-              malloc, calloc, realloc, memalign, strdup or strndup, ends in alloc, or belongs to
-              the C++ library. --skip names more such functions, for example --skip 'new*'. A
-              function whose stack frame varies in size (alloca) is shown instead of its callers.
+              the file has symbols. A function passes memory on if its symbol contains malloc,
+              calloc, realloc, memalign, strdup or strndup, ends in alloc, or belongs to the C++
+              library. If the symbol is not exported, 'mempool' has to look it up, and the
+              function's blocks of the first milliseconds stay in its name. --skip names more such
+              functions by their exported symbols, for example --skip 'new*'. A function whose
+              stack frame varies in size (alloca) is shown instead of its callers.
 --stacks      A group is a call stack: the innermost 32 frames, or DEPTH frames, at most 64. A stack
               ends at a function whose stack frame varies in size.
 --by module   The program's file and each of its shared libraries are a group.

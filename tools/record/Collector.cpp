@@ -12,6 +12,7 @@
 #include <cstring>
 
 #include "trace/CutText.hpp"
+#include "trace/PassingOn.hpp"
 
 namespace Recorder {
 
@@ -161,8 +162,19 @@ std::uint64_t Collector::PoolOf(std::uint64_t group, std::uint64_t thread) {
         writer.Write({Trace::Kind::Created, pool, 0, 0, {}, {}});
         const std::string name = NameOfPool(group, pool);
         writer.Write({Trace::Kind::Named, pool, 0, 0, {}, name});
+        if (channel.by == By::Caller) { PassOver(channel.callers[group]); }
     }
     return pool;
+}
+
+// The recorder in the program knows exported names only. From now on it walks past this function,
+// if it only passes memory on.
+void Collector::PassOver(Caller& caller) {
+    std::uint32_t state = Caller::Final;
+    const char* const symbol = symbols.Symbol(channel.modules[caller.module], caller.address);
+    if (caller.frameSize != 0 && Trace::PassesOn(symbol)) {
+        caller.state.compare_exchange_strong(state, Caller::Passed);
+    }
 }
 
 const std::string& Collector::NameOfCaller(std::uint64_t number) {

@@ -35,6 +35,7 @@ private:
     std::uint64_t PoolOf(std::uint64_t group, std::uint64_t thread);
     std::uint64_t NumberOfPool(std::uint64_t group, std::uint64_t thread) const;
     void EndPools();
+    void PassOver(Caller& caller);
     const std::string& NameOfCaller(std::uint64_t number);
     std::string NameOfPool(std::uint64_t group, std::uint64_t pool);
 

@@ -46,7 +46,7 @@ std::string Shortened(std::string_view name) {
 
 std::string Demangled(const char* symbol) {
     const std::unique_ptr<char, void (*)(void*)> name(
-        cplus_demangle(symbol, DMGL_AUTO | DMGL_PARAMS), std::free);
+        cplus_demangle(symbol, DMGL_AUTO | DMGL_PARAMS | DMGL_RET_DROP), std::free);
     return name != nullptr ? Shortened(name.get()) : symbol;
 }
 
@@ -76,24 +76,37 @@ std::string NameOf(const Module& module) {
     return path.substr(path.rfind('/') + 1);
 }
 
-std::string Symbols::Name(const Module& module, std::uint64_t address) {
-    if (module.path[0] == '\0') { return Hex(address); }
-    const std::string file = NameOf(module);
-    // A call may be the last instruction of a function, so look before the return address.
-    const File& opened = Open(module);
+// A call may be the last instruction of a function, so this looks before the return address.
+const Symbols::Function* Symbols::Find(const Module& module, std::uint64_t address) {
+    if (module.path[0] == '\0') { return nullptr; }
+    const std::vector<Function>& functions = Open(module).functions;
     auto place = std::upper_bound(
-        opened.functions.begin(), opened.functions.end(), address - 1,
+        functions.begin(), functions.end(), address - 1,
         [](std::uint64_t one, const Function& other) { return one < other.start; });
-    while (place != opened.functions.begin()) {
+    while (place != functions.begin()) {
         const Function& function = *--place;
         if (function.size == 0 || address - 1 < function.start + function.size) {
-            return Distinct(Demangled(function.name), function.name) + "+" +
-                   Hex(address - function.start) + " (" + file +
-                   Line(*dwfl_addrmodule(opened.handle.get(), address - 1), address - 1) + ")";
+            return &function;
         }
         if (address - function.start > farthest) { break; }
     }
-    return file + "+" + Hex(address - module.base);
+    return nullptr;
+}
+
+std::string Symbols::Name(const Module& module, std::uint64_t address) {
+    if (module.path[0] == '\0') { return Hex(address); }
+    const std::string file = NameOf(module);
+    const Function* const function = Find(module, address);
+    if (function == nullptr) { return file + "+" + Hex(address - module.base); }
+    Dwfl* const handle = Open(module).handle.get();
+    return Distinct(Demangled(function->name), function->name) + "+" +
+           Hex(address - function->start) + " (" + file +
+           Line(*dwfl_addrmodule(handle, address - 1), address - 1) + ")";
+}
+
+const char* Symbols::Symbol(const Module& module, std::uint64_t address) {
+    const Function* const function = Find(module, address);
+    return function == nullptr ? "" : function->name;
 }
 
 std::string Symbols::Distinct(const std::string& shortened, const std::string& symbol) {

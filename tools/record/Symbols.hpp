@@ -25,6 +25,9 @@ public:
     // template arguments; further functions with the same name are "function#2" and so on.
     std::string Name(const Module& module, std::uint64_t address);
 
+    // The symbol of the function, or an empty text. Valid as long as this object.
+    const char* Symbol(const Module& module, std::uint64_t address);
+
 private:
     struct Function {
         std::uint64_t start;
@@ -38,6 +41,7 @@ private:
     };
 
     const File& Open(const Module& module);
+    const Function* Find(const Module& module, std::uint64_t address);
     std::string Distinct(const std::string& shortened, const std::string& symbol);
 
     std::unordered_map<const Module*, File> files;

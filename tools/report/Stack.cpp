@@ -46,10 +46,7 @@ std::string FunctionOf(const std::string& frame) {
         function.erase(place, nameless.size());
     }
     function.resize(std::min(function.size(), function.find('(', 1)));
-    // In Rust the type of a method may be in front, in angle brackets.
-    const bool isPlain = function.find("operator") == std::string::npos && function[0] != '<';
-    if (!isPlain) { return function; }
-    return function.substr(function.rfind(' ') + 1);  // Without the type that it returns.
+    return function;
 }
 
 std::size_t CallerIn(const std::vector<std::string>& frames, const Skipped& skipped) {
