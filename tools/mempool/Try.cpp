@@ -34,7 +34,8 @@ NUV_OBR_MEMPOOL_BUCKET_SIZE.
 cpu s         User and system time, the median of the rounds.
 spread        Between the lower and the upper quartile. A difference within it, or of less than 1 %,
               is neither a gain nor a price.
-peak MB       The peak of resident memory, including the program's code.
+peak MB       The peak of resident memory, including the program's code. Below 3 MB it may be that of
+              mempool itself, from which the program is started.
 page faults   Pages that were made resident. One that was given back to the system and is used again
               counts again. A replay does not show these.
 
