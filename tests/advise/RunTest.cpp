@@ -72,6 +72,8 @@ TEST(Run, EndsAsTheProgramDoes) {
     const Ended interrupted = Mempool("sleep 20; exit $?", "timeout --foreground -s INT 1");
     EXPECT_EQ(interrupted.status, 124);
     EXPECT_THAT(interrupted.errors, HasSubstr("   program               sleep 20\n"));
+    const Ended late = Mempool("sh -c '(while kill -0 $$; do :; done; kill -INT $PPID) 2>&- &'");
+    EXPECT_EQ(late.status, 0) << "Interrupted during the report.";
     const Ended cut = Mempool("sh -c 'exec " STATIC_HOST "'");
     EXPECT_THAT(cut.errors, HasSubstr("   SIZES"));
     EXPECT_THAT(cut.errors, Not(HasSubstr("   Events: ")));

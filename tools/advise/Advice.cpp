@@ -39,7 +39,13 @@ Program ProgramOf(const Replay::Recording& recording,
 Advice TakeAdvice(Trace::StepReader& reader, const Question& question,
                   const std::function<void(const std::string&)>& show) {
     Replay::Recording recording = Replay::ReadRecording(
-        reader, [&](auto position) { show(fmt::format("event {}", position)); },
+        reader,
+        [&](auto position) {
+            if (System::Interruption::Signal() != 0) {
+                throw std::runtime_error(reader.Name() + ": stopped before the search");
+            }
+            show(fmt::format("event {}", position));
+        },
         MaxSteps(question.seconds));
     if (recording.peakBlocks == 0) {
         throw std::runtime_error(reader.Name() + ": no block was allocated");
@@ -50,7 +56,6 @@ Advice TakeAdvice(Trace::StepReader& reader, const Question& question,
     Advice advice;
     advice.layer = question.layer;
     advice.program = ProgramOf(recording, reader.Facts());
-    const System::Interruption interruption;
     constexpr double mostOfTime = 1.4;  // After that no measurement is waited for.
     const double searchSeconds = (proposal.pools.empty() ? 1 : shareOfSearch) * question.seconds;
     ForkedMeter meter(recording, question.layer, mostOfTime * question.seconds);

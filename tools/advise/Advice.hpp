@@ -36,8 +36,9 @@ struct Question {
 Program ProgramOf(const Replay::Recording& recording,
                   const std::map<std::string, std::string>& facts);
 
-// Reads the trace and searches; from then on, SIGINT and SIGTERM end the search. Calls `show` with
-// a line of progress from time to time. Throws a std::runtime_error if the trace has no allocation.
+// Reads the trace and searches. A signal that System::Interruption has noted ends the search. Calls
+// `show` with a line of progress from time to time. Throws a std::runtime_error if the trace has no
+// allocation, or if the signal comes before the heap was measured.
 Advice TakeAdvice(Trace::StepReader& reader, const Question& question,
                   const std::function<void(const std::string&)>& show);
 

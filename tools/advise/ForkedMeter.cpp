@@ -26,6 +26,7 @@
 #include <MemPool>
 
 #include "replay/Measure.hpp"
+#include "system/Child.hpp"
 #include "system/Interruption.hpp"
 
 namespace Advise {
@@ -83,11 +84,8 @@ bool EndsInTime(pid_t child, int result, double processorSeconds,
 }
 
 std::string ProblemOf(int status) {
-    if (WIFSIGNALED(status)) {
-        return std::string("ended by signal ") + strsignal(WTERMSIG(status));
-    }
-    if (WEXITSTATUS(status) == statusOutOfMemory) { return "out of memory"; }
-    return "ended with status " + std::to_string(WEXITSTATUS(status));
+    const bool hasNoMemory = WIFEXITED(status) && WEXITSTATUS(status) == statusOutOfMemory;
+    return hasNoMemory ? "out of memory" : System::HowEnded(status);
 }
 
 }  // namespace

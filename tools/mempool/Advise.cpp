@@ -16,6 +16,7 @@
 #include "mempool/Print.hpp"
 #include "mempool/Progress.hpp"
 #include "mempool/Settings.hpp"
+#include "system/Interruption.hpp"
 #include "trace/StepReader.hpp"
 
 namespace Tool {
@@ -148,6 +149,7 @@ nlohmann::ordered_json JsonOf(const Advise::Advice& advice) {
 int AdviseOn(const Options& options) {
     Trace::StepReader reader(options.path);
     const Progress progress(reader.Name());
+    const System::Interruption interruption;
     const Advise::Advice advice =
         Advise::TakeAdvice(reader, {options.layer, 0. + options.seconds},
                            [&](const std::string& text) { progress.Show(text); });

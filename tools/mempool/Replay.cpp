@@ -24,6 +24,7 @@
 #include "mempool/Table.hpp"
 #include "replay/Measure.hpp"
 #include "replay/Recording.hpp"
+#include "system/Interruption.hpp"
 #include "trace/StepReader.hpp"
 
 namespace Tool {
@@ -126,6 +127,7 @@ int Compare(const std::string& path, const Options& options) {
 int Sweep(const std::string& path, const Options& options) {
     Trace::StepReader reader(path);
     const Progress progress(reader.Name());
+    const System::Interruption interruption;
     const Advise::Advice advice =
         Advise::TakeAdvice(reader, {options.layer, 0. + options.seconds, false},
                            [&](const std::string& text) { progress.Show(text); });

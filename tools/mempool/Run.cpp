@@ -27,6 +27,7 @@
 #include "system/Child.hpp"
 #include "system/Descriptor.hpp"
 #include "system/ExitStatus.hpp"
+#include "system/Interruption.hpp"
 #include "system/ProgramFile.hpp"
 #include "trace/OpenTrace.hpp"
 
@@ -46,8 +47,8 @@ do not change. If recording fails or the page cannot be written, the status is 1
 The report is by caller by default. The advice is by default on the library that 'mempool try'
 preloads, and ends with the command line that tries it.
 
-Ctrl-C ends the program, and mempool reports on what was recorded. During the search for settings it
-ends the search, and mempool prints what was measured.
+Ctrl-C ends the program, and mempool reports on what was recorded. After that it ends the search for
+settings, and mempool prints the report and what was measured.
 )";
 
 struct Options {
@@ -124,6 +125,7 @@ int Run(Options options) {
         OpenPage(options.html, {System::FindProgram(options.order.command.front()), "-"});
     const NamelessFile trace;
     options.order.tracePath = trace.Path();
+    const System::Interruption interruption;  // Signals during the recording go to the program.
     Recorder::Outcome outcome;
     try {
         outcome = RecordAsOrdered(options.order);

@@ -1,5 +1,7 @@
 // mempool try: runs a program on malloc and on pools, and compares.
 
+#include <sys/wait.h>
+
 #include <cstdint>
 #include <iostream>
 #include <memory>
@@ -14,6 +16,7 @@
 #include "mempool/Table.hpp"
 #include "preload/Trial.hpp"
 #include "system/Child.hpp"
+#include "system/ExitStatus.hpp"
 #include "system/ProgramFile.hpp"
 
 namespace Tool {
@@ -82,11 +85,13 @@ void Print(unsigned int rounds, const Preload::Conclusion& conclusion) {
                  {"of malloc"},
                  {"page faults"}});
     for (const Preload::Result& each : conclusion.results) {
+        const auto ratio = [&](double value) {
+            return each.differs ? "-" : fmt::format("{:.2f}", value);
+        };
         table.AddRow(each.name, fmt::format("{:.3f}", each.figures.time),
-                     fmt::format("{:.3f}", each.figures.spread),
-                     fmt::format("{:.2f}", each.timeRatio), fmt::format("{:.3f}", each.wallSeconds),
-                     fmt::format("{:.1f}", each.figures.bytes / 1e6),
-                     fmt::format("{:.2f}", each.bytesRatio),
+                     fmt::format("{:.3f}", each.figures.spread), ratio(each.timeRatio),
+                     fmt::format("{:.3f}", each.wallSeconds),
+                     fmt::format("{:.1f}", each.figures.bytes / 1e6), ratio(each.bytesRatio),
                      fmt::format("{:.0f}", each.pageFaults));
     }
     fmt::print(std::cerr, "\n   Rounds: {}\n", rounds);
@@ -108,7 +113,7 @@ int Try(const Options& options) {
     progress.Clear();
     if (trial.rounds == 0) {
         std::cerr << "mempool: stopped before the end of the first round\n";
-        return System::EndLike(trial.waitStatus);
+        return WIFEXITED(trial.waitStatus) ? System::ownFailure : System::EndLike(trial.waitStatus);
     }
     const Preload::Conclusion conclusion = Preload::Conclude(trial);
     if (options.json) {

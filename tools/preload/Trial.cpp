@@ -139,7 +139,8 @@ Advise::Figures FiguresOf(const Side& side, unsigned int rounds) {
 std::string Compared(const std::string& who, const Result& result, const Result& malloc) {
     return fmt::format("{} the program takes {:.2f} of malloc's time{} and {:.2f} of its memory.",
                        who, result.timeRatio,
-                       DifferInTime(result.figures, malloc.figures)
+                       result.figures.rounds < Advise::leastRounds ? " (too few rounds to compare)"
+                       : DifferInTime(result.figures, malloc.figures)
                            ? ""
                            : " (the same, within the spread of the runs)",
                        result.bytesRatio);
@@ -183,6 +184,7 @@ Trial TryProgram(const Order& order,
             const bool isLike = runs[i]->status == first->status &&
                                 first->output.IsLike(runs[i]->output) &&
                                 first->errors.IsLike(runs[i]->errors);
+            if (side.isSame && !isLike) { side.otherStatus = runs[i]->status; }
             side.isSame = side.isSame && isLike;
         }
         trial.rounds = round;
@@ -192,43 +194,44 @@ Trial TryProgram(const Order& order,
 
 Conclusion Conclude(const Trial& trial) {
     Conclusion conclusion;
+    const bool isSteady = trial.sides.at(0).isSame;
     const Advise::Figures malloc = FiguresOf(trial.sides.at(0), trial.rounds);
     for (const Side& side : trial.sides) {
         const Advise::Figures figures = FiguresOf(side, trial.rounds);
-        conclusion.results.push_back({side.name, figures, Advise::Quantile(side.wallSeconds, 0.5),
-                                      Advise::Quantile(side.pageFaults, 0.5),
-                                      Cost(figures, malloc, Advise::Aim::Time),
-                                      Cost(figures, malloc, Advise::Aim::Bytes)});
+        conclusion.results.push_back(
+            {side.name, figures, Advise::Quantile(side.wallSeconds, 0.5),
+             Advise::Quantile(side.pageFaults, 0.5), Cost(figures, malloc, Advise::Aim::Time),
+             Cost(figures, malloc, Advise::Aim::Bytes), isSteady && !side.isSame});
     }
     // The whole program was measured, so the share is 1, and the number of events does not matter.
     Advise::Findings findings{malloc, {}, {{{}, conclusion.results.at(1).figures}}, {}};
-    const bool hasMimalloc = conclusion.results.size() > 2;
-    if (hasMimalloc) { findings.mimalloc = conclusion.results[2].figures; }
+    if (conclusion.results.size() > 2 && !conclusion.results[2].differs) {
+        findings.mimalloc = conclusion.results[2].figures;
+    }
     const Advise::Verdict verdict = Advise::Judge(findings, {1000000, 0, 1});
-    conclusion.verdict = verdict.Name();
+    conclusion.verdict = conclusion.results[1].differs ? "differs" : verdict.Name();
     const auto add = [&](const char* who, std::size_t side) {
+        const Result& result = conclusion.results[side];
         conclusion.sentences.push_back(
-            Compared(who, conclusion.results[side], conclusion.results[0]));
+            result.differs
+                ? fmt::format("{} the program does not do the same, so its figures there mean "
+                              "nothing: its output or exit status differs; it {}.",
+                              who, System::HowEnded(trial.sides[side].otherStatus))
+                : Compared(who, result, conclusion.results[0]));
     };
     add("On pools", 1);
-    if (hasMimalloc) {
+    if (conclusion.results.size() > 2) {
         const bool isBetter = verdict.isMimallocBetter;
         add(!isBetter                     ? "With mimalloc"
             : verdict.advised.has_value() ? "Preloaded mimalloc gains more: with it"
                                           : "Only preloaded mimalloc gains: with it",
             2);
     }
-    if (!trial.sides.at(0).isSame) {
+    if (isSteady) {
+        conclusion.sameOutput = trial.sides.at(1).isSame;
+    } else {
         conclusion.sentences.emplace_back(
             "The output on malloc differs from run to run and was not compared.");
-    } else {
-        conclusion.sameOutput = trial.sides.at(1).isSame;
-    }
-    if (conclusion.sameOutput == false) {
-        conclusion.verdict = "differs";
-        conclusion.sentences.insert(conclusion.sentences.begin(),
-                                    "On pools the program's output or exit status is different, "
-                                    "so its figures there mean nothing.");
     }
     return conclusion;
 }

@@ -30,6 +30,7 @@ struct Side {
     std::vector<double> peakBytes;   // Resident memory.
     std::vector<double> pageFaults;  // Without those that read from a disk.
     bool isSame = true;              // Output and exit status were the same as in the first run.
+    int otherStatus = 0;             // Of the first run that differed, from waitpid.
 };
 
 struct Trial {
@@ -53,6 +54,7 @@ struct Result {
     double pageFaults;
     double timeRatio;
     double bytesRatio;
+    bool differs;  // It did not do what it does on malloc, so its figures mean nothing.
 };
 
 // The result of a trial.

@@ -145,7 +145,7 @@ void Follow(pid_t program, Recording& recording, Children& children, const TickR
 // What is known of the children that are not recorded. `descendants` is the processor time of all.
 void DescribeLost(Outcome& outcome, const Channel& channel, double descendants) {
     outcome.numLostChildren = channel.numLost;
-    outcome.lostSeconds = descendants;
+    outcome.lostSeconds = std::max(0., descendants);  // The two clocks differ a little.
     std::set<std::string> names;
     for (const auto& name : channel.childNames) {
         if (*name != '\0' && names.insert(name).second) {

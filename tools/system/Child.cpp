@@ -7,6 +7,7 @@
 
 #include <cerrno>
 #include <csignal>
+#include <cstring>
 #include <system_error>
 
 #include "system/Descriptor.hpp"
@@ -68,6 +69,12 @@ pid_t Start(const std::vector<std::string>& command, const std::function<void()>
     if (read(reading.Number(), &error, sizeof(error)) == 0) { return child; }
     waitpid(child, nullptr, 0);
     FailToRun(command.front(), error);
+}
+
+std::string HowEnded(int waitStatus) {
+    return WIFSIGNALED(waitStatus)
+               ? std::string("ended by signal ") + strsignal(WTERMSIG(waitStatus))
+               : "ended with status " + std::to_string(WEXITSTATUS(waitStatus));
 }
 
 int EndLike(int waitStatus) {

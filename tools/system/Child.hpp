@@ -22,6 +22,9 @@ void SurviveFileSizeLimit();
 // Starts the program as a child, in which `prepare` runs first, and returns its process id.
 pid_t Start(const std::vector<std::string>& command, const std::function<void()>& prepare);
 
+// The wait status in words, such as "ended by signal Aborted".
+std::string HowEnded(int waitStatus);
+
 // Ends this process by the signal that ended a child, or else returns the child's exit status.
 int EndLike(int waitStatus);
 
