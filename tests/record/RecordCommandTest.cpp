@@ -263,6 +263,8 @@ TEST(Record, EstimatesTheShareOfTheAllocations) {
     const auto cpuSeconds = std::stod(allocate.facts.at("cpu_seconds"));
     const double whole = std::stod(Shell::FileBytes("ticks")) / CLOCKS_PER_SEC;
     EXPECT_LT(cpuSeconds, 0.9 * whole) << "The recorder's part is in it.";
+    const auto byStack = std::stod(Record("allocate", "--stacks").facts.at("cpu_seconds"));
+    EXPECT_LT(byStack, 0.75 * std::stod(Shell::FileBytes("ticks")) / CLOCKS_PER_SEC);
     EXPECT_GT(static_cast<double>(allocate.milliseconds), 500 * cpuSeconds);
     EXPECT_LT(allocate.milliseconds, 60'000U);
 }

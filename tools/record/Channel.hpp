@@ -146,6 +146,7 @@ struct Channel {
     // include the timer's.
     Samples samples[numSampleLengths];
     Samples large;  // All calls for large blocks.
+    Samples walks;  // The recorder's part of the timed calls, if it looks for callers.
 
     alignas(64) Slot slots[numSlots];
     Caller callers[numCallers];
@@ -153,7 +154,7 @@ struct Channel {
     Stack stacks[numStacks];
     std::uint16_t frames[numFrames];  // Indices of callers.
 };
-constexpr std::uint64_t channelMagic = 0x3331'4C4E'4843'504D;
+constexpr std::uint64_t channelMagic = 0x3332'4C4E'4843'504D;
 
 constexpr std::uint64_t numCalibrationEvents = 1024;
 

@@ -126,6 +126,7 @@ __attribute__((noinline)) void* AllocateTimed(Channel& channel, std::size_t size
     void* const block = call();
     sample.LeaveAllocator();
     RecordAllocated(channel, block, size, site);
+    if (channel.by >= By::Caller) { sample.EndWalk(); }
     return block;
 }
 

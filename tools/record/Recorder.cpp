@@ -283,6 +283,12 @@ void Sample::End() {
     Samples& samples = channel.samples[63 - __builtin_clzll(counted | 1)];
     samples.number.fetch_add(1, std::memory_order_relaxed);
     samples.ticks.fetch_add(counted, std::memory_order_relaxed);
+    // Unwinding takes longer, and its time is known.
+    constexpr std::uint64_t longestWalk = 8192;
+    if (walk != 0 && walk < longestWalk) {
+        channel.walks.number.fetch_add(1, std::memory_order_relaxed);
+        channel.walks.ticks.fetch_add(walk, std::memory_order_relaxed);
+    }
 }
 
 }  // namespace Recorder

@@ -101,8 +101,9 @@ inline bool IsSampled() {
     return true;
 }
 
-// Times the allocator's part of a call. The recorder's own part is not timed: it overlaps with the
-// program's code, and costs a fraction of what a clock would show.
+// Times the allocator's part of a call, and the recorder's if that looks for callers. Otherwise the
+// recorder's part overlaps with the program's code, and costs a fraction of what a clock would
+// show.
 class Sample {
 public:
     Sample(Channel& toChannel, bool ofLarge) : channel(toChannel), isLarge(ofLarge) {}
@@ -111,7 +112,11 @@ public:
     ~Sample() { End(); }
 
     void EnterAllocator() { entered = Ticks(); }
-    void LeaveAllocator() { inside = TicksWhenDone() - entered; }
+    void LeaveAllocator() {
+        left = TicksWhenDone();
+        inside = left - entered;
+    }
+    void EndWalk() { walk = TicksWhenDone() - left; }
 
 private:
     void End();
@@ -119,7 +124,9 @@ private:
     Channel& channel;
     const bool isLarge;
     std::uint64_t entered = 0;
+    std::uint64_t left = 0;
     std::uint64_t inside = 0;
+    std::uint64_t walk = 0;  // 0 if there was none.
 };
 
 }  // namespace Recorder

@@ -18,6 +18,13 @@ std::string Text(double number) {
     return text.str();
 }
 
+// The ticks of the samples, without those of the timer.
+double TicksWithoutTimer(const Channel& channel, const Samples& samples) {
+    const auto timer = static_cast<double>(channel.timerTicks.load()) / numCalibrationEvents;
+    const auto number = static_cast<double>(samples.number.load());
+    return std::max(static_cast<double>(samples.ticks.load()) - number * timer, 0.0);
+}
+
 // The time of all calls for small blocks, from those that were timed, and twice its standard error.
 // A call that takes longer than `limit` was interrupted: it counts with the mean of the others.
 struct SmallCalls {
@@ -79,8 +86,10 @@ void WriteTimes(Trace::CompactWriter& writer, const Channel& channel, const Proc
     const double perSecond = rate.PerSecond();
     const double numEvents = static_cast<double>(channel.head.load()) / numCalibrationEvents;
     const double events = static_cast<double>(channel.eventTicks.load()) * numEvents / perSecond;
-    const double recorder =
-        eventCost * events + static_cast<double>(channel.unwindNanoseconds.load()) / 1e9;
+    const double walks = samplePeriod * TicksWithoutTimer(channel, channel.walks) / perSecond;
+    const double unwinding = static_cast<double>(channel.unwindNanoseconds.load()) / 1e9;
+    const double recorder = eventCost * events + walks + unwinding;
+    const double errorOfRecorder = (recorder - unwinding) / 2;  // How far off it can be.
     const double whole = time.seconds;
     const double own = std::max(whole - recorder, whole / 2);
     if (whole > 0) { WriteInfo(writer, "cpu_seconds", Text(own)); }
@@ -91,7 +100,7 @@ void WriteTimes(Trace::CompactWriter& writer, const Channel& channel, const Proc
         const double waiting = large * (1 - time.partRunning);
         const double share = std::min(inside / own, 1.0);
         const double error = std::hypot((small.error / perSecond + waiting) / own,
-                                        share * recorder / own, share * leastError);
+                                        share * errorOfRecorder / own, share * leastError);
         WriteInfo(writer, "allocation_share", Text(share));
         WriteInfo(writer, "allocation_share_error", Text(error));
     }
