@@ -213,6 +213,8 @@ TEST(Record, NamesTheGroups) {
     const auto skipped = Record("callers", "--by caller --skip no --skip '*Caller*'").numBlocks;
     EXPECT_THAT(skipped, testing::Contains(testing::Key(ContainsRegex("^main\\+0x"))));
     EXPECT_THAT(skipped, testing::Not(testing::Contains(testing::Key(HasSubstr("Caller()")))));
+    EXPECT_THAT(Record("exit", "--by caller", 7).numBlocks,
+                testing::Contains(testing::Key(ContainsRegex("^Use\\(unsigned long\\)"))));
     const auto local = Record("local", "--by caller").numBlocks;
     EXPECT_THAT(local, testing::Contains(testing::Pair(ContainsRegex("^local_alloc"), 1)));
     EXPECT_THAT(local, testing::Contains(testing::Pair(ContainsRegex("^FifthCaller"), 2)));

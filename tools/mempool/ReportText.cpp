@@ -55,7 +55,10 @@ void PrintFacts(std::ostream& out, const Analysis& analysis) {
     add("groups", "by ", "by", "");
     add("threads", "", "threads", "");
     add("freed elsewhere", "", "foreign_frees", " blocks, by another thread");
-    add("processor time", "", "cpu_seconds", " s");
+    double seconds = 0;
+    if (std::istringstream(Fact(analysis, "cpu_seconds")) >> seconds) {
+        facts.AddRow("processor time", fmt::format("{:.3g} s", seconds));
+    }
     double share = 0;
     if (std::istringstream(Fact(analysis, "allocation_share")) >> share) {
         double error = 0;

@@ -47,7 +47,13 @@ std::string Shortened(std::string_view name) {
 std::string Demangled(const char* symbol) {
     const std::unique_ptr<char, void (*)(void*)> name(
         cplus_demangle(symbol, DMGL_AUTO | DMGL_PARAMS | DMGL_RET_DROP), std::free);
-    return name != nullptr ? Shortened(name.get()) : symbol;
+    if (name == nullptr) { return symbol; }
+    std::string text = Shortened(name.get());
+    constexpr std::string_view nameless = "(anonymous namespace)::";
+    for (std::size_t place = 0; (place = text.find(nameless)) != std::string::npos;) {
+        text.erase(place, nameless.size());
+    }
+    return text;
 }
 
 // ", file.c:12" if there is debug information.

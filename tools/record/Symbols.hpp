@@ -22,7 +22,8 @@ class Symbols {
 public:
     // "function+0x1f (file)" for a return address, "function+0x1f (file, source.c:12)" where there
     // is debug information, or "file+0x1234" where the function has no name. Names are without
-    // template arguments; further functions with the same name are "function#2" and so on.
+    // template arguments, anonymous namespaces and return types; further functions with the same
+    // name are "function#2" and so on.
     std::string Name(const Module& module, std::uint64_t address);
 
     // The symbol of the function, or an empty text. Valid as long as this object.

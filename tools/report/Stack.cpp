@@ -41,10 +41,6 @@ std::string FunctionOf(const std::string& frame) {
     const std::size_t bracket = frame.rfind(" (");
     if (bracket == std::string::npos) { return frame; }
     std::string function = frame.substr(0, frame.rfind("+0x", bracket));
-    const std::string nameless = "(anonymous namespace)::";
-    for (std::size_t place = 0; (place = function.find(nameless)) != std::string::npos;) {
-        function.erase(place, nameless.size());
-    }
     function.resize(std::min(function.size(), function.find('(', 1)));
     return function;
 }

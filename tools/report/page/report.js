@@ -170,7 +170,7 @@ function heading() {
   if (data.by) { facts.push("groups by " + data.by); }
   if (data.threads !== null) { facts.push(data.threads + (data.threads === 1 ? " thread" : " threads")); }
   if (data.foreign_frees) { facts.push(count(data.foreign_frees) + " blocks freed by another thread"); }
-  if (data.cpu_seconds !== null) { facts.push(data.cpu_seconds + " s of processor time"); }
+  if (data.cpu_seconds !== null) { facts.push(`${Number(data.cpu_seconds).toPrecision(3)} s of processor time`); }
   byId("facts").text(facts.join(" · "));
 
   const banners = [];
