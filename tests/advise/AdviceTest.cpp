@@ -48,12 +48,19 @@ TEST(Advice, KnowsWhatTheTraceSaysAboutTheProgram) {
     recording.steps.resize(7);
     recording.numLeftOut = 5;
     const Advise::Program program = Advise::ProgramOf(
-        recording, {{"allocation_share", "0.25"}, {"allocation_share_error", "0.125"}});
+        recording,
+        {{"allocation_share", "0.25"}, {"allocation_share_error", "0.125"}, {"cpu_seconds", "1.5"}},
+        Replay::Layer::Malloc);
     EXPECT_EQ(program.numEvents, 7U);
     EXPECT_EQ(program.numLeftOut, 5U);
     EXPECT_EQ(program.allocationShare, std::optional(0.25));
     EXPECT_EQ(program.shareError, std::optional(0.125));
-    EXPECT_EQ(Advise::ProgramOf(recording, {}).allocationShare, std::nullopt);
+    EXPECT_EQ(program.seconds, std::optional(1.5));
+    EXPECT_EQ(program.startSeconds, Replay::secondsOfPreload);
+    const Advise::Program unknown = Advise::ProgramOf(recording, {}, Replay::Layer::Heap);
+    EXPECT_EQ(unknown.allocationShare, std::nullopt);
+    EXPECT_EQ(unknown.seconds, std::nullopt);
+    EXPECT_EQ(unknown.startSeconds, 0);
 }
 
 TEST(Advice, HasAPlanForGroupsThatDieTogether) {

@@ -10,6 +10,7 @@
 #include <gtest/gtest.h>
 
 using Index = std::optional<std::size_t>;
+using testing::HasSubstr;
 using testing::StartsWith;
 
 namespace {
@@ -94,8 +95,14 @@ TEST(Verdict, CountsWhatTheProgramWouldNotice) {
         EXPECT_EQ(verdict.advised.has_value(), verdict.Name() != std::string("none"));
     };
     expect({5, 1000}, {}, "faster", "Pools would help: they take 0.50 of the heap's time and 1.00");
-    expect({5, 1000}, 0.02, "faster", "Pools would help: they");
-    expect({5, 1100}, 0.02, "faster", "Pools would help, at a price: they");
+    expect({5, 1000}, 0.1, "faster", "Pools would help: they");
+    expect({5, 1100}, 0.1, "faster", "Pools would help, at a price: they");
+    expect({5, 1100}, 0.09, "none",
+           "Allocation calls take an estimated 9.0 % of the program's time: pools "
+           "might save 4.5 %, but a prediction of less than 5.0 % is not reliable.");
+    expect({5, 969}, 0.09, "smaller",
+           "Pools would help: they take 0.50 of the heap's time (which the program might not");
+    expect({10, 971}, 0.09, "none", "Pools would not help: no settings gain more than the spread");
     expect({5, 1100}, 0.018, "none",
            "Allocation calls take an estimated 1.8 % of the program's time: it would "
            "not notice that pools save 0.9 %, unless");
@@ -109,11 +116,41 @@ TEST(Verdict, CountsWhatTheProgramWouldNotice) {
     expect({5, 500}, 0.5, "none", "The program would not notice: it has only 999 events.", 999);
 }
 
+TEST(Verdict, CountsLessWhereTheProgramItselfWasMeasured) {
+    const Advise::Program measured = {1000, 0, 0.02, {}, {}, 0, Advise::leastMeasured};
+    EXPECT_STREQ(Judge(std::vector<Setting>{{5, 989}}, measured).Name(), "both");
+    EXPECT_STREQ(Judge(std::vector<Setting>{{5.2, 991}}, measured).Name(), "none");
+}
+
+// It takes a tenth of the program's time.
+TEST(Verdict, ChargesTheStartOfThePreloadedLibrary) {
+    const Advise::Program program = {1000, 0, 0.5, {}, 0.01, 0.001};
+    const Advise::Verdict faster = Judge(std::vector<Setting>{{5, 1000}}, program);
+    EXPECT_STREQ(faster.Name(), "faster");
+    EXPECT_THAT(faster.sentences.at(1), HasSubstr("the program would take about 85 %,"));
+    EXPECT_STREQ(Judge(std::vector<Setting>{{7.2, 1000}}, program).Name(), "none");
+    EXPECT_EQ(Judge(std::vector<Setting>{{8.5, 1000}}, program).sentences.front(),
+              "Pools would not help: they save no more than the start of the preloaded library "
+              "takes, 10 % of the program's time.");
+    const Advise::Verdict smaller = Judge(std::vector<Setting>{{10, 700}}, program);
+    EXPECT_STREQ(smaller.Name(), "smaller");
+    EXPECT_STREQ(smaller.Price(), "time");
+}
+
+TEST(Verdict, EstimatesTheShareOfAShortProgramFromItsReplay) {
+    EXPECT_THAT(Judge({{5, 1000}}, {1000, 1000, {}, {}, 0.0001}).sentences.at(2),
+                StartsWith("Allocation calls take an estimated 20 % of"));
+    EXPECT_THAT(Judge({{5, 1000}}, {1000, 0, {}, {}, 0.000005}).sentences.at(1),
+                StartsWith("Allocation calls take an estimated 100 % of"));
+    EXPECT_THAT(Judge({{5, 1000}}, {1000, 0, {}, {}, 0}).sentences.at(1),
+                StartsWith("The trace does not say"));
+}
+
 TEST(Verdict, SaysWhatTheFiguresMeanForTheProgram) {
     EXPECT_EQ(
-        Judge({{6, 1000}}, {1000, 0, 0.12, 0.0361}).sentences.at(1),
+        Judge({{5, 1000}}, {1000, 0, 0.12, 0.0361}).sentences.at(1),
         "Allocation calls take an estimated 12 % (+/- 3.6 %) of the program's time: with pools "
-        "the program would take about 95 %, not counting what the places of its blocks "
+        "the program would take about 94 %, not counting what the places of its blocks "
         "change.");
     EXPECT_EQ(
         Judge({{10, 1000}}, {1000, 500, 0.05}).sentences,
@@ -123,11 +160,11 @@ TEST(Verdict, SaysWhatTheFiguresMeanForTheProgram) {
             "Only the first 1000 of 1500 events were replayed; a larger --seconds covers more.",
             "Allocation calls take an estimated 5.0 % of the program's time."}));
     EXPECT_THAT(Judge({}).sentences.front(), StartsWith("Too few replays for a verdict"));
-    EXPECT_EQ(Advise::ShareOf("0.125"), std::optional(0.125));
-    EXPECT_EQ(Advise::ShareOf("0"), std::optional(0.));
-    EXPECT_EQ(Advise::ShareOf("1"), std::optional(1.));
+    EXPECT_EQ(Advise::NumberIn("0.125", 1), std::optional(0.125));
+    EXPECT_EQ(Advise::NumberIn("0", 1), std::optional(0.));
+    EXPECT_EQ(Advise::NumberIn("1", 1), std::optional(1.));
     for (const char* text : {"", "x", "-0.1", "1.1", "0.5 ", "nan"}) {
-        EXPECT_EQ(Advise::ShareOf(text), std::nullopt) << text;
+        EXPECT_EQ(Advise::NumberIn(text, 1), std::nullopt) << text;
     }
 }
 

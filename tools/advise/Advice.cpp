@@ -3,6 +3,7 @@
 #include <cstddef>
 #include <functional>
 #include <future>
+#include <limits>
 #include <stdexcept>
 
 #include <fmt/format.h>
@@ -27,13 +28,17 @@ Proposal ProposeInThread(const Replay::Recording& recording) {
 }  // namespace
 
 Program ProgramOf(const Replay::Recording& recording,
-                  const std::map<std::string, std::string>& facts) {
-    const auto share = [&](const char* key) {
+                  const std::map<std::string, std::string>& facts, Replay::Layer layer) {
+    const auto number = [&](const char* key, double most) {
         const auto fact = facts.find(key);
-        return fact == facts.end() ? std::nullopt : ShareOf(fact->second);
+        return fact == facts.end() ? std::nullopt : NumberIn(fact->second, most);
     };
-    return {recording.steps.size(), recording.numLeftOut, share("allocation_share"),
-            share("allocation_share_error")};
+    return {recording.steps.size(),
+            recording.numLeftOut,
+            number("allocation_share", 1),
+            number("allocation_share_error", 1),
+            number("cpu_seconds", std::numeric_limits<double>::infinity()),
+            layer == Replay::Layer::Malloc ? Replay::secondsOfPreload : 0};
 }
 
 Advice TakeAdvice(Trace::StepReader& reader, const Question& question,
@@ -55,7 +60,7 @@ Advice TakeAdvice(Trace::StepReader& reader, const Question& question,
 
     Advice advice;
     advice.layer = question.layer;
-    advice.program = ProgramOf(recording, reader.Facts());
+    advice.program = ProgramOf(recording, reader.Facts(), question.layer);
     constexpr double mostOfTime = 1.4;  // After that no measurement is waited for.
     const double searchSeconds = (proposal.pools.empty() ? 1 : shareOfSearch) * question.seconds;
     ForkedMeter meter(recording, question.layer, mostOfTime * question.seconds);

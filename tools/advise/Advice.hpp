@@ -32,9 +32,9 @@ struct Question {
     bool hasPlan = true;  // Whether a plan of pools is wanted too.
 };
 
-// From the part of the trace that is replayed, and its facts.
+// From the part of the trace that is replayed, its facts, and the layer that the program would use.
 Program ProgramOf(const Replay::Recording& recording,
-                  const std::map<std::string, std::string>& facts);
+                  const std::map<std::string, std::string>& facts, Replay::Layer layer);
 
 // Reads the trace and searches. A signal that System::Interruption has noted ends the search. Calls
 // `show` with a line of progress from time to time. Throws a std::runtime_error if the trace has no

@@ -354,13 +354,17 @@ std::optional<Plan> MeasurePlan(const Proposal& proposal,
         }
         return FiguresOf(ratios, bytes[side], Quantile(times[other], 0.5));
     };
+    // Both are replayed, so that what a replay cannot show is the same for both.
+    Program whole = program;
+    whole.leastGain = leastMeasured;
+    whole.startSeconds = 0;
     // The more rounds, the less the median varies: twice its standard error is about this.
     const auto gainsOver = [&](std::size_t other) {
         Figures base = FiguresOfHeap(times[other], bytes[other]);
         Figures planned = figures(plan, other);
         base.spread = 0;  // The ratios have that of both sides.
         planned.spread *= 2 / std::sqrt(planned.rounds);
-        return Judge({base, {}, {{kept, planned}}, {}}, program).advised.has_value();
+        return Judge({base, {}, {{kept, planned}}, {}}, whole).advised.has_value();
     };
     if (!gainsOver(heap) || !gainsOver(onePool)) { return std::nullopt; }
     return WithSentence({proposal.pools, kept, FiguresOfHeap(times[heap], bytes[heap]),

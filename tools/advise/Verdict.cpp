@@ -14,10 +14,8 @@ namespace Advise {
 
 namespace {
 
-// The smallest difference in bytes that counts. Bytes vary little from run to run.
-constexpr double leastBytes = 0.01;
-// The smallest difference in the time of the whole program that is noticed.
-constexpr double leastTime = 0.01;
+// The smallest price that counts, in bytes and in the time of the whole program.
+constexpr double leastPrice = 0.01;
 // With fewer events there is nothing to gain.
 constexpr std::uint64_t leastEvents = 1000;
 
@@ -42,7 +40,15 @@ std::string Percent(double share) {
 // Judges settings by their effect on one program.
 class Judging {
 public:
-    Judging(const Findings& measured, const Program& whole) : findings(measured), program(whole) {}
+    Judging(const Findings& measured, const Program& whole)
+        : findings(measured), program(whole), share(program.allocationShare) {
+        // The program is too short for samples, but not for the replayed time of its events.
+        if (!share.has_value() && program.seconds > 0.) {
+            const auto numEvents = static_cast<double>(program.numEvents + program.numLeftOut);
+            share = std::min(1., numEvents * findings.heap.time / 1e9 / *program.seconds);
+        }
+        if (program.seconds > 0.) { start = program.startSeconds / *program.seconds; }
+    }
 
     Verdict Judge() const {
         const auto any = [](const Figures&) { return true; };
@@ -95,24 +101,25 @@ private:
 
     bool HasFewEvents() const { return program.numEvents < leastEvents; }
 
-    // The share of the program's time that it would save.
+    // The share of the program's time that it would save, less than 0 if it would take longer. A
+    // difference within the spread counts as none.
     double Saved(const Figures& figures) const {
-        return program.allocationShare.value_or(1) * (1 - TimeRatio(figures));
+        const bool differs = DifferInTime(figures, findings.heap);
+        return (differs ? share.value_or(1) * (1 - TimeRatio(figures)) : 0) - start;
     }
 
     Effect TimeEffect(const Figures& figures) const {
-        const bool isNoticed = std::abs(Saved(figures)) >= leastTime;
-        if (HasFewEvents() || !DifferInTime(figures, findings.heap) || !isNoticed) {
-            return Effect::None;
-        }
-        return Saved(figures) > 0 ? Effect::Gain : Effect::Price;
+        const double saved = Saved(figures);
+        if (HasFewEvents()) { return Effect::None; }
+        if (saved >= program.leastGain.time) { return Effect::Gain; }
+        return saved <= -leastPrice ? Effect::Price : Effect::None;
     }
 
     Effect BytesEffect(const Figures& figures) const {
         const double ratio = BytesRatio(figures);
         if (HasFewEvents()) { return Effect::None; }
-        if (ratio < 1 - leastBytes) { return Effect::Gain; }
-        return ratio > 1 + leastBytes ? Effect::Price : Effect::None;
+        if (ratio < 1 - program.leastGain.bytes) { return Effect::Gain; }
+        return ratio > 1 + leastPrice ? Effect::Price : Effect::None;
     }
 
     // The settings with the least cost in time and bytes, or ones with fewer changes that are as
@@ -141,7 +148,7 @@ private:
                             "covers more.",
                             program.numEvents, program.numEvents + program.numLeftOut));
         }
-        if (!program.allocationShare.has_value()) {
+        if (!share.has_value()) {
             sentences.emplace_back(
                 "The trace does not say which share of the program's time its allocation calls "
                 "take.");
@@ -170,17 +177,18 @@ private:
                                       ? fmt::format(" (+/- {})", Percent(*program.shareError))
                                       : "";
         return fmt::format("Allocation calls take an estimated {}{} of the program's time",
-                           Percent(*program.allocationShare), error);
+                           Percent(*share), error);
     }
 
     const Figures& Of(std::size_t index) const { return findings.settings[index].figures; }
 
     std::string Gain(const Verdict& verdict, const Figures& pools) const {
         const bool isPaid = verdict.time == Effect::Price || verdict.bytes == Effect::Price;
-        const char* const time = verdict.time != Effect::None ? ""
-                                 : DifferInTime(pools, findings.heap)
-                                     ? " (which the program would not notice)"
-                                     : " (the same, within the spread of the runs)";
+        const char* const time =
+            verdict.time != Effect::None          ? ""
+            : !DifferInTime(pools, findings.heap) ? " (the same, within the spread of the runs)"
+            : std::abs(Saved(pools)) < leastPrice ? " (which the program would not notice)"
+                                                  : " (which the program might not notice)";
         return fmt::format(
             "Pools would help{}: they take {:.2f} of the heap's time{} and {:.2f} "
             "of its bytes.",
@@ -198,14 +206,24 @@ private:
         if (!isMeasured) {
             return "Too few replays for a verdict: more --seconds allow more of them.";
         }
-        if (verdict.fastest.has_value() && program.allocationShare.has_value()) {
-            const Figures& fastest = Of(*verdict.fastest);
-            const bool isFaster = DifferInTime(fastest, findings.heap) && Saved(fastest) > 0;
-            if (isFaster && TimeEffect(fastest) == Effect::None) {
+        if (verdict.fastest.has_value() && share.has_value()) {
+            const double saved = Saved(Of(*verdict.fastest));
+            if (saved <= 0 && saved + start > 0) {
+                return fmt::format(
+                    "Pools would not help: they save no more than the start of the preloaded "
+                    "library takes, {} of the program's time.",
+                    Percent(start));
+            }
+            if (saved > 0 && saved < leastPrice) {
                 return fmt::format(
                     "{}: it would not notice that pools save {}, unless its blocks lie better "
                     "there.",
-                    Share(), Percent(Saved(fastest)));
+                    Share(), Percent(saved));
+            }
+            if (saved > 0 && saved < program.leastGain.time) {
+                return fmt::format(
+                    "{}: pools might save {}, but a prediction of less than {} is not reliable.",
+                    Share(), Percent(saved), Percent(program.leastGain.time));
             }
         }
         return "Pools would not help: no settings gain more than the spread of the runs and more "
@@ -214,6 +232,8 @@ private:
 
     const Findings& findings;
     const Program& program;
+    std::optional<double> share;  // Of the program's time, in allocation calls.
+    double start = 0;             // The same of the start of preloaded pools.
 };
 
 }  // namespace
@@ -231,12 +251,12 @@ Verdict Judge(const Findings& findings, const Program& program) {
     return Judging(findings, program).Judge();
 }
 
-std::optional<double> ShareOf(const std::string& text) {
-    double share = 0;
+std::optional<double> NumberIn(const std::string& text, double most) {
+    double number = 0;
     const char* const last = text.data() + text.size();
-    const auto [end, error] = std::from_chars(text.data(), last, share);
-    const bool isShare = error == std::errc() && end == last && share >= 0 && share <= 1;
-    return isShare ? std::optional(share) : std::nullopt;
+    const auto [end, error] = std::from_chars(text.data(), last, number);
+    const bool isNumber = error == std::errc() && end == last && number >= 0 && number <= most;
+    return isNumber ? std::optional(number) : std::nullopt;
 }
 
 std::vector<std::pair<std::string, std::string>> EnvironmentOf(

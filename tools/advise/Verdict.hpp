@@ -16,12 +16,24 @@
 
 namespace Advise {
 
+// The smallest gains that count, as shares of the program's time and of the heap's bytes. A promise
+// must be larger than the error of those that failed a trial; docs/advisor.md has the figures.
+struct LeastGain {
+    double time;
+    double bytes;
+};
+inline constexpr LeastGain leastMeasured = {0.01, 0.01};
+inline constexpr LeastGain leastPromised = {0.05, 0.03};
+
 // What the trace says about the program.
 struct Program {
     std::uint64_t numEvents = 0;                 // Replayed events.
     std::uint64_t numLeftOut = 0;                // Later events, above the limit.
     std::optional<double> allocationShare = {};  // Of its processor time, an estimate,
     std::optional<double> shareError = {};       // and how far off that can be.
+    std::optional<double> seconds = {};          // Its processor time.
+    double startSeconds = 0;                     // That of the start of preloaded pools.
+    LeastGain leastGain = leastPromised;
 };
 
 // The effect of pools on the time or the bytes of the program. None if the difference is within the
@@ -51,8 +63,8 @@ struct Verdict {
 
 Verdict Judge(const Findings& findings, const Program& program);
 
-// The share in the text, between 0 and 1; none if the text is not such a number.
-std::optional<double> ShareOf(const std::string& text);
+// The number in the text, from 0 to `most`; none if the text is not such a number.
+std::optional<double> NumberIn(const std::string& text, double most);
 
 // The settings to paste: the environment variables, in the order in which they are read, and lines
 // of C++ for those that are not the default, empty for a layer that needs none.

@@ -203,12 +203,14 @@ Conclusion Conclude(const Trial& trial) {
              Advise::Quantile(side.pageFaults, 0.5), Cost(figures, malloc, Advise::Aim::Time),
              Cost(figures, malloc, Advise::Aim::Bytes), isSteady && !side.isSame});
     }
-    // The whole program was measured, so the share is 1, and the number of events does not matter.
+    // The whole program was measured, so the share is 1, its start is included, and the number of
+    // events does not matter.
     Advise::Findings findings{malloc, {}, {{{}, conclusion.results.at(1).figures}}, {}};
     if (conclusion.results.size() > 2 && !conclusion.results[2].differs) {
         findings.mimalloc = conclusion.results[2].figures;
     }
-    const Advise::Verdict verdict = Advise::Judge(findings, {1000000, 0, 1});
+    const Advise::Verdict verdict =
+        Advise::Judge(findings, {1000000, 0, 1, {}, {}, 0, Advise::leastMeasured});
     conclusion.verdict = conclusion.results[1].differs ? "differs" : verdict.Name();
     const auto add = [&](const char* who, std::size_t side) {
         const Result& result = conclusion.results[side];

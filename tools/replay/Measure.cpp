@@ -10,9 +10,6 @@ namespace Replay {
 
 namespace {
 
-// The resident pages of the preloaded library itself.
-constexpr std::int64_t bytesOfPreload = 368640;
-
 // Calls `measure` with the side of that layer.
 template <typename Measure>
 auto WithSide(const Recording& recording, Layer layer, const Measure& measure) {
