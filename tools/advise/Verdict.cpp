@@ -123,8 +123,11 @@ private:
     }
 
     // The settings with the least cost in time and bytes, or ones with fewer changes that are as
-    // good within the spread.
-    Index Simplest(const std::function<bool(const Figures&)>& passes) const {
+    // good within the spread. The time of fewer rounds is worth nothing.
+    Index Simplest(const std::function<bool(const Figures&)>& suits) const {
+        const auto passes = [&](const Figures& figures) {
+            return figures.rounds >= leastRounds && suits(figures);
+        };
         const Index least = Least(findings.settings, passes,
                                   [&](const Measured& each) { return BothRatio(each.figures); });
         if (!least.has_value()) { return least; }

@@ -17,13 +17,13 @@
 namespace Advise {
 
 // The smallest gains that count, as shares of the program's time and of the heap's bytes. A promise
-// must be larger than the error of those that failed a trial; docs/advisor.md has the figures.
+// must be larger than its error; docs/advisor.md compares it with trials.
 struct LeastGain {
     double time;
     double bytes;
 };
 inline constexpr LeastGain leastMeasured = {0.01, 0.01};
-inline constexpr LeastGain leastPromised = {0.05, 0.03};
+inline constexpr LeastGain leastPromised = {0.1, 0.03};
 
 // What the trace says about the program.
 struct Program {

@@ -46,7 +46,7 @@ advised       The settings that the verdict is about, with lines to paste: the b
               anything; else settings at a price, chosen in the same way.
 the program   'mempool record' estimates which share of its time its allocation calls take, and how far
               off that can be. The start of the library of --layer malloc is charged with 0.24 ms. A gain
-              counts from 5 % of the program's time or 3 % of the heap's bytes, as smaller ones may not
+              counts from 10 % of the program's time or 3 % of the heap's bytes, as smaller ones may not
               come true; a price counts from 1 %.
 plan          From groups, as of 'mempool record --by caller', a plan of up to five pools: groups whose
               blocks die together share a pool, so that one FreeAll replaces their frees, and all
