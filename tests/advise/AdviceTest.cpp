@@ -47,10 +47,16 @@ TEST(Advice, KnowsWhatTheTraceSaysAboutTheProgram) {
     Replay::Recording recording;
     recording.steps.resize(7);
     recording.numLeftOut = 5;
-    const Advise::Program program = Advise::ProgramOf(
-        recording,
-        {{"allocation_share", "0.25"}, {"allocation_share_error", "0.125"}, {"cpu_seconds", "1.5"}},
-        Replay::Layer::Malloc);
+    const Advise::Program program = Advise::ProgramOf(recording,
+                                                      {{"allocation_share", "0.25"},
+                                                       {"allocation_share_error", "0.125"},
+                                                       {"cpu_seconds", "1.5"},
+                                                       {"threads", "3"}},
+                                                      Replay::Layer::Malloc);
+    EXPECT_EQ(program.numThreads, 3U);
+    EXPECT_EQ(Advise::ProgramOf(recording, {{"by", "pools"}, {"threads", "3"}}, Replay::Layer::Heap)
+                  .numThreads,
+              1U);
     EXPECT_EQ(program.numEvents, 7U);
     EXPECT_EQ(program.numLeftOut, 5U);
     EXPECT_EQ(program.allocationShare, std::optional(0.25));
@@ -85,6 +91,8 @@ TEST(Advice, HasAPlanForGroupsThatDieTogether) {
     ASSERT_TRUE(advice.plan.has_value());
     EXPECT_EQ(advice.plan->pools.at(0).groups, std::vector<std::string>{"tree"});
     EXPECT_LT(advice.plan->figures.time, advice.plan->onePool.time);
+    EXPECT_TRUE(advice.program.hasPlan);
+    EXPECT_THAT(advice.plan->sentence, HasSubstr("aligned to 8. A pool "));
     EXPECT_LT(advice.plan->onePool.bytes, advice.plan->heap.bytes + 300000)
         << "A Heap, not the preloaded library.";
 }

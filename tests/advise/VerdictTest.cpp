@@ -68,6 +68,8 @@ TEST(Verdict, NeitherGainNorPriceIsWithinTheSpreadOfTheRuns) {
 TEST(Verdict, APriceMustBeWorthIt) {
     Expect({{5, 1500}}, {}, 0, "faster");
     Expect({{5, 2100}}, {}, {}, "none");
+    EXPECT_EQ(Judge(std::vector<Setting>{{5, 1060}}, {1000, 0, 0.1}).advised, std::nullopt)
+        << "0.95 x 1.06.";
     Expect({{14, 700}}, {}, 0, "smaller");
     Expect({{14, 720}}, {}, {}, "none");
     Expect({{5, 1500}, {4, 1500}, {9, 1050}}, {}, 1, "faster");
@@ -117,12 +119,22 @@ TEST(Verdict, CountsWhatTheProgramWouldNotice) {
     expect({9.5, 1000}, 0.2, "none", "Pools would not help: no settings gain more than the spread");
     expect({5, 2100}, 0.2, "none", "Pools would not help: no settings gain more than the spread");
     expect({5, 500}, 0.5, "none", "The program would not notice: it has only 999 events.", 999);
+    EXPECT_EQ(Judge(std::vector<Setting>{{5, 500}}, {999, 0, {}}).best, std::nullopt);
 }
 
 TEST(Verdict, CountsLessWhereTheProgramItselfWasMeasured) {
     const Advise::Program measured = {1000, 0, 0.02, {}, {}, 0, Advise::leastMeasured};
     EXPECT_STREQ(Judge(std::vector<Setting>{{5, 989}}, measured).Name(), "both");
     EXPECT_STREQ(Judge(std::vector<Setting>{{5.2, 991}}, measured).Name(), "none");
+}
+
+TEST(Verdict, AdvisesNoPoolForSeveralThreads) {
+    Advise::Program program = {1000, 0, 0.5};
+    program.numThreads = 3;
+    const Advise::Verdict verdict = Judge(std::vector<Setting>{{5, 1000}}, program);
+    EXPECT_STREQ(verdict.Name(), "none");
+    EXPECT_EQ(verdict.best, Index(0));
+    EXPECT_THAT(verdict.sentences.at(0), StartsWith("Pools would not help: 3 threads of"));
 }
 
 // It takes a tenth of the program's time.

@@ -1,6 +1,7 @@
 #include "advise/Advice.hpp"
 
 #include <cstddef>
+#include <cstdint>
 #include <functional>
 #include <future>
 #include <limits>
@@ -33,12 +34,19 @@ Program ProgramOf(const Replay::Recording& recording,
         const auto fact = facts.find(key);
         return fact == facts.end() ? std::nullopt : NumberIn(fact->second, most);
     };
-    return {recording.steps.size(),
-            recording.numLeftOut,
-            number("allocation_share", 1),
-            number("allocation_share_error", 1),
-            number("cpu_seconds", std::numeric_limits<double>::infinity()),
-            layer == Replay::Layer::Malloc ? Replay::secondsOfPreload : 0};
+    constexpr double any = std::numeric_limits<double>::infinity();
+    Program program = {recording.steps.size(),
+                       recording.numLeftOut,
+                       number("allocation_share", 1),
+                       number("allocation_share_error", 1),
+                       number("cpu_seconds", any),
+                       layer == Replay::Layer::Malloc ? Replay::secondsOfPreload : 0};
+    // Pools of the program may each belong to a thread.
+    const auto by = facts.find("by");
+    if (by == facts.end() || by->second != "pools") {
+        program.numThreads = static_cast<std::uint64_t>(number("threads", 1e9).value_or(1));
+    }
+    return program;
 }
 
 Advice TakeAdvice(Trace::StepReader& reader, const Question& question,
@@ -70,7 +78,8 @@ Advice TakeAdvice(Trace::StepReader& reader, const Question& question,
     });
     advice.isStopped = System::Interruption::Signal() != 0;
     advice.verdict = Judge(advice.findings, advice.program);
-    if (proposal.pools.empty() || meter.IsStopped()) { return advice; }
+    const bool hasThreads = advice.program.numThreads > 1;
+    if (proposal.pools.empty() || hasThreads || meter.IsStopped()) { return advice; }
 
     show(fmt::format("{} pools for blocks that die together", proposal.pools.size()));
     OBR::MemPool::PoolSettings settings;
@@ -83,7 +92,13 @@ Advice TakeAdvice(Trace::StepReader& reader, const Question& question,
     const double rest = question.seconds - meter.Elapsed();
     ForkedMeter planMeter(recording, layer, rest + (mostOfTime - 1) * question.seconds);
     advice.plan = MeasurePlan(proposal, settings, advice.program, planMeter, rest);
-    if (!advice.plan.has_value() && planMeter.IsStopped()) {
+    if (advice.plan.has_value()) {
+        advice.program.hasPlan = true;
+        advice.verdict = Judge(advice.findings, advice.program);
+        if (layer != question.layer) {
+            advice.plan->sentence.insert(0, "Built into the program, blocks can be aligned to 8. ");
+        }
+    } else if (planMeter.IsStopped()) {
         advice.verdict.sentences.emplace_back(
             "The blocks of some groups die together; more --seconds allow measuring pools for "
             "them.");

@@ -60,7 +60,8 @@ public:
             return std::tuple(each.figures.bytes, each.figures.time);
         });
         const auto isFree = [&](const Figures& figures) {
-            return TimeEffect(figures) != Effect::Price && BytesEffect(figures) != Effect::Price;
+            return !HasFewEvents() && TimeEffect(figures) != Effect::Price &&
+                   BytesEffect(figures) != Effect::Price;
         };
         const auto gains = [&](const Figures& figures) {
             return TimeEffect(figures) == Effect::Gain || BytesEffect(figures) == Effect::Gain;
@@ -69,9 +70,12 @@ public:
             Simplest([&](const Figures& figures) { return isFree(figures) && gains(figures); });
         if (!verdict.best.has_value()) {
             verdict.best = Simplest(isFree);
-            verdict.advised = Simplest(
-                [&](const Figures& figures) { return gains(figures) && BothRatio(figures) < 1; });
+            verdict.advised = Simplest([&](const Figures& figures) {
+                return gains(figures) && (1 - Saved(figures)) * BytesRatio(figures) < 1;
+            });
         }
+        // A replay shows neither a lock nor threads that wait for it.
+        if (HasThreads()) { verdict.advised = std::nullopt; }
         if (verdict.advised.has_value()) {
             const Figures& advised = findings.settings[*verdict.advised].figures;
             verdict.time = TimeEffect(advised);
@@ -100,6 +104,7 @@ private:
     }
 
     bool HasFewEvents() const { return program.numEvents < leastEvents; }
+    bool HasThreads() const { return program.numThreads > 1; }
 
     // The share of the program's time that it would save, less than 0 if it would take longer. A
     // difference within the spread counts as none.
@@ -203,6 +208,12 @@ private:
             return fmt::format("The program would not notice: it has only {} events.",
                                program.numEvents);
         }
+        if (HasThreads()) {
+            return fmt::format(
+                "Pools would not help: {} threads of the program allocate, a pool serves one at a "
+                "time, and a replay does not show how long the others wait.",
+                program.numThreads);
+        }
         const bool isMeasured =
             std::any_of(findings.settings.begin(), findings.settings.end(),
                         [](const Measured& each) { return each.figures.rounds >= leastRounds; });
@@ -229,8 +240,10 @@ private:
                     Share(), Percent(saved), Percent(program.leastGain.time));
             }
         }
-        return "Pools would not help: no settings gain more than the spread of the runs and more "
-               "than they cost.";
+        return fmt::format(
+            "{} would not help: no settings gain more than the spread of the runs and more than "
+            "they cost.",
+            program.hasPlan ? "One pool for all blocks" : "Pools");
     }
 
     const Findings& findings;

@@ -34,6 +34,8 @@ struct Program {
     std::optional<double> seconds = {};          // Its processor time.
     double startSeconds = 0;                     // That of the start of preloaded pools.
     LeastGain leastGain = leastPromised;
+    std::uint64_t numThreads = 1;  // That would share the pool.
+    bool hasPlan = false;          // Several pools gain more than one.
 };
 
 // The effect of pools on the time or the bytes of the program. None if the difference is within the

@@ -38,10 +38,12 @@ of heap       The figure divided by that of the heap.
 events        If a trace has more than --seconds times 1,000,000 events, and more than 4,000,000,
               only the first ones are replayed. The verdict says so, and --json has the number of the
               others.
-best          Of the settings that are neither slower nor larger than the heap, those with the least
+best          Of the settings that cost the program neither time nor bytes, those with the least
               time x bytes; among settings as good within the spread, those with the fewest changes.
-at a price    No settings gain without a price, but some gain more than they cost: their time x bytes
-              is less than that of the heap.
+at a price    No settings gain without a price, but some gain more than they cost: the program's time x
+              the heap's bytes becomes less.
+threads       No settings are advised if several threads of the program allocate from the heap, since a
+              pool serves one at a time.
 advised       The settings that the verdict is about, with lines to paste: the best, if they gain
               anything; else settings at a price, chosen in the same way.
 the program   'mempool record' estimates which share of its time its allocation calls take, and how far

@@ -217,7 +217,7 @@ function verdict() {
   const ofBlocks = (value) => percent(value, data.blocks);
   tile("Blocks in all", "blocks", count, `of ${bytes(data.bytes)}`);
   tile("Temporary", "temporary", ofBlocks, "of the blocks, freed by the next event of their thread");
-  tile("Leaked", "never_bytes", bytes, `in ${count(data.never)} blocks that are never freed`);
+  tile("Leaked", "never_bytes", bytes, `in ${count(data.never)} ${data.never === 1 ? "block that is" : "blocks that are"} never freed`);
   tile("Fit into a bucket", "in_records.blocks", ofBlocks, `of the blocks; rounding adds ${percent(data.padding, data.in_records.bytes)} to their bytes`);
   // Rows of four, or of five.
   byId("tiles").classed("many", typeof data.allocation_share === "number");
