@@ -159,6 +159,7 @@ TEST(Record, FollowsAProgramThatBecomesAnother) {
     };
     const std::string story = "+70000 +70001 -70001 ";
     EXPECT_EQ(record("env X=1 ./Host exit", 7), story);
+    EXPECT_EQ(ReadTrace("trace").facts.at("threads"), "1");
     EXPECT_EQ(record("sh -c 'exec ./lost; exit 1' 2>/dev/null", 127), "");
     const std::string lost =
         "bash -c 'shopt -s execfail; exec ./lost 2>/dev/null; echo /proc/self/fd/*'";

@@ -179,6 +179,7 @@ std::uint64_t EventTicks() {
 // The former program of this process and its threads have ended, so a slot that they have not
 // filled never will be. After its last events are drained, its code addresses are forgotten.
 void TakeOver(Channel& channel) {
+    channel.numThreads.store(0);
     const std::uint64_t head = channel.head.load();
     for (std::uint64_t index = channel.tail.load(); index != head; ++index) {
         if (!WaitForRoom(channel, index)) { return; }
