@@ -451,6 +451,30 @@ TEST(Stack, FindsWhatPassesMemoryOn) {
     EXPECT_EQ(Report::FindPassingOn(stacks, {}), Report::Skipped{}) << "Two and itself.";
 }
 
+// Each wrapper allocates in one place, for callers with sizes of their own.
+TEST(Stack, FindsWrappersTogether) {
+    std::vector<Report::StackRow> stacks;
+    const auto add = [&](const std::string& frame, std::uint64_t blocks,
+                         const std::vector<std::uint64_t>& sizes) {
+        for (const std::uint64_t size : sizes) {
+            const std::string caller = "f" + std::to_string(stacks.size()) + "+0x1 (p)";
+            stacks.push_back({{"main+0x1 (p)", caller, frame}, {blocks, blocks * size}, {}});
+        }
+    };
+    add("0x10+0x4 (p)", 20, {16, 17, 18, 160});
+    add("0x30+0x4 (p)", 20, {8, 60, 60, 80, 90, 90});
+    add("alike+0x4 (p)", 10, {16, 17, 18, 159});
+    add("few+0x4 (p)", 10, {8, 9, 999});
+    add("same+0x4 (p)", 10, {8, 9, 10, 999, 999, 999, 999, 999, 999});
+    add("places+0x4 (p)", 10, {8, 9, 10, 11});
+    add("places+0x8 (p)", 10, {99});
+    add("rest+0x4 (p)", 190, {8});
+    const Report::Skipped both = {"0x10", "0x30"};
+    EXPECT_EQ(Report::FindPassingOn(stacks, {}), both);
+    ++stacks.back().all.blocks;
+    EXPECT_EQ(Report::FindPassingOn(stacks, {}), Report::Skipped{}) << "Less than a third.";
+}
+
 TEST(Json, CutsNamesBetweenCharacters) {
     const Report::Analysis analysis =
         Analyse(Lines("@c:P\n@n:P:a\u00fc\u00fc\u00fc\u00fc\u00fcb\n@a:P:X:8\n@c:Q\n"));

@@ -28,6 +28,22 @@ bool IsPassedOver(const std::string& frame, const Skipped& skipped) {
            });
 }
 
+// A function that calls an allocator.
+struct Function {
+    // Whether it allocates in one place, for callers that each ask for a size of their own, as a
+    // wrapper of malloc does. A function that makes one kind of object asks for similar sizes.
+    bool IsVaried() const {
+        std::set<std::uint64_t> sizes;  // The mean of each caller.
+        for (const auto& [name, sum] : callers) { sizes.insert(sum.bytes / sum.blocks); }
+        return sites.size() == 1 && sizes.size() >= 4 && 2 * sizes.size() >= callers.size() &&
+               *sizes.rbegin() >= 10 * std::max(*sizes.begin(), std::uint64_t{1});
+    }
+
+    std::uint64_t blocks = 0;
+    std::map<std::string, BlockSum> callers;
+    std::set<std::string> sites;
+};
+
 }  // namespace
 
 std::vector<std::string> FramesOf(const std::string& name) {
@@ -52,10 +68,6 @@ std::size_t CallerIn(const std::vector<std::string>& frames, const Skipped& skip
 }
 
 Skipped FindPassingOn(const std::vector<StackRow>& stacks, const Skipped& skipped) {
-    struct Function {
-        std::uint64_t blocks = 0;
-        std::set<std::string> callers;
-    };
     struct Module {
         std::uint64_t blocks = 0;
         std::map<std::string, Function> functions;
@@ -72,15 +84,21 @@ Skipped FindPassingOn(const std::vector<StackRow>& stacks, const Skipped& skippe
         for (std::uint64_t* sum : {&blocks, &module.blocks, &function.blocks}) {
             *sum += stack.all.blocks;
         }
-        if (caller != name) { function.callers.insert(caller); }
+        function.sites.insert(stack.frames[index]);
+        if (caller != name) { function.callers[caller].Add(stack.all); }
     }
     Skipped found;
     for (const auto& [path, module] : modules) {
+        if (module.blocks < blocks / 100) { continue; }
+        std::uint64_t ofVaried = 0;
         for (const auto& [name, function] : module.functions) {
-            const bool isMost = 10 * function.blocks >= 9 * module.blocks;
-            if (isMost && function.callers.size() >= 3 && module.blocks >= blocks / 100) {
-                found.push_back(name);
-            }
+            ofVaried += function.IsVaried() ? function.blocks : 0;
+        }
+        const bool isVariedEnough = 3 * ofVaried >= module.blocks;
+        for (const auto& [name, function] : module.functions) {
+            const bool isMost =
+                10 * function.blocks >= 9 * module.blocks && function.callers.size() >= 3;
+            if (isMost || (isVariedEnough && function.IsVaried())) { found.push_back(name); }
         }
     }
     return found;

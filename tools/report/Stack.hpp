@@ -19,7 +19,7 @@ struct StackRow {
 
 std::vector<std::string> FramesOf(const std::string& name);
 
-// The function of a frame without its arguments, or the frame itself if its function has no name.
+// The function of a frame without its arguments, or the frame itself if its function is unknown.
 std::string FunctionOf(const std::string& frame);
 
 // Names and patterns of functions that only pass memory on, in addition to those known as such.
@@ -28,8 +28,9 @@ using Skipped = std::vector<std::string>;
 // The index of the innermost frame that does more than pass memory on, or of the outermost.
 std::size_t CallerIn(const std::vector<std::string>& frames, const Skipped& skipped);
 
-// Further functions that pass memory on: 90 % of the blocks of their module pass through them, on
-// behalf of three functions or more.
+// Further functions that pass memory on: each that serves 90 % of the blocks of its module to three
+// functions or more, and all those of a module that together serve a third of its blocks if each
+// allocates in one place, for four functions or more that ask for different sizes.
 Skipped FindPassingOn(const std::vector<StackRow>& stacks, const Skipped& skipped);
 
 }  // namespace Report
