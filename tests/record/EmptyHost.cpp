@@ -1,5 +1,8 @@
-// A program that does nothing.
+// A program with one block.
+
+#include <cstdlib>
 
 int main() {
+    std::free(std::malloc(70000));
     return 0;
 }

@@ -219,10 +219,21 @@ TEST(Record, NamesTheGroups) {
     const auto local = Record("local", "--by caller").numBlocks;
     EXPECT_THAT(local, testing::Contains(testing::Pair(ContainsRegex("^local_alloc"), 1)));
     EXPECT_THAT(local, testing::Contains(testing::Pair(ContainsRegex("^FifthCaller"), 2)));
+}
+
+TEST(Record, NamesFunctionsWithoutASymbolByTheirPlace) {
     Shell::Output("strip -o Stripped " HOST "; " MEMPOOL
                   " record -o trace --by caller ./Stripped family");
-    EXPECT_THAT(ReadTrace("trace").numBlocks,
-                testing::Contains(testing::Key(ContainsRegex("^Stripped\\+0x[0-9a-f]{1,5}$"))));
+    const std::string start =
+        Shell::Output("nm " HOST " | sed -n 's/^0*\\(.*\\) t _GLOBAL__sub_I_.*/\\1/p'");
+    EXPECT_THAT(
+        ReadTrace("trace").numBlocks,
+        testing::Contains(testing::Key(ContainsRegex("^0x" + start.substr(0, start.size() - 1) +
+                                                     "[+]0x[0-9a-f]{1,2} [(]Stripped[)]$"))));
+    Shell::Output(MEMPOOL " record -o trace --by caller " BARE_HOST);
+    EXPECT_THAT(
+        ReadTrace("trace").numBlocks,
+        testing::Contains(testing::Key(ContainsRegex("^RecordBareHost[+]0x[0-9a-f]{1,5}$"))));
 }
 
 TEST(Record, NamesFunctionsOfRust) {

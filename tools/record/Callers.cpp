@@ -153,6 +153,8 @@ bool Enter(Channel& channel, const Frame& frame, std::uint64_t frameSize) {
         frameSize != 0 && (channel.by == By::Stack || Trace::IsRuntime(loaded.name) ||
                            (channel.by == By::Caller && IsWrapper(channel, frame.address)));
     caller.frameSize = frameSize;
+    void* const returnAddress = const_cast<char*>(Pointer(frame.address));
+    caller.function = reinterpret_cast<std::uint64_t>(_Unwind_FindEnclosingFunction(returnAddress));
     caller.state.store(isPassed ? Caller::Passed : Caller::Final, std::memory_order_release);
     return isPassed;
 }

@@ -67,6 +67,7 @@ struct Caller {
     std::atomic<std::uint32_t> state;    // Stored last.
     std::uint32_t module;                // Index into the modules.
     std::uint64_t frameSize;             // That distance, if Passed.
+    std::uint64_t function;              // Where its function begins, 0 if that is unknown.
 };
 constexpr std::size_t numCallers = 1U << 16;
 constexpr std::size_t maxCaller = numCallers - 1;  // The last stands for all others.
@@ -154,7 +155,7 @@ struct Channel {
     Stack stacks[numStacks];
     std::uint16_t frames[numFrames];  // Indices of callers.
 };
-constexpr std::uint64_t channelMagic = 0x3332'4C4E'4843'504D;
+constexpr std::uint64_t channelMagic = 0x3333'4C4E'4843'504D;
 
 constexpr std::uint64_t numCalibrationEvents = 1024;
 

@@ -183,8 +183,8 @@ const std::string& Collector::NameOfCaller(std::uint64_t number) {
         constexpr std::size_t longest = 1000;  // So that the names of a stack fit into a text.
         const Caller& caller = channel.callers[number];
         std::string& name = place->second;
-        name =
-            Trace::CutText(symbols.Name(channel.modules[caller.module], caller.address), longest);
+        name = Trace::CutText(
+            symbols.Name(channel.modules[caller.module], caller.address, caller.function), longest);
         std::replace(name.begin(), name.end(), ';', ',');
     }
     return place->second;

@@ -99,11 +99,14 @@ const Symbols::Function* Symbols::Find(const Module& module, std::uint64_t addre
     return nullptr;
 }
 
-std::string Symbols::Name(const Module& module, std::uint64_t address) {
+std::string Symbols::Name(const Module& module, std::uint64_t address, std::uint64_t start) {
     if (module.path[0] == '\0') { return Hex(address); }
     const std::string file = NameOf(module);
     const Function* const function = Find(module, address);
-    if (function == nullptr) { return file + "+" + Hex(address - module.base); }
+    if (function == nullptr && start == 0) { return file + "+" + Hex(address - module.base); }
+    if (function == nullptr) {
+        return Hex(start - module.base) + "+" + Hex(address - start) + " (" + file + ")";
+    }
     Dwfl* const handle = Open(module).handle.get();
     return Distinct(Demangled(function->name), function->name) + "+" +
            Hex(address - function->start) + " (" + file +

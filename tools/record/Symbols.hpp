@@ -20,11 +20,12 @@ std::string NameOf(const Module& module);
 
 class Symbols {
 public:
-    // "function+0x1f (file)" for a return address, "function+0x1f (file, source.c:12)" where there
-    // is debug information, or "file+0x1234" where the function has no name. Names are without
-    // template arguments, anonymous namespaces and return types; further functions with the same
-    // name are "function#2" and so on.
-    std::string Name(const Module& module, std::uint64_t address);
+    // "function+0x1f (file)" for a return address, or "function+0x1f (file, source.c:12)" where
+    // there is debug information. A function without a name has its place in the file instead,
+    // "0x1230+0x4 (file)", if its start is known; if that is 0, the name is "file+0x1234". Names
+    // are without template arguments, anonymous namespaces and return types; further functions with
+    // the same name are "function#2" and so on.
+    std::string Name(const Module& module, std::uint64_t address, std::uint64_t start);
 
     // The symbol of the function, or an empty text. Valid as long as this object.
     const char* Symbol(const Module& module, std::uint64_t address);
