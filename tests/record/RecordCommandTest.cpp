@@ -266,9 +266,7 @@ TEST(Record, EstimatesTheShareOfTheAllocations) {
     // A program that shares its core with another one takes longer for its other work.
     EXPECT_GT(std::stod(spin.at("cpu_seconds")), 0.07);
     EXPECT_LT(std::stod(spin.at("cpu_seconds")), 0.2);
-    // Half of the time is the recorder's, which does not count.
-    EXPECT_GT(share, 0.1);
-    EXPECT_LT(share, 0.9);
+    EXPECT_GT(share, 0.5) << "The recorder's time does not count.";
     const double error = std::stod(allocate.facts.at("allocation_share_error"));
     EXPECT_GT(error, 0.25 * share);
     EXPECT_LT(error, 2 * share);

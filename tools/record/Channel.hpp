@@ -126,8 +126,8 @@ struct Channel {
     alignas(64) std::atomic<std::uint64_t> head;  // Slots taken.
     std::atomic<std::uint32_t> numThreads;
 
-    // The cost of the recorder itself: the ticks of numCalibrationEvents events and of as many
-    // empty measurements, taken at its start, and the processor time of all unwinding.
+    // The cost of the recorder itself: the ticks of numCalibrationEvents events and those that as
+    // many measurements add, taken at its start, and the processor time of all unwinding.
     alignas(64) std::atomic<std::uint64_t> eventTicks;
     std::atomic<std::uint64_t> timerTicks;
     std::atomic<std::uint64_t> unwindNanoseconds;

@@ -111,7 +111,8 @@ public:
     Sample& operator=(const Sample&) = delete;
     ~Sample() { End(); }
 
-    void EnterAllocator() { entered = Ticks(); }
+    // The program's own loads, for which the end of the call would wait, are done.
+    void EnterAllocator() { entered = TicksWhenDone(); }
     void LeaveAllocator() {
         left = TicksWhenDone();
         inside = left - entered;
