@@ -109,7 +109,7 @@ TEST(Search, FindsTheOptimaWithoutTryingAll) {
     for (const auto& each : findings.settings) {
         EXPECT_NEAR(each.figures.time, 2 * (10 + Distance(each.settings, fastest)), 2.5);
         EXPECT_GE(each.figures.rounds, 3U);
-        EXPECT_TRUE(each.figures.spread > 0 && each.figures.spread < 6);
+        EXPECT_TRUE(each.figures.spread > 0 && each.figures.spread < 7);
     }
     EXPECT_TRUE(findings.heap.spread > 0.85 && findings.heap.spread < 3);
     EXPECT_GE(best.figures.rounds, 15U);
@@ -129,6 +129,7 @@ TEST(Search, KeepsToItsTime) {
         EXPECT_GT(meter.Elapsed(), 0.9 * seconds);
         EXPECT_TRUE(findings.givenUp.empty());
         const Advise::Verdict verdict = Advise::Judge(findings, {1000, 0, {}});
+        EXPECT_GE(findings.settings.front().figures.rounds, seconds < 10 ? 1U : 3U) << seconds;
         if (seconds < 30) {
             EXPECT_EQ(findings.settings.size(), 1U) << "The time is for rounds of the defaults.";
             continue;

@@ -61,7 +61,9 @@ public:
 
     Findings Run() {
         const std::vector<PoolSettings> grid = CoarseGrid();
-        Look({grid.front()});  // The defaults have a figure however short the time is.
+        // The defaults have enough rounds for a verdict however short the time is.
+        Look({grid.front()});
+        Confirm(Aim::Time, leastRounds, 1e9);
         for (std::size_t i = 1; i < grid.size() && HasTime(lookingShare); i += batchSize) {
             const std::size_t end = std::min(i + batchSize, grid.size());
             Look({grid.begin() + static_cast<std::ptrdiff_t>(i),
