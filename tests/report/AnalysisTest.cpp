@@ -469,7 +469,7 @@ TEST(Stack, FindsWrappersTogether) {
     add("places+0x4 (p)", 10, {8, 9, 10, 11});
     add("places+0x8 (p)", 10, {99});
     add("rest+0x4 (p)", 190, {8});
-    const Report::Skipped both = {"0x10", "0x30"};
+    const Report::Skipped both = {"p+0x10", "p+0x30"};
     EXPECT_EQ(Report::FindPassingOn(stacks, {}), both);
     ++stacks.back().all.blocks;
     EXPECT_EQ(Report::FindPassingOn(stacks, {}), Report::Skipped{}) << "Less than a third.";

@@ -58,6 +58,7 @@ std::string FunctionOf(const std::string& frame) {
     if (bracket == std::string::npos) { return frame; }
     std::string function = frame.substr(0, frame.rfind("+0x", bracket));
     function.resize(std::min(function.size(), function.find('(', 1)));
+    if (function.compare(0, 2, "0x") == 0) { function.insert(0, ModuleOf(frame) + "+"); }
     return function;
 }
 

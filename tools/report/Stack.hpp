@@ -19,7 +19,8 @@ struct StackRow {
 
 std::vector<std::string> FramesOf(const std::string& name);
 
-// The function of a frame without its arguments, or the frame itself if its function is unknown.
+// The function of a frame without its arguments, "file+0x1230" if it has no name, or the frame
+// itself if it is unknown.
 std::string FunctionOf(const std::string& frame);
 
 // Names and patterns of functions that only pass memory on, in addition to those known as such.
