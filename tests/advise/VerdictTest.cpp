@@ -104,7 +104,9 @@ TEST(Verdict, CountsWhatTheProgramWouldNotice) {
     expect({5, 1100}, 0.2, "faster", "Pools would help, at a price: they");
     expect({5, 1100}, 0.09, "none",
            "Allocation calls take an estimated 9.0 % of the program's time: pools "
-           "might save 4.5 %, but a prediction of less than 10 % is not reliable.");
+           "might save 4.5 %, which is too little to promise.");
+    EXPECT_STREQ(Judge({{5, 1000}}, {1000, 0, 0.4, 0.23}).Name(), "faster");
+    EXPECT_STREQ(Judge({{5, 1000}}, {1000, 0, 0.4, 0.25}).Name(), "none") << "0.15 x 0.5.";
     expect({5, 969}, 0.09, "smaller",
            "Pools would help: they take 0.50 of the heap's time (which the program might not");
     expect({10, 971}, 0.09, "none", "Pools would not help: no settings gain more than the spread");

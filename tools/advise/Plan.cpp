@@ -358,6 +358,7 @@ std::optional<Plan> MeasurePlan(const Proposal& proposal,
     Program whole = program;
     whole.leastGain = leastMeasured;
     whole.startSeconds = 0;
+    whole.shareError = {};
     // The more rounds, the less the median varies: twice its standard error is about this.
     const auto gainsOver = [&](std::size_t other) {
         Figures base = FiguresOfHeap(times[other], bytes[other]);

@@ -108,16 +108,17 @@ private:
 
     // The share of the program's time that it would save, less than 0 if it would take longer. A
     // difference within the spread counts as none.
-    double Saved(const Figures& figures) const {
+    double Saved(const Figures& figures) const { return Saved(figures, share.value_or(1)); }
+    double Saved(const Figures& figures, double ofShare) const {
         const bool differs = DifferInTime(figures, findings.heap);
-        return (differs ? share.value_or(1) * (1 - TimeRatio(figures)) : 0) - start;
+        return (differs ? ofShare * (1 - TimeRatio(figures)) : 0) - start;
     }
 
     Effect TimeEffect(const Figures& figures) const {
-        const double saved = Saved(figures);
         if (HasFewEvents()) { return Effect::None; }
-        if (saved >= program.leastGain.time) { return Effect::Gain; }
-        return saved <= -leastPrice ? Effect::Price : Effect::None;
+        const double leastShare = share.value_or(1) - program.shareError.value_or(0);
+        if (Saved(figures, leastShare) >= program.leastGain.time) { return Effect::Gain; }
+        return Saved(figures) <= -leastPrice ? Effect::Price : Effect::None;
     }
 
     Effect BytesEffect(const Figures& figures) const {
@@ -234,10 +235,9 @@ private:
                     "there.",
                     Share(), Percent(saved));
             }
-            if (saved > 0 && saved < program.leastGain.time) {
-                return fmt::format(
-                    "{}: pools might save {}, but a prediction of less than {} is not reliable.",
-                    Share(), Percent(saved), Percent(program.leastGain.time));
+            if (saved > 0 && TimeEffect(Of(*verdict.fastest)) == Effect::None) {
+                return fmt::format("{}: pools might save {}, which is too little to promise.",
+                                   Share(), Percent(saved));
             }
         }
         return fmt::format(
