@@ -108,7 +108,7 @@ TEST(Verdict, CountsWhatTheProgramWouldNotice) {
     EXPECT_STREQ(Judge({{5, 1000}}, {1000, 0, 0.4, 0.23}).Name(), "faster");
     EXPECT_STREQ(Judge({{5, 1000}}, {1000, 0, 0.4, 0.25}).Name(), "none") << "0.15 x 0.5.";
     expect({5, 969}, 0.09, "smaller",
-           "Pools would help: they take 0.50 of the heap's time (which the program might not");
+           "Pools would help: they take 0.50 of the heap's time (too little to");
     expect({10, 971}, 0.09, "none", "Pools would not help: no settings gain more than the spread");
     expect({5, 1100}, 0.018, "none",
            "Allocation calls take an estimated 1.8 % of the program's time: it would "

@@ -197,7 +197,7 @@ private:
             verdict.time != Effect::None          ? ""
             : !DifferInTime(pools, findings.heap) ? " (the same, within the spread of the runs)"
             : std::abs(Saved(pools)) < leastPrice ? " (which the program would not notice)"
-                                                  : " (which the program might not notice)";
+                                                  : " (too little to promise)";
         return fmt::format(
             "Pools would help{}: they take {:.2f} of the heap's time{} and {:.2f} "
             "of its bytes.",
