@@ -47,9 +47,8 @@ threads       No settings are advised if several threads of the program allocate
 advised       The settings that the verdict is about, with lines to paste: the best, if they gain
               anything; else settings at a price, chosen in the same way.
 the program   'mempool record' estimates which share of its time its allocation calls take, and how far
-              off that can be. The start of the library of --layer malloc is charged too. A gain counts
-              from 8 % of the program's time, even with the smallest share that the error allows, or 3 %
-              of the heap's bytes, as smaller ones may not come true; a price counts from 1 %.
+              off that can be. The start of the library of --layer malloc is charged too. A gain that may
+              not come true does not count: docs/advisor.md has the limits.
 plan          From groups, as of 'mempool record --by caller', a plan of up to five pools: groups whose
               blocks die together share a pool, so that one FreeAll replaces their frees, and all
               other blocks share another, and all keep their empty buckets. There is one if it gains
