@@ -91,7 +91,7 @@ TEST(Advise, TextFiguresVerdictAndEnvironmentAgree) {
 }
 
 TEST(Advise, PrintsWhatItHasWhenItIsStopped) {
-    const std::string path = TraceFile("long", Blocks("", 300000));  // Takes longer.
+    const std::string path = TraceFile("long", Blocks("", NUM_BLOCKS));
     const json advice = json::parse(
         Command("timeout -s TERM 8 " MEMPOOL " advise --json --seconds 60 " + path, 124));
     EXPECT_EQ(advice["stopped"], true);
